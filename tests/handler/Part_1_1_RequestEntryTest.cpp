@@ -1,0 +1,84 @@
+// Part 1.1: request entry and action dispatch, through the real CGI.
+#include <gtest/gtest.h>
+
+#include "CgiRunner.h"
+#include "Fixtures.h"
+
+using namespace harmona::test;
+
+namespace {
+
+class Part_1_1 : public ::testing::Test {
+  protected:
+    void SetUp() override { StandardFixture(); }
+};
+
+TEST_F(Part_1_1, AvoidTimeoutPrintsSuccessAndExitsWithOne) {
+    const CgiResult r = Get("action=avoid_timeout");
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_EQ(r.Header("Content-Type"), "text/plain; charset=\"UTF-8\"");
+    EXPECT_EQ(r.body, "{\"success\":true}\n");
+}
+
+TEST_F(Part_1_1, UnknownActionPrintsSuccessAndExitsWithZero) {
+    for (const char* action : {"dance", "AVOID_TIMEOUT", "", "avoid_timeout "}) {
+        const CgiResult r = Get(Query({{"action", action}}));
+        ASSERT_TRUE(r.exited) << action;
+        EXPECT_EQ(r.exitStatus, 0) << action;
+        EXPECT_EQ(r.body, "{\"success\":true}\n") << action;
+    }
+}
+
+TEST_F(Part_1_1, PermissionZeroGetsNoReplyBody) {
+    AddUser("admin", 0);
+    const CgiResult r = Get("action=avoid_timeout");
+    ASSERT_TRUE(r.exited);
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.output, "");
+}
+
+TEST_F(Part_1_1, UnknownUserHasPermissionZero) {
+    const CgiResult r = Get("action=avoid_timeout", "nobody");
+    ASSERT_TRUE(r.exited);
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.output, "");
+}
+
+TEST_F(Part_1_1, MissingActionPrintsNothing) {
+    const CgiResult r = Get("node=audiotree_root");
+    ASSERT_TRUE(r.exited);
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.output, "");
+}
+
+TEST_F(Part_1_1, RefusedCallerGetsOnly401Header) {
+    const std::string tooLong(65, 'a');
+    for (const std::string& user :
+         {std::string(""), std::string("a/b"), std::string(".."), std::string("."),
+          std::string("ev\x01il"), std::string("del\x7f"), tooLong}) {
+        CgiRequest request;
+        request.queryString = "action=avoid_timeout";
+        request.remoteUser = user;
+        const CgiResult r = RunCgi(request);
+        ASSERT_TRUE(r.exited) << user;
+        EXPECT_EQ(r.exitStatus, 0) << user;
+        EXPECT_EQ(r.output, "Status: 401 Unauthorized\r\n\r\n") << user;
+    }
+    CgiRequest noUser;
+    noUser.queryString = "action=avoid_timeout";
+    noUser.hasRemoteUser = false;
+    const CgiResult r = RunCgi(noUser);
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.output, "Status: 401 Unauthorized\r\n\r\n");
+}
+
+TEST_F(Part_1_1, LongestValidUserNameIsAuthorized) {
+    const std::string name(64, 'u');
+    AddUser(name, 8);
+    const CgiResult r = Get("action=avoid_timeout", name);
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_EQ(r.body, "{\"success\":true}\n");
+}
+
+}  // namespace
