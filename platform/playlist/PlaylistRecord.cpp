@@ -1,0 +1,45 @@
+#include "PlaylistRecord.h"
+
+#include <cstdlib>
+#include <cstring>
+
+int VANUPlayListFree(PLAYLIST_INFO* head) {
+    while (head != nullptr) {
+        PLAYLIST_INFO* next = head->pNext;
+        std::free(head);
+        head = next;
+    }
+    return 0;
+}
+
+namespace harmona::playlist {
+
+void CopyUtf8Field(char* field, std::size_t size, std::string_view text) {
+    if (size == 0)
+        return;
+    std::size_t length = text.size() < size - 1 ? text.size() : size - 1;
+    if (length < text.size()) {
+        // Step back over continuation bytes so that no character is cut in half.
+        while (length > 0 && (static_cast<unsigned char>(text[length]) & 0xC0) == 0x80)
+            --length;
+    }
+    std::memcpy(field, text.data(), length);
+    field[length] = '\0';
+}
+
+bool PlaylistListBuilder::Append(std::uint32_t id, std::string_view name, std::string_view key) {
+    auto* record = static_cast<PLAYLIST_INFO*>(std::calloc(1, sizeof(PLAYLIST_INFO)));
+    if (record == nullptr)
+        return false;
+    record->id = id;
+    CopyUtf8Field(record->szName, sizeof(record->szName), name);
+    CopyUtf8Field(record->szKey, sizeof(record->szKey), key);
+    if (tail_ == nullptr)
+        head_ = record;
+    else
+        tail_->pNext = record;
+    tail_ = record;
+    return true;
+}
+
+}  // namespace harmona::playlist
