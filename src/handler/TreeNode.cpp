@@ -5,9 +5,11 @@
 void HarmonaHandler::FillTreeNode(Json::Value& node, const std::string& id, const std::string& pid,
                                   const std::string& text, const std::string& icon,
                                   unsigned int flags) {
-    node.clear();
-    // clear() empties an object or array but keeps a scalar; a reused node must become an object.
-    if (!node.isObject())
+    // Json::Value::clear() empties an object; on a scalar it would throw, and a node must be an
+    // object in any case.
+    if (node.isObject())
+        node.clear();
+    else
         node = Json::Value(Json::objectValue);
     node["text"] = WebUtils::EncodeHtml(text, false);
     node["qtip"] = node["text"];
