@@ -1,5 +1,7 @@
 #include "CgiRunner.h"
 
+#include <gtest/gtest.h>
+
 #include <fcntl.h>
 #include <poll.h>
 #include <signal.h>
@@ -243,6 +245,10 @@ CgiResult RunCgi(const CgiRequest& request) {
     }
     result.log = TakeLogLines();
     SplitReply(result);
+    // A sanitizer report from the program fails the test that ran it, whatever it asserts.
+    if (result.errors.find("Sanitizer") != std::string::npos ||
+        result.errors.find("runtime error:") != std::string::npos)
+        ADD_FAILURE() << "the CGI printed a sanitizer report:\n" << result.errors;
     return result;
 }
 
