@@ -58,18 +58,21 @@ bool ReadMountpoint(const char* path, std::string& mountpoint) {
     if (fstat(file.Get(), &status) != 0 || !S_ISREG(status.st_mode))
         return false;
 
-    // One byte more than the longest line, to see whether the line ends within the bound.
-    char buffer[kMaxMountpointBytes + 1];
+    // Room for the longest line and its CR LF end: a buffer filled without a LF holds a line that
+    // is too long.
+    char buffer[kMaxMountpointBytes + 2];
     const ssize_t length = ReadUpTo(file.Get(), buffer, sizeof(buffer));
     if (length <= 0)
         return false;
     const char* end = static_cast<const char*>(std::memchr(buffer, '\n', length));
+    if (end == nullptr && static_cast<std::size_t>(length) == sizeof(buffer))
+        return false;
     std::size_t lineLength =
         end != nullptr ? static_cast<std::size_t>(end - buffer) : static_cast<std::size_t>(length);
-    if (lineLength > kMaxMountpointBytes)
-        return false;
     if (lineLength > 0 && buffer[lineLength - 1] == '\r')
         --lineLength;
+    if (lineLength > kMaxMountpointBytes)
+        return false;
     if (lineLength == 0 || buffer[0] != '/' || std::memchr(buffer, '\0', lineLength) != nullptr)
         return false;
     mountpoint.assign(buffer, lineLength);
