@@ -1,5 +1,6 @@
 // Part 2.2: Child node routing.
 #include <cstring>
+#include <utility>
 
 #include "HarmonaHandler.h"
 
@@ -14,6 +15,7 @@ int HarmonaHandler::GetChildNodes(const char* nodeId) {
         else
             result = 1;  // other families come inline with the root tree or through "refresh"
     }
-    PrintResponse(reply, kReplyContentType);
+    // Passed by value, moved: a list of thousands of nodes is not copied once more.
+    PrintResponse(std::move(reply), kReplyContentType);
     return result;
 }
