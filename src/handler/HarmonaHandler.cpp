@@ -23,6 +23,13 @@ int HarmonaHandler::Process() {
 
     // The builders of "gettreenode", "refresh" and "rerandom100" are connected here as their Parts
     // land (spec, Order of building); until then those actions are unknown actions.
+    if (std::strcmp(action, "gettreenode") == 0) {
+        const char* node = webMan.In("node", nullptr);
+        if (node == nullptr)
+            return 0;
+        // "audiotree_root" goes to BuildRootTree (Part 2.1) once it lands (issue 7).
+        return GetChildNodes(node) != 0 ? 1 : 0;
+    }
     Json::Value reply(Json::objectValue);
     reply["success"] = true;
     if (std::strcmp(action, "avoid_timeout") == 0) {
