@@ -23,6 +23,10 @@ int HarmonaHandler::Process() {
 
     // The builders of "gettreenode", "refresh" and "rerandom100" are connected here as their Parts
     // land (spec, Order of building); until then those actions are unknown actions.
+    if (std::strcmp(action, "rerandom100") == 0) {
+        CreateRandom100Playlist();  // prints its own reply (Part 4.4)
+        return 1;
+    }
     Json::Value reply(Json::objectValue);
     reply["success"] = true;
     if (std::strcmp(action, "avoid_timeout") == 0) {
