@@ -30,6 +30,10 @@ int HarmonaHandler::Process() {
         // "audiotree_root" goes to BuildRootTree (Part 2.1) once it lands (issue 7).
         return GetChildNodes(node) != 0 ? 1 : 0;
     }
+    if (std::strcmp(action, "rerandom100") == 0) {
+        CreateRandom100Playlist();  // prints its own reply (Part 4.4)
+        return 1;
+    }
     Json::Value reply(Json::objectValue);
     reply["success"] = true;
     if (std::strcmp(action, "avoid_timeout") == 0) {
