@@ -23,6 +23,13 @@ int HarmonaHandler::Process() {
 
     // The builders of "gettreenode", "refresh" and "rerandom100" are connected here as their Parts
     // land (spec, Order of building); until then those actions are unknown actions.
+    if (std::strcmp(action, "refresh") == 0) {
+        const char* target = webMan.In("target", nullptr);
+        if (target != nullptr && std::strcmp(target, "mediaserver") == 0)
+            RefreshMediaServers();
+        // Any other target (absent too): RefreshNode(target) of Part 2.3, connected when it lands.
+        return 1;
+    }
     Json::Value reply(Json::objectValue);
     reply["success"] = true;
     if (std::strcmp(action, "avoid_timeout") == 0) {
