@@ -35,7 +35,7 @@
 #include <string>
 #include <vector>
 
-#include "Database.h"
+#include "sqlite/Database.h"
 #include "Plugin.h"
 
 namespace {
@@ -316,7 +316,7 @@ int main(int argc, char** argv) {
               "[player]\nrefresh_btn_title=Refresh\n[playlist]\nnewplaylist=\"New Playlist\"\n"
               "error_create_random100=\"Could not create the random playlist.\"\n");
 
-    const std::string trivial = dir + "bench_playlists_trivial_cgi";
+    const std::string trivial = dir + "bench_trivial_cgi";
     const std::string cgi = dir + "audiotree.cgi";
     const std::string categoryCgi = dir + "bench_playlists_category_cgi";
     const std::string ok = "{\"success\":true}";

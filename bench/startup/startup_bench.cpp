@@ -24,7 +24,7 @@
 #include <string>
 #include <vector>
 
-#include "Database.h"
+#include "gpod/Database.h"
 #include "Plugin.h"
 
 extern char** environ;

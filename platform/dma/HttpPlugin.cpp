@@ -3,7 +3,7 @@
 #include <cstdio>
 #include <cstring>
 
-#include "Easy.h"
+#include "curl/Easy.h"
 #include "HttpPost.h"
 
 namespace {

@@ -1,7 +1,7 @@
 // The libgpod side of the iPod library (platform.md section 8), built as a MODULE plugin: loading
 // it brings libgpod, GLib and their dependencies into the process, which only the requests that
 // read the iPod pay for.
-#include "Database.h"
+#include "gpod/Database.h"
 #include "IPodPluginApi.h"
 
 extern "C" __attribute__((visibility("default"))) int harmona_ipod_list_playlists_v1(

@@ -24,7 +24,7 @@
 #include <unordered_set>
 #include <vector>
 
-#include "Database.h"
+#include "sqlite/Database.h"
 #include "LibraryDatabase.h"
 #include "PlatformPaths.h"
 

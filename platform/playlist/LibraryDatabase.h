@@ -3,7 +3,7 @@
 // or device planted there could block or feed the reader endlessly).
 #pragma once
 
-#include "Database.h"
+#include "sqlite/Database.h"
 
 namespace harmona::playlist {
 

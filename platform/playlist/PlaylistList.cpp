@@ -12,7 +12,7 @@
 #include <string_view>
 #include <vector>
 
-#include "Database.h"
+#include "sqlite/Database.h"
 #include "LibraryDatabase.h"
 #include "PlatformPaths.h"
 

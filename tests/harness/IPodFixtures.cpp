@@ -4,7 +4,7 @@
 #include <cstdio>
 #include <stdexcept>
 
-#include "Database.h"
+#include "gpod/Database.h"
 #include "Fixtures.h"
 
 namespace harmona::test {

@@ -5,7 +5,7 @@
 #include <future>
 #include <stdexcept>
 
-#include "Database.h"
+#include "sqlite/Database.h"
 #include "Fixtures.h"
 
 namespace harmona::test {

@@ -13,7 +13,7 @@
 #include <set>
 
 #include "AudioFile.h"
-#include "Database.h"
+#include "sqlite/Database.h"
 #include "Fixtures.h"
 #include "PlaylistFixtures.h"
 #include "PlaylistList.h"

@@ -3,7 +3,7 @@
 
 #include <utility>
 
-#include "Database.h"
+#include "sqlite/Database.h"
 #include "Fixtures.h"
 
 using harmona::sqlite::Database;

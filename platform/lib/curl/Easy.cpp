@@ -1,4 +1,4 @@
-#include "Easy.h"
+#include "curl/Easy.h"
 
 namespace harmona::curl {
 

@@ -1,4 +1,4 @@
-#include "Database.h"
+#include "gpod/Database.h"
 
 namespace harmona::gpod {
 

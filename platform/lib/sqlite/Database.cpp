@@ -1,4 +1,4 @@
-#include "Database.h"
+#include "sqlite/Database.h"
 
 #include <utility>
 
