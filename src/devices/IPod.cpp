@@ -50,7 +50,7 @@ int HarmonaHandler::ListIPodPlaylists(Json::Value& children) {
             std::snprintf(id, sizeof(id), "ipod_%s", key.c_str());
             FillTreeNode(node, id, kIPodRootId, FieldText(record->szName), kIPodPlaylistIcon,
                          NODE_LEAF);
-            children.append(node);
+            children.append(std::move(node));
             ++count;
         }
     }

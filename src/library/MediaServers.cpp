@@ -134,7 +134,7 @@ int HarmonaHandler::AppendMediaServers(Json::Value& children) {
             std::snprintf(id, sizeof(id), "mediaserver_%s", controlUrl.asCString());
             FillTreeNode(node, id, kRootId, named ? name.asString() : ip.asString(), kServerIcon,
                          NODE_LEAF);
-            children.append(node);
+            children.append(std::move(node));
         }
         const int total = TotalOf(root);
         // The offset would overflow past INT_MAX; no int total can be above it anyway.
@@ -150,7 +150,7 @@ void HarmonaHandler::RefreshMediaServers() {
     Json::Value reply;
     Json::Value items;
     AppendMediaServers(items);
-    reply["items"] = items;
+    reply["items"] = std::move(items);
     SetSuccess(reply, true);
-    PrintResponse(reply, kReplyContentType);
+    PrintResponse(std::move(reply), kReplyContentType);
 }

@@ -48,7 +48,7 @@ int HarmonaHandler::ListPlaylists(Json::Value& children, const char* category) {
                 node, id,
                 which == Category::personal ? "musiclib_music_personal" : "musiclib_music_shared",
                 record->szName, kPlaylistIcon, NODE_LEAF);
-            children.append(node);
+            children.append(std::move(node));
         }
         result = 1;
     } else {

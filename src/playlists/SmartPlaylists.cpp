@@ -48,7 +48,7 @@ int HarmonaHandler::ListSmartPlaylists(Json::Value& children, const char* catego
     for (const std::string& name : names) {
         std::snprintf(id, sizeof id, idFormat, name.c_str());
         FillTreeNode(node, id, pid, name, kSmartIcon, NODE_LEAF);
-        children.append(node);
+        children.append(std::move(node));
     }
     return 1;
 }

@@ -37,18 +37,18 @@ void RefreshNodeWith(HarmonaHandler& handler, const char* target, const RefreshL
     if (Is(target, "ipod")) {
         listers.iPodPlaylists(handler,
                               items);  // its result is ignored: the iPod listing cannot fail here
-        reply["items"] = items;
+        reply["items"] = std::move(items);
         handler.SetSuccess(reply, true);
     } else if (category != nullptr) {
         if (listers.playlists(handler, items, category) == 0 ||
             listers.smartPlaylists(handler, items, category) == 0) {
             handler.SetError(reply, "common", "error_system", __LINE__);
         } else {
-            reply["items"] = items;
+            reply["items"] = std::move(items);
             handler.SetSuccess(reply, true);
         }
     }
-    handler.PrintResponse(reply, kReplyContentType);
+    handler.PrintResponse(std::move(reply), kReplyContentType);
 }
 
 }  // namespace harmona::tree

@@ -89,12 +89,12 @@ int BuildRootTreeFrom(HarmonaHandler& handler, const std::vector<RootCategory>& 
             handler.PrintResponse(reply, kReplyContentType);
             return 0;
         }
-        node["children"] = children;
+        node["children"] = std::move(children);
         if (category.expanded)
             node["expanded"] = true;
-        reply.append(node);
+        reply.append(std::move(node));
     }
-    handler.PrintResponse(reply, kReplyContentType);
+    handler.PrintResponse(std::move(reply), kReplyContentType);
     return 1;
 }
 
