@@ -34,12 +34,15 @@ void MakeRealisticFixture() {
     AddUser("admin", 1 | 4 | 8);
     WriteFile("/run/vanu/service/3.pid", std::to_string(getpid()) + "\n");
     MakeDirs("/volume1/music");
-    for (int i = 0; i < 1000; ++i)
-        WritePersonalPlaylistFile("admin", "Playlist " + std::to_string(i) + ".m3u");
     std::vector<std::string> smart;
     for (int i = 0; i < 200; ++i)
         smart.push_back("Smart " + std::to_string(i));
-    WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), smart);
+    // The same personal playlists for the three users of the comparison rows.
+    for (const char* user : {"admin", "noipod", "plain"}) {
+        for (int i = 0; i < 1000; ++i)
+            WritePersonalPlaylistFile(user, "Playlist " + std::to_string(i) + ".m3u");
+        WriteSmartPlaylistFile(UserSmartPlaylistFile(user), smart);
+    }
     std::vector<SharedPlaylistRow> shared;
     for (int i = 1; i <= 50; ++i)
         shared.push_back({i, "Shared " + std::to_string(i)});
@@ -84,6 +87,10 @@ int main(int argc, char** argv) {
     // "noipod": permission 4|8, no iPod category; "plain": bit 16 alone, neither iPod nor media
     // servers: the rows show what each category costs.
     WriteUsersConf({{"admin", {"13", ""}}, {"noipod", {"12", ""}}, {"plain", {"16", ""}}});
+    for (const Row& row : rows) {
+        const harmona::bench::ProcessRun run = RunProcess(row.program, row.environment);
+        std::printf("check: %-34s exit %d, %zu reply bytes\n", row.label, run.exitStatus, run.output.size());
+    }
     for (int i = 0; i < runs; ++i) {
         for (Row& row : rows)
             row.ms.push_back(RunProcess(row.program, row.environment).wallMs);
