@@ -3,6 +3,7 @@
 #include <json/writer.h>
 
 #include <cstdio>
+#include <map>
 
 #include "Utf8.h"
 
@@ -71,6 +72,49 @@ void WriteString(const char* begin, const char* end, std::string& out) {
     out.push_back('"');
 }
 
+void WriteMember(const char* name, const char* end, const Json::Value& member, bool first,
+                 std::string& out) {
+    if (!first)
+        out.push_back(',');
+    WriteString(name, end, out);
+    out.push_back(':');
+    WriteCompactJson(member, out);
+}
+
+void WriteObject(const Json::Value& value, std::string& out) {
+    bool namesValid = true;
+    for (auto it = value.begin(); it != value.end() && namesValid; ++it) {
+        const char* end = nullptr;
+        const char* name = it.memberName(&end);
+        namesValid = IsValidUtf8(std::string_view(name, static_cast<std::size_t>(end - name)));
+    }
+    out.push_back('{');
+    bool first = true;
+    if (namesValid) {
+        for (auto it = value.begin(); it != value.end(); ++it) {
+            const char* end = nullptr;
+            const char* name = it.memberName(&end);
+            WriteMember(name, end, *it, first, out);
+            first = false;
+        }
+    } else {
+        // Repaired names may coincide; an object keeps each name once (the later member wins), in
+        // the order of the repaired names, as jsoncpp orders members.
+        std::map<std::string, const Json::Value*> repaired;
+        for (auto it = value.begin(); it != value.end(); ++it) {
+            const char* end = nullptr;
+            const char* name = it.memberName(&end);
+            repaired[RepairUtf8(std::string_view(name, static_cast<std::size_t>(end - name)))] =
+                &*it;
+        }
+        for (const auto& [name, member] : repaired) {
+            WriteMember(name.data(), name.data() + name.size(), *member, first, out);
+            first = false;
+        }
+    }
+    out.push_back('}');
+}
+
 }  // namespace
 
 void WriteCompactJson(const Json::Value& value, std::string& out) {
@@ -109,22 +153,9 @@ void WriteCompactJson(const Json::Value& value, std::string& out) {
             out.push_back(']');
             break;
         }
-        case Json::objectValue: {
-            out.push_back('{');
-            bool first = true;
-            for (auto it = value.begin(); it != value.end(); ++it) {
-                if (!first)
-                    out.push_back(',');
-                first = false;
-                const char* end = nullptr;
-                const char* name = it.memberName(&end);
-                WriteString(name, end, out);
-                out.push_back(':');
-                WriteCompactJson(*it, out);
-            }
-            out.push_back('}');
+        case Json::objectValue:
+            WriteObject(value, out);
             break;
-        }
     }
 }
 
