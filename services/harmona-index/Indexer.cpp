@@ -15,14 +15,14 @@
 
 #include "LibrarySchema.h"
 #include "MediaFiles.h"
-#include "SqliteHandle.h"
 #include "TagReader.h"
+#include "sqlite/Database.h"
 
 namespace harmona::index {
 namespace {
 
-using medialib::SqliteHandle;
-using medialib::Statement;
+using sqlite::Database;
+using sqlite::Statement;
 
 constexpr int kMaxFolderDepth = 64;
 constexpr int kBusyTimeoutMs = 10000;
@@ -72,11 +72,11 @@ void WalkFolder(int dirFd, const std::string& path, int depth, std::vector<Found
     closedir(dir);
 }
 
-std::unordered_map<std::string, KnownRow> LoadKnownRows(SqliteHandle& db) {
+std::unordered_map<std::string, KnownRow> LoadKnownRows(Database& db) {
     std::unordered_map<std::string, KnownRow> known;
     Statement stmt = db.Prepare("SELECT path, mtime FROM track");
-    while (stmt.ok() && stmt.Step() == SQLITE_ROW)
-        known[stmt.Text(0)] = KnownRow{stmt.Int(1), false};
+    while (stmt && stmt.Step() == SQLITE_ROW)
+        known[std::string(stmt.ColumnText(0))] = KnownRow{stmt.ColumnInt64(1), false};
     return known;
 }
 
@@ -95,7 +95,7 @@ void BindOptionalNumber(Statement& stmt, int index, int64_t value) {
 }
 
 // Reads the batch's tags (outside any transaction: the slow part), then writes the batch in one.
-bool WriteBatch(SqliteHandle& db, Statement& upsert, const std::vector<const FoundFile*>& batch,
+bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFile*>& batch,
                 IndexReport& report) {
     std::vector<TrackTags> tags;
     tags.reserve(batch.size());
@@ -108,7 +108,7 @@ bool WriteBatch(SqliteHandle& db, Statement& upsert, const std::vector<const Fou
         }
     }
     const int64_t now = static_cast<int64_t>(std::time(nullptr));
-    if (!db.Exec("BEGIN IMMEDIATE"))
+    if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
         return false;
     for (std::size_t i = 0; i < batch.size(); ++i) {
         const TrackTags& t = tags[i];
@@ -126,29 +126,29 @@ bool WriteBatch(SqliteHandle& db, Statement& upsert, const std::vector<const Fou
         upsert.Bind(11, batch[i]->mtime);
         upsert.Bind(12, now);
         if (upsert.Step() != SQLITE_DONE) {
-            db.Exec("ROLLBACK");
+            (db.Execute("ROLLBACK") == SQLITE_OK);
             return false;
         }
     }
-    return db.Exec("COMMIT");
+    return (db.Execute("COMMIT") == SQLITE_OK);
 }
 
-bool RemoveRows(SqliteHandle& db, const std::vector<std::string>& gone) {
+bool RemoveRows(Database& db, const std::vector<std::string>& gone) {
     Statement remove = db.Prepare("DELETE FROM track WHERE path = ?1");
-    if (!remove.ok())
+    if (!remove)
         return false;
     for (std::size_t start = 0; start < gone.size(); start += kIndexBatchSize) {
-        if (!db.Exec("BEGIN IMMEDIATE"))
+        if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
             return false;
         for (std::size_t i = start; i < gone.size() && i < start + kIndexBatchSize; ++i) {
             remove.Reset();
             remove.Bind(1, gone[i]);
             if (remove.Step() != SQLITE_DONE) {
-                db.Exec("ROLLBACK");
+                (db.Execute("ROLLBACK") == SQLITE_OK);
                 return false;
             }
         }
-        if (!db.Exec("COMMIT"))
+        if (!(db.Execute("COMMIT") == SQLITE_OK))
             return false;
     }
     return true;
@@ -169,14 +169,15 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath) {
         return Fail(report, "the audio share " + share + " is not a readable folder");
 
     MakeParentDirs(dbPath);
-    SqliteHandle db;
-    if (!db.Open(dbPath.c_str(), SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, kBusyTimeoutMs)) {
+    Database db =
+        Database::Open(dbPath.c_str(), SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, kBusyTimeoutMs);
+    if (!db) {
         close(shareFd);
-        return Fail(report, "cannot open " + dbPath + ": " + db.error());
+        return Fail(report, "cannot open " + dbPath + ": " + db.Error());
     }
     if (!medialib::EnsureLibrarySchema(db)) {
         close(shareFd);
-        return Fail(report, "cannot create the schema of " + dbPath + ": " + db.error());
+        return Fail(report, "cannot create the schema of " + dbPath + ": " + db.Error());
     }
 
     std::vector<FoundFile> found;
@@ -207,13 +208,13 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath) {
         "excluded.artist, album = excluded.album, album_artist = excluded.album_artist, genre = "
         "excluded.genre, year = excluded.year, track_no = excluded.track_no, disc_no = "
         "excluded.disc_no, duration_ms = excluded.duration_ms, mtime = excluded.mtime");
-    if (!upsert.ok())
-        return Fail(report, "cannot prepare the track update: " + db.error());
+    if (!upsert)
+        return Fail(report, "cannot prepare the track update: " + db.Error());
     for (std::size_t start = 0; start < toRead.size(); start += kIndexBatchSize) {
         const std::size_t end = std::min(toRead.size(), start + kIndexBatchSize);
         const std::vector<const FoundFile*> batch(toRead.begin() + start, toRead.begin() + end);
         if (!WriteBatch(db, upsert, batch, report))
-            return Fail(report, "cannot write tracks: " + db.error());
+            return Fail(report, "cannot write tracks: " + db.Error());
     }
 
     std::vector<std::string> gone;
@@ -223,7 +224,7 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath) {
     }
     report.removed = gone.size();
     if (!RemoveRows(db, gone))
-        return Fail(report, "cannot remove tracks: " + db.error());
+        return Fail(report, "cannot remove tracks: " + db.Error());
     report.ok = true;
     return report;
 }

@@ -10,13 +10,13 @@
 #include "DidlWriter.h"
 #include "MediaFiles.h"
 #include "ObjectIds.h"
-#include "SqliteHandle.h"
+#include "sqlite/Database.h"
 
 namespace harmona::mediad {
 namespace {
 
-using medialib::SqliteHandle;
-using medialib::Statement;
+using sqlite::Database;
+using sqlite::Statement;
 
 constexpr int kBusyTimeoutMs = 5000;
 constexpr int64_t kRandomCount = 100;
@@ -104,34 +104,34 @@ class Library {
         : share_(share), mediaBase_(mediaBase) {
         struct stat st {};
         // A missing database is an empty library, not an error: the indexer has not run yet.
-        if (stat(dbPath.c_str(), &st) == 0)
-            opened_ = db_.Open(dbPath.c_str(), SQLITE_OPEN_READONLY | SQLITE_OPEN_NOMUTEX,
-                               kBusyTimeoutMs);
-        else
+        if (stat(dbPath.c_str(), &st) == 0) {
+            db_ = Database::OpenReadOnly(dbPath.c_str(), kBusyTimeoutMs);
+            opened_ = static_cast<bool>(db_);
+        } else
             opened_ = true;
     }
     bool ok() const { return opened_; }
 
     int64_t Count(const std::string& sql, const std::vector<std::string>& binds) {
         Statement stmt = Prepare(sql, binds);
-        return stmt.ok() && stmt.Step() == SQLITE_ROW ? stmt.Int(0) : 0;
+        return stmt && stmt.Step() == SQLITE_ROW ? stmt.ColumnInt64(0) : 0;
     }
 
     DidlObject TrackObject(const Statement& row, const std::string& parentId) const {
         DidlObject item;
-        item.id = TrackId(row.Int(0));
+        item.id = TrackId(row.ColumnInt64(0));
         item.parentId = parentId;
-        const std::string path = row.Text(1);
-        item.title = row.Text(2);
-        item.artist = row.Text(3);
-        item.album = row.Text(4);
-        item.genre = row.Text(5);
-        item.trackNo = row.Int(6);
-        item.durationMs = row.Int(7);
+        const std::string path = std::string(row.ColumnText(1));
+        item.title = std::string(row.ColumnText(2));
+        item.artist = std::string(row.ColumnText(3));
+        item.album = std::string(row.ColumnText(4));
+        item.genre = std::string(row.ColumnText(5));
+        item.trackNo = row.ColumnInt64(6);
+        item.durationMs = row.ColumnInt64(7);
         item.upnpClass = kMusicTrackClass;
         item.mimeType = medialib::MimeTypeOfPath(path);
         const std::string extension = medialib::LowerExtension(path);
-        item.resUrl = mediaBase_ + std::to_string(row.Int(0));
+        item.resUrl = mediaBase_ + std::to_string(row.ColumnInt64(0));
         if (!extension.empty() && extension.size() <= 5 &&
             extension.find_first_not_of("abcdefghijklmnopqrstuvwxyz0123456789") ==
                 std::string::npos)
@@ -143,7 +143,7 @@ class Library {
                                    const std::string& parentId) {
         std::vector<DidlObject> items;
         Statement stmt = Prepare(sql, binds);
-        while (stmt.ok() && stmt.Step() == SQLITE_ROW)
+        while (stmt && stmt.Step() == SQLITE_ROW)
             items.push_back(TrackObject(stmt, parentId));
         return items;
     }
@@ -154,16 +154,16 @@ class Library {
                                    Make make) {
         std::vector<DidlObject> containers;
         Statement stmt = Prepare(sql, binds);
-        while (stmt.ok() && stmt.Step() == SQLITE_ROW)
+        while (stmt && stmt.Step() == SQLITE_ROW)
             containers.push_back(make(stmt));
         return containers;
     }
 
     Statement Prepare(const std::string& sql, const std::vector<std::string>& binds) {
-        if (!db_.ok())
+        if (!db_)
             return Statement();
         Statement stmt = db_.Prepare(sql.c_str());
-        for (std::size_t i = 0; stmt.ok() && i < binds.size(); ++i)
+        for (std::size_t i = 0; stmt && i < binds.size(); ++i)
             stmt.Bind(static_cast<int>(i + 1), binds[i]);
         return stmt;
     }
@@ -171,7 +171,7 @@ class Library {
     const std::string& share() const { return share_; }
 
   private:
-    SqliteHandle db_;
+    Database db_;
     bool opened_ = false;
     std::string share_;
     std::string mediaBase_;
@@ -231,10 +231,10 @@ std::vector<DidlObject> AlbumRows(Library& lib, const std::string& sql,
                                   const std::vector<std::string>& binds,
                                   const std::string& parentId) {
     return lib.Groups(sql, binds, [&](const Statement& row) {
-        const std::string album = row.Text(0);
-        const std::string albumArtist = row.Text(1);
-        return MakeContainer(AlbumId(albumArtist, album), parentId, album, kAlbumClass, row.Int(2),
-                             albumArtist);
+        const std::string album = std::string(row.ColumnText(0));
+        const std::string albumArtist = std::string(row.ColumnText(1));
+        return MakeContainer(AlbumId(albumArtist, album), parentId, album, kAlbumClass,
+                             row.ColumnInt64(2), albumArtist);
     });
 }
 
@@ -274,13 +274,13 @@ Page ArtistPage(Library& lib, SortOrder order, uint32_t start, uint32_t count) {
                                " AS aa, album FROM track WHERE album <> '') WHERE aa <> ''";
     Page page;
     page.total = lib.Count("SELECT COUNT(DISTINCT aa) FROM " + source, {});
-    page.objects = lib.Groups("SELECT aa, COUNT(DISTINCT album) FROM " + source + " GROUP BY aa" +
-                                  OrderBy(order, "aa COLLATE NOCASE, aa", "aa", "aa") +
-                                  LimitOffset(start, count),
-                              {}, [](const Statement& row) {
-                                  return MakeContainer(ArtistId(row.Text(0)), kAlbumArtistsId,
-                                                       row.Text(0), kArtistClass, row.Int(1));
-                              });
+    page.objects = lib.Groups(
+        "SELECT aa, COUNT(DISTINCT album) FROM " + source + " GROUP BY aa" +
+            OrderBy(order, "aa COLLATE NOCASE, aa", "aa", "aa") + LimitOffset(start, count),
+        {}, [](const Statement& row) {
+            return MakeContainer(ArtistId(std::string(row.ColumnText(0))), kAlbumArtistsId,
+                                 std::string(row.ColumnText(0)), kArtistClass, row.ColumnInt64(1));
+        });
     return page;
 }
 
@@ -291,8 +291,9 @@ Page GenrePage(Library& lib, SortOrder order, uint32_t start, uint32_t count) {
                                   OrderBy(order, "genre COLLATE NOCASE, genre", "genre", "genre") +
                                   LimitOffset(start, count),
                               {}, [](const Statement& row) {
-                                  return MakeContainer(GenreId(row.Text(0)), kGenresId, row.Text(0),
-                                                       kGenreClass, row.Int(1));
+                                  return MakeContainer(GenreId(std::string(row.ColumnText(0))),
+                                                       kGenresId, std::string(row.ColumnText(0)),
+                                                       kGenreClass, row.ColumnInt64(1));
                               });
     return page;
 }
@@ -332,8 +333,8 @@ Page FolderPage(Library& lib, const std::string& relative, const std::string& fo
     Statement stmt = lib.Prepare(std::string("SELECT ") + kTrackColumns +
                                      " FROM track WHERE path > ?1 AND path < ?2 ORDER BY path",
                                  {prefix, upper});
-    while (stmt.ok() && stmt.Step() == SQLITE_ROW) {
-        const std::string rest = stmt.Text(1).substr(prefix.size());
+    while (stmt && stmt.Step() == SQLITE_ROW) {
+        const std::string rest = std::string(stmt.ColumnText(1)).substr(prefix.size());
         const std::size_t slash = rest.find('/');
         if (slash == std::string::npos) {
             items.push_back(lib.TrackObject(stmt, folderId));
@@ -521,9 +522,9 @@ BrowseResult ContentDirectory::Browse(const BrowseArgs& args) const {
 bool ContentDirectory::LookUpTrackFile(int64_t id, std::string* path) const {
     Library lib(dbPath_, sharePath_, mediaBaseUrl_);
     Statement stmt = lib.Prepare("SELECT path FROM track WHERE id = ?1", {std::to_string(id)});
-    if (!stmt.ok() || stmt.Step() != SQLITE_ROW)
+    if (!stmt || stmt.Step() != SQLITE_ROW)
         return false;
-    *path = stmt.Text(0);
+    *path = std::string(stmt.ColumnText(0));
     return !path->empty();
 }
 

@@ -8,8 +8,8 @@
 
 #include "ContentDirectory.h"
 #include "LoopbackRelay.h"
-#include "UpnpLibrary.h"
-#include "UpnpRootDevice.h"
+#include "upnp/UpnpLibrary.h"
+#include "upnp/UpnpRootDevice.h"
 
 namespace harmona::mediad {
 

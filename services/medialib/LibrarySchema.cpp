@@ -1,6 +1,8 @@
 #include "LibrarySchema.h"
 
 namespace harmona::medialib {
+using sqlite::Database;
+using sqlite::Statement;
 namespace {
 
 constexpr const char* kSchema = R"SQL(
@@ -23,26 +25,26 @@ CREATE INDEX IF NOT EXISTS track_genre ON track(genre);
 PRAGMA user_version = 1;
 )SQL";
 
-int UserVersion(SqliteHandle& db) {
+int UserVersion(Database& db) {
     Statement stmt = db.Prepare("PRAGMA user_version");
-    if (!stmt.ok() || stmt.Step() != SQLITE_ROW)
+    if (!stmt || stmt.Step() != SQLITE_ROW)
         return -1;
-    return static_cast<int>(stmt.Int(0));
+    return static_cast<int>(stmt.ColumnInt64(0));
 }
 
 }  // namespace
 
-bool EnsureLibrarySchema(SqliteHandle& db) {
+bool EnsureLibrarySchema(Database& db) {
     const int version = UserVersion(db);
     if (version != 0 && version != kLibrarySchemaVersion)
         return false;
-    if (!db.Exec("BEGIN IMMEDIATE"))
+    if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
         return false;
-    if (!db.Exec(kSchema)) {
-        db.Exec("ROLLBACK");
+    if (!(db.Execute(kSchema) == SQLITE_OK)) {
+        (db.Execute("ROLLBACK") == SQLITE_OK);
         return false;
     }
-    return db.Exec("COMMIT");
+    return (db.Execute("COMMIT") == SQLITE_OK);
 }
 
 }  // namespace harmona::medialib

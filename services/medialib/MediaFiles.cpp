@@ -1,20 +1,13 @@
 #include "MediaFiles.h"
 
-#include <strings.h>
-
 #include <cctype>
 
+#include "AudioDaemon.h"
 #include "PlatformPaths.h"
 #include "VanuSystem.h"
 
 namespace harmona::medialib {
 namespace {
-
-// Stand-in for Part 6.2's IsSupportedAudioFile(1, path) until the daemon client is on main: the
-// list of "any other selector" in its order.
-constexpr const char* kSelectorOneExtensions[] = {"mp3",  "m4a", "ogg", "aac", "wma", "flac",
-                                                  "aiff", "aif", "mp1", "mp2", "mpa", "wav",
-                                                  "ac3",  "ra",  "ram", "m4p", "m4b", "ape"};
 
 struct MimeEntry {
     const char* extension;
@@ -42,17 +35,7 @@ std::string AudioSharePath() {
 }
 
 bool IsIndexableAudioFile(const std::string& path) {
-    if (path.compare(0, 4, "http") == 0)
-        return false;  // streams are for the daemon, never files of the share
-    const std::size_t dot = path.rfind('.');
-    if (dot == std::string::npos)
-        return false;
-    const char* extension = path.c_str() + dot + 1;
-    for (const char* entry : kSelectorOneExtensions) {
-        if (strcasecmp(extension, entry) == 0)
-            return true;
-    }
-    return false;
+    return IsSupportedAudioFile(1, path.c_str()) == 1;
 }
 
 std::string LowerExtension(const std::string& path) {
