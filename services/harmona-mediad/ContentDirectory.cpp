@@ -507,8 +507,12 @@ BrowseResult ContentDirectory::Browse(const BrowseArgs& args) const {
         result.totalMatches = 1;
         return result;
     }
-    if (ref.kind == ObjectKind::Track)
-        return Error(kErrorNoSuchContainer, "No such container");
+    if (ref.kind == ObjectKind::Track) {
+        DidlObject track;
+        return MetadataOf(lib, ref, args.objectId, &track)
+                   ? Error(kErrorNoSuchContainer, "No such container")
+                   : Error(kErrorNoSuchObject, "No such object");
+    }
     Page page = ChildrenOf(lib, ref, args.objectId, order, args.startingIndex, args.requestedCount);
     const bool mayBeEmpty = ref.kind == ObjectKind::Root || ref.kind == ObjectKind::Category;
     if (page.total == 0 && !mayBeEmpty)
