@@ -1,0 +1,338 @@
+// The real vanuaudiod (platform.md section 10, spec Parts 3.2 and 6.1) in the test's private
+// network: its control socket, its robustness against bad clients, its concurrency, and the
+// discovery of real (MiniDLNA) and scripted media servers over a veth link.
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstring>
+#include <future>
+
+#include "DaemonKit.h"
+#include "Fixtures.h"
+
+using namespace harmona::test;
+
+namespace {
+
+constexpr const char* kSocket = "/tmp/vanuaudiod.sock";
+
+Json::Value Reply(const Exchange& exchange) {
+    Json::Value value;
+    EXPECT_TRUE(exchange.answered);
+    EXPECT_TRUE(ParseJson(exchange.reply, value)) << exchange.reply;
+    return value;
+}
+
+// A raw client for the malformed cases: connects and sends `bytes`, optionally closing its
+// sending side; returns the descriptor.
+int SendRaw(const std::string& bytes, bool closeSending) {
+    const int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    std::strcpy(address.sun_path, kSocket);
+    EXPECT_EQ(connect(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
+    EXPECT_EQ(send(fd, bytes.data(), bytes.size(), MSG_NOSIGNAL),
+              static_cast<ssize_t>(bytes.size()));
+    if (closeSending)
+        shutdown(fd, SHUT_WR);
+    return fd;
+}
+
+// Reads the reply (one read) within `timeoutMs`; "" when none.
+std::string ReadReply(int fd, int timeoutMs) {
+    struct timeval limit {
+        timeoutMs / 1000, (timeoutMs % 1000) * 1000
+    };
+    setsockopt(fd, SOL_SOCKET, SO_RCVTIMEO, &limit, sizeof(limit));
+    char buffer[40960];
+    const ssize_t n = recv(fd, buffer, sizeof(buffer), 0);
+    close(fd);
+    return n > 0 ? std::string(buffer, static_cast<std::size_t>(n)) : "";
+}
+
+std::string Record(int32_t command, const std::string& arguments) {
+    std::string record(8196, '\0');
+    std::memcpy(&record[0], &command, 4);
+    std::memcpy(&record[4], arguments.data(), arguments.size());
+    return record;
+}
+
+bool HasServer(const Json::Value& list, const std::string& name) {
+    for (const Json::Value& server : list) {
+        if (server["friendly_name"].asString() == name)
+            return true;
+    }
+    return false;
+}
+
+class Vanuaudiod : public ::testing::Test {
+  protected:
+    void SetUp() override { ASSERT_TRUE(peer_.ok()); }
+    PeerNetwork peer_;
+};
+
+}  // namespace
+
+TEST_F(Vanuaudiod, SocketIsOpenToTheCgiUserAndAStaleOneIsReplaced) {
+    // A stale socket file: bound by a process that is gone.
+    {
+        const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
+        sockaddr_un address{};
+        address.sun_family = AF_UNIX;
+        std::strcpy(address.sun_path, kSocket);
+        ASSERT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
+        close(fd);
+    }
+    Process daemon = StartDaemon();
+    struct stat info {};
+    ASSERT_EQ(stat(kSocket, &info), 0);
+    EXPECT_TRUE(S_ISSOCK(info.st_mode));
+    EXPECT_EQ(info.st_mode & 0777, 0666u);
+    EXPECT_TRUE(Call(16, "0 10").answered);
+}
+
+TEST_F(Vanuaudiod, ASecondDaemonDoesNotTakeOverALiveSocket) {
+    Process first = StartDaemon();
+    Process second = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/second.log");
+    int status = 0;
+    ASSERT_TRUE(second.WaitExit(5000, status));
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 1) << status;
+    EXPECT_NE(ReadFile("/tmp/second.log").find("another daemon"), std::string::npos);
+    EXPECT_TRUE(Call(16, "0 10").answered);
+}
+
+TEST_F(Vanuaudiod, AFileThatIsNotASocketIsLeftAlone) {
+    WriteFile(kSocket, "precious");
+    Process daemon = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/d.log");
+    int status = 0;
+    ASSERT_TRUE(daemon.WaitExit(5000, status));
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 1);
+    EXPECT_EQ(ReadFile(kSocket), "precious");
+}
+
+TEST_F(Vanuaudiod, SigtermAndSigintStopItCleanlyAndRemoveTheSocket) {
+    for (int signal : {SIGTERM, SIGINT}) {
+        Process daemon = StartDaemon();
+        const int status = daemon.Stop(signal, 5000);
+        EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << signal << " " << status;
+        EXPECT_FALSE(Exists(kSocket)) << signal;
+    }
+}
+
+TEST_F(Vanuaudiod, CommandFourteenIsAnsweredAtOnceAndTheListStaysAnswerableDuringTheSearch) {
+    Process daemon = StartDaemon();
+    const Exchange prepare = Call(14);
+    EXPECT_EQ(prepare.reply, "{\"success\": true}");
+    // The search runs now (MX 2 s); pages are answered meanwhile, each within the budget.
+    for (int i = 0; i < 20; ++i) {
+        const Json::Value page = Reply(Call(16, "0 10"));
+        EXPECT_EQ(page["success"], true);
+        EXPECT_TRUE(page["list"].isArray());
+        EXPECT_TRUE(page["total"].isInt());
+    }
+}
+
+TEST_F(Vanuaudiod, OtherCommandCodesAreUnsupported) {
+    Process daemon = StartDaemon();
+    for (int32_t code : {1, 15, 17, 19, 27, 35, 38, 99, -7}) {
+        const Json::Value reply = Reply(Call(code, "1 2"));
+        EXPECT_EQ(reply["success"], false) << code;
+        EXPECT_EQ(reply["error"], "unsupported") << code;
+    }
+}
+
+TEST_F(Vanuaudiod, GarbageAndHalfRecordsDoNotUpsetLaterClients) {
+    Process daemon = StartDaemon();
+    // Garbage, then the client stops sending: a short request.
+    Json::Value reply;
+    ASSERT_TRUE(ParseJson(ReadReply(SendRaw("\xff\xfe garbage \x01\x02", true), 2000), reply));
+    EXPECT_EQ(reply["success"], false);
+    // Half a record, held open: the others are served meanwhile.
+    const int half = SendRaw(Record(16, "0 10").substr(0, 4000), false);
+    for (int i = 0; i < 5; ++i)
+        EXPECT_EQ(Reply(Call(16, "0 10"))["success"], true);
+    // The half record gets an error after the daemon's time limit and is closed.
+    ASSERT_TRUE(ParseJson(ReadReply(half, 4000), reply));
+    EXPECT_EQ(reply["success"], false);
+    EXPECT_EQ(reply["error"], "request timed out");
+    // A record with more bytes after it.
+    ASSERT_TRUE(ParseJson(ReadReply(SendRaw(Record(16, "0 10") + "trailing", false), 2000), reply));
+    EXPECT_EQ(reply["error"], "oversized request");
+    // A record whose argument text has no terminator.
+    std::string unterminated = Record(16, "");
+    std::memset(&unterminated[4], '7', 8192);
+    ASSERT_TRUE(ParseJson(ReadReply(SendRaw(unterminated, false), 2000), reply));
+    EXPECT_EQ(reply["error"], "bad request");
+    // Page arguments that are not two integers.
+    EXPECT_EQ(Reply(Call(16, "zero ten"))["success"], false);
+    // And the daemon is as before.
+    const Json::Value page = Reply(Call(16, "0 10"));
+    EXPECT_EQ(page["success"], true);
+    EXPECT_EQ(waitpid(daemon.pid(), nullptr, WNOHANG), 0);
+}
+
+TEST_F(Vanuaudiod, FiftyClientsAtOnceAreAllAnsweredWithinHalfASecond) {
+    Process daemon = StartDaemon();
+    FakeMediaServers fake;
+    for (int i = 0; i < 12; ++i) {
+        const std::string udn = "uuid:fifty-" + std::to_string(i);
+        fake.Add(udn, FakeMediaServers::DescriptionXml(udn, "Server " + std::to_string(i), "/cd"));
+        fake.Alive(udn, 60);
+    }
+    WaitForList([](const Json::Value& list) { return list.size() == 12; }, 10000);
+    std::promise<void> go;
+    std::shared_future<void> start = go.get_future().share();
+    std::vector<std::future<Exchange>> clients;
+    for (int i = 0; i < 50; ++i) {
+        clients.push_back(std::async(std::launch::async, [start, i] {
+            start.wait();
+            return Call(16, i % 2 == 0 ? "0 10" : "10 10");
+        }));
+    }
+    go.set_value();
+    for (int i = 0; i < 50; ++i) {
+        const Exchange exchange = clients[i].get();
+        ASSERT_TRUE(exchange.answered) << "client " << i << " after " << exchange.ms << " ms";
+        const Json::Value page = Reply(exchange);
+        EXPECT_EQ(page["total"], 12);
+        EXPECT_EQ(page["list"].size(), i % 2 == 0 ? 10u : 2u);
+    }
+}
+
+TEST_F(Vanuaudiod, FindsARealMiniDlnaWithItsContentDirectory) {
+    Process daemon = StartDaemon();
+    Process minidlna = StartMiniDlna(peer_, "Shelf MiniDLNA", 8200);
+    EXPECT_TRUE(Call(14).answered);
+    const std::string text = WaitForList(
+        [](const Json::Value& list) { return HasServer(list, "Shelf MiniDLNA"); }, 15000);
+    Json::Value reply;
+    ASSERT_TRUE(ParseJson(text, reply)) << text;
+    ASSERT_EQ(reply["list"].size(), 1u) << text << ReadFile("/tmp/vanuaudiod.log");
+    const Json::Value& server = reply["list"][0];
+    EXPECT_EQ(server["control_url"], "http://10.77.0.2:8200/ctl/ContentDir");
+    EXPECT_EQ(server["ip"], kPeerAddress);
+    EXPECT_EQ(server["udn"].asString().rfind("uuid:", 0), 0u);
+    EXPECT_EQ(reply["total"], 1);
+}
+
+TEST_F(Vanuaudiod, AStoppedServerDisappearsAfterItsByebye) {
+    Process daemon = StartDaemon();
+    Process minidlna = StartMiniDlna(peer_, "Leaving MiniDLNA", 8201);
+    Call(14);
+    ASSERT_TRUE(HasServer(
+        [] {
+            Json::Value r;
+            ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 15000), r);
+            return r["list"];
+        }(),
+        "Leaving MiniDLNA"));
+    // MiniDLNA announces a max-age of 130 s: gone within seconds means its byebye was heard.
+    minidlna.Stop(SIGTERM, 5000);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.empty(); }, 5000), reply));
+    EXPECT_EQ(reply["list"].size(), 0u);
+    EXPECT_EQ(reply["total"], 0);
+}
+
+TEST_F(Vanuaudiod, AServerThatStopsAnnouncingExpiresAfterItsMaxAge) {
+    Process daemon = StartDaemon();
+    FakeMediaServers fake;
+    fake.Add("uuid:short", FakeMediaServers::DescriptionXml("uuid:short", "Short Lived", "/cd"));
+    fake.Add("uuid:long", FakeMediaServers::DescriptionXml("uuid:long", "Long Lived", "/cd"));
+    fake.Alive("uuid:short", 2);
+    fake.Alive("uuid:long", 300);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 2; }, 5000), reply));
+    ASSERT_EQ(reply["list"].size(), 2u);
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 6000), reply));
+    ASSERT_EQ(reply["list"].size(), 1u);
+    EXPECT_EQ(reply["list"][0]["friendly_name"], "Long Lived");
+}
+
+TEST_F(Vanuaudiod, ServersAreListedInAStableOrderAndPaged) {
+    Process daemon = StartDaemon();
+    FakeMediaServers fake;
+    // Announced in a scrambled order; two share a name.
+    const std::vector<std::pair<std::string, std::string>> devices = {
+        {"uuid:c", "Charlie"}, {"uuid:a2", "Alpha"}, {"uuid:b", "Bravo"}, {"uuid:a1", "Alpha"}};
+    for (const auto& [udn, name] : devices) {
+        fake.Add(udn, FakeMediaServers::DescriptionXml(udn, name, "/cd/" + udn));
+        fake.Alive(udn, 60);
+    }
+    WaitForList([](const Json::Value& l) { return l.size() == 4; }, 5000);
+    const Json::Value first = Reply(Call(16, "0 3"));
+    const Json::Value second = Reply(Call(16, "3 3"));
+    ASSERT_EQ(first["list"].size(), 3u);
+    ASSERT_EQ(second["list"].size(), 1u);
+    EXPECT_EQ(first["total"], 4);
+    EXPECT_EQ(first["list"][0]["udn"], "uuid:a1");
+    EXPECT_EQ(first["list"][1]["udn"], "uuid:a2");
+    EXPECT_EQ(first["list"][2]["udn"], "uuid:b");
+    EXPECT_EQ(second["list"][0]["udn"], "uuid:c");
+    EXPECT_EQ(first["list"][0]["control_url"],
+              "http://10.77.0.1:" + std::to_string(fake.Port()) + "/cd/uuid:a1");
+}
+
+TEST_F(Vanuaudiod, ByebyeOfOneServerLeavesTheOthers) {
+    Process daemon = StartDaemon();
+    FakeMediaServers fake;
+    for (const char* udn : {"uuid:stay", "uuid:go"}) {
+        fake.Add(udn, FakeMediaServers::DescriptionXml(udn, udn + 5, "/cd"));
+        fake.Alive(udn, 300);
+    }
+    WaitForList([](const Json::Value& l) { return l.size() == 2; }, 5000);
+    fake.Byebye("uuid:go");
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 3000), reply));
+    ASSERT_EQ(reply["list"].size(), 1u);
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:stay");
+}
+
+TEST_F(Vanuaudiod, DevicesWithoutAUsableDescriptionAreNotListed) {
+    Process daemon = StartDaemon();
+    FakeMediaServers fake;
+    fake.Add("uuid:broken", "<root><device><deviceType>nonsense");
+    fake.Add("uuid:nocd", FakeMediaServers::DescriptionXml("uuid:nocd", "No CD", ""));
+    fake.Add("uuid:good", FakeMediaServers::DescriptionXml("uuid:good", "Good", "/cd"));
+    fake.Alive("uuid:broken", 60);
+    fake.Alive("uuid:nocd", 60);
+    fake.Alive("uuid:missing", 60);  // its location answers 404
+    fake.Alive("uuid:good", 60);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
+    // Give the broken ones the same time to (not) show up.
+    std::this_thread::sleep_for(std::chrono::milliseconds(500));
+    reply = Reply(Call(16, "0 10"));
+    ASSERT_EQ(reply["list"].size(), 1u);
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:good");
+}
+
+TEST_F(Vanuaudiod, HostileNamesAreCleanedAndRepliesStayInsideTheClientsBuffer) {
+    Process daemon = StartDaemon();
+    FakeMediaServers fake;
+    // Long names of quotes (twice as long once escaped) and invalid UTF-8.
+    for (int i = 0; i < 15; ++i) {
+        const std::string udn = "uuid:big-" + std::to_string(10 + i);
+        fake.Add(udn, FakeMediaServers::DescriptionXml(
+                          udn, std::string(3000, '"') + "\xff" + std::to_string(i), "/cd"));
+        fake.Alive(udn, 60);
+    }
+    WaitForList([](const Json::Value& l) { return l.size() == 15; }, 8000);
+    const Exchange page = Call(16, "0 15");
+    ASSERT_TRUE(page.answered);
+    EXPECT_LT(page.reply.size(), 40960u);
+    const Json::Value reply = Reply(page);
+    EXPECT_EQ(reply["total"], 15);
+    ASSERT_GE(reply["list"].size(), 10u);  // a page of Part 3.2's size always fits
+    EXPECT_EQ(reply["list"][0]["friendly_name"].asString(), std::string(512, '"'));
+}
