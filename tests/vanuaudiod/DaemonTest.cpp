@@ -73,7 +73,19 @@ bool HasServer(const Json::Value& list, const std::string& name) {
 class Vanuaudiod : public ::testing::Test {
   protected:
     void SetUp() override { ASSERT_TRUE(peer_.ok()); }
+    // The daemon of the test ends the way a service manager ends it: SIGTERM, then a clean exit
+    // with nothing from the sanitizers (in the sanitizer build) in its output.
+    void TearDown() override {
+        if (!daemon_.started())
+            return;
+        const int status = daemon_.Stop(SIGTERM, 5000);
+        EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << "status " << status;
+        const std::string log = ReadFile("/tmp/vanuaudiod.log");
+        EXPECT_EQ(log.find("Sanitizer"), std::string::npos) << log;
+        EXPECT_EQ(log.find("runtime error"), std::string::npos) << log;
+    }
     PeerNetwork peer_;
+    Process daemon_;
 };
 
 }  // namespace
@@ -88,7 +100,7 @@ TEST_F(Vanuaudiod, SocketIsOpenToTheCgiUserAndAStaleOneIsReplaced) {
         ASSERT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
         close(fd);
     }
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     struct stat info {};
     ASSERT_EQ(stat(kSocket, &info), 0);
     EXPECT_TRUE(S_ISSOCK(info.st_mode));
@@ -97,7 +109,7 @@ TEST_F(Vanuaudiod, SocketIsOpenToTheCgiUserAndAStaleOneIsReplaced) {
 }
 
 TEST_F(Vanuaudiod, ASecondDaemonDoesNotTakeOverALiveSocket) {
-    Process first = StartDaemon();
+    daemon_ = StartDaemon();
     Process second = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/second.log");
     int status = 0;
     ASSERT_TRUE(second.WaitExit(5000, status));
@@ -117,15 +129,16 @@ TEST_F(Vanuaudiod, AFileThatIsNotASocketIsLeftAlone) {
 
 TEST_F(Vanuaudiod, SigtermAndSigintStopItCleanlyAndRemoveTheSocket) {
     for (int signal : {SIGTERM, SIGINT}) {
-        Process daemon = StartDaemon();
-        const int status = daemon.Stop(signal, 5000);
+        daemon_ = StartDaemon();
+        const int status = daemon_.Stop(signal, 5000);
         EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << signal << " " << status;
         EXPECT_FALSE(Exists(kSocket)) << signal;
+        EXPECT_EQ(ReadFile("/tmp/vanuaudiod.log").find("Sanitizer"), std::string::npos);
     }
 }
 
 TEST_F(Vanuaudiod, CommandFourteenIsAnsweredAtOnceAndTheListStaysAnswerableDuringTheSearch) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     const Exchange prepare = Call(14);
     EXPECT_EQ(prepare.reply, "{\"success\": true}");
     // The search runs now (MX 2 s); pages are answered meanwhile, each within the budget.
@@ -138,7 +151,7 @@ TEST_F(Vanuaudiod, CommandFourteenIsAnsweredAtOnceAndTheListStaysAnswerableDurin
 }
 
 TEST_F(Vanuaudiod, OtherCommandCodesAreUnsupported) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     for (int32_t code : {1, 15, 17, 19, 27, 35, 38, 99, -7}) {
         const Json::Value reply = Reply(Call(code, "1 2"));
         EXPECT_EQ(reply["success"], false) << code;
@@ -147,7 +160,7 @@ TEST_F(Vanuaudiod, OtherCommandCodesAreUnsupported) {
 }
 
 TEST_F(Vanuaudiod, GarbageAndHalfRecordsDoNotUpsetLaterClients) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     // Garbage, then the client stops sending: a short request.
     Json::Value reply;
     ASSERT_TRUE(ParseJson(ReadReply(SendRaw("\xff\xfe garbage \x01\x02", true), 2000), reply));
@@ -173,11 +186,11 @@ TEST_F(Vanuaudiod, GarbageAndHalfRecordsDoNotUpsetLaterClients) {
     // And the daemon is as before.
     const Json::Value page = Reply(Call(16, "0 10"));
     EXPECT_EQ(page["success"], true);
-    EXPECT_EQ(waitpid(daemon.pid(), nullptr, WNOHANG), 0);
+    EXPECT_EQ(waitpid(daemon_.pid(), nullptr, WNOHANG), 0);
 }
 
 TEST_F(Vanuaudiod, FiftyClientsAtOnceAreAllAnsweredWithinHalfASecond) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     FakeMediaServers fake;
     for (int i = 0; i < 12; ++i) {
         const std::string udn = "uuid:fifty-" + std::to_string(i);
@@ -205,7 +218,7 @@ TEST_F(Vanuaudiod, FiftyClientsAtOnceAreAllAnsweredWithinHalfASecond) {
 }
 
 TEST_F(Vanuaudiod, FindsARealMiniDlnaWithItsContentDirectory) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     Process minidlna = StartMiniDlna(peer_, "Shelf MiniDLNA", 8200);
     EXPECT_TRUE(Call(14).answered);
     const std::string text = WaitForList(
@@ -221,7 +234,7 @@ TEST_F(Vanuaudiod, FindsARealMiniDlnaWithItsContentDirectory) {
 }
 
 TEST_F(Vanuaudiod, AStoppedServerDisappearsAfterItsByebye) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     Process minidlna = StartMiniDlna(peer_, "Leaving MiniDLNA", 8201);
     Call(14);
     ASSERT_TRUE(HasServer(
@@ -241,7 +254,7 @@ TEST_F(Vanuaudiod, AStoppedServerDisappearsAfterItsByebye) {
 }
 
 TEST_F(Vanuaudiod, AServerThatStopsAnnouncingExpiresAfterItsMaxAge) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     FakeMediaServers fake;
     fake.Add("uuid:short", FakeMediaServers::DescriptionXml("uuid:short", "Short Lived", "/cd"));
     fake.Add("uuid:long", FakeMediaServers::DescriptionXml("uuid:long", "Long Lived", "/cd"));
@@ -258,7 +271,7 @@ TEST_F(Vanuaudiod, AServerThatStopsAnnouncingExpiresAfterItsMaxAge) {
 }
 
 TEST_F(Vanuaudiod, ServersAreListedInAStableOrderAndPaged) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     FakeMediaServers fake;
     // Announced in a scrambled order; two share a name.
     const std::vector<std::pair<std::string, std::string>> devices = {
@@ -282,7 +295,7 @@ TEST_F(Vanuaudiod, ServersAreListedInAStableOrderAndPaged) {
 }
 
 TEST_F(Vanuaudiod, ByebyeOfOneServerLeavesTheOthers) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     FakeMediaServers fake;
     for (const char* udn : {"uuid:stay", "uuid:go"}) {
         fake.Add(udn, FakeMediaServers::DescriptionXml(udn, udn + 5, "/cd"));
@@ -298,7 +311,7 @@ TEST_F(Vanuaudiod, ByebyeOfOneServerLeavesTheOthers) {
 }
 
 TEST_F(Vanuaudiod, DevicesWithoutAUsableDescriptionAreNotListed) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     FakeMediaServers fake;
     fake.Add("uuid:broken", "<root><device><deviceType>nonsense");
     fake.Add("uuid:nocd", FakeMediaServers::DescriptionXml("uuid:nocd", "No CD", ""));
@@ -318,7 +331,7 @@ TEST_F(Vanuaudiod, DevicesWithoutAUsableDescriptionAreNotListed) {
 }
 
 TEST_F(Vanuaudiod, HostileNamesAreCleanedAndRepliesStayInsideTheClientsBuffer) {
-    Process daemon = StartDaemon();
+    daemon_ = StartDaemon();
     FakeMediaServers fake;
     // Long names of quotes (twice as long once escaped) and invalid UTF-8.
     for (int i = 0; i < 15; ++i) {
