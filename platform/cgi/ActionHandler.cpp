@@ -1,12 +1,10 @@
 #include "ActionHandler.h"
 
-#include <json/writer.h>
-
 #include <cstdio>
 #include <memory>
 #include <sstream>
 
-#include "Utf8.h"
+#include "JsonWriter.h"
 
 namespace harmona::cgi {
 namespace {
@@ -27,13 +25,12 @@ void MakeObject(Json::Value& reply) {
 }  // namespace
 
 std::string SerializeReply(Json::Value value) {
+    // A null reply is the empty list, at the top level only.
     if (value.isNull())
-        value = Json::Value(Json::arrayValue);
-    RepairUtf8(value);
-    Json::StreamWriterBuilder builder;
-    builder["indentation"] = "";
-    builder["emitUTF8"] = true;
-    return Json::writeString(builder, value);
+        return "[]";
+    std::string text;
+    WriteCompactJson(value, text);
+    return text;
 }
 
 }  // namespace harmona::cgi

@@ -7,8 +7,9 @@ namespace {
 
 constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
 
-// Length of the well-formed sequence starting at text[i], or 0 (Unicode table 3-7).
-std::size_t SequenceLength(std::string_view text, std::size_t i) {
+}  // namespace
+
+std::size_t Utf8SequenceLength(std::string_view text, std::size_t i) {
     const auto byte = [&](std::size_t k) { return static_cast<unsigned char>(text[k]); };
     const unsigned char b0 = byte(i);
     if (b0 < 0x80)
@@ -43,11 +44,9 @@ std::size_t SequenceLength(std::string_view text, std::size_t i) {
     return length;
 }
 
-}  // namespace
-
 bool IsValidUtf8(std::string_view text) {
     for (std::size_t i = 0; i < text.size();) {
-        const std::size_t length = SequenceLength(text, i);
+        const std::size_t length = Utf8SequenceLength(text, i);
         if (length == 0)
             return false;
         i += length;
@@ -59,7 +58,7 @@ std::string RepairUtf8(std::string_view text) {
     std::string out;
     out.reserve(text.size());
     for (std::size_t i = 0; i < text.size();) {
-        const std::size_t length = SequenceLength(text, i);
+        const std::size_t length = Utf8SequenceLength(text, i);
         if (length == 0) {
             out += kReplacement;
             ++i;
@@ -71,35 +70,5 @@ std::string RepairUtf8(std::string_view text) {
     return out;
 }
 
-void RepairUtf8(Json::Value& value) {
-    if (value.isString()) {
-        const char* begin = nullptr;
-        const char* end = nullptr;
-        value.getString(&begin, &end);
-        const std::string_view text(begin, static_cast<std::size_t>(end - begin));
-        if (!IsValidUtf8(text))
-            value = RepairUtf8(text);
-    } else if (value.isArray()) {
-        for (Json::Value& element : value)
-            RepairUtf8(element);
-    } else if (value.isObject()) {
-        bool namesValid = true;
-        for (const std::string& name : value.getMemberNames())
-            namesValid = namesValid && IsValidUtf8(name);
-        if (namesValid) {
-            for (Json::Value& member : value)
-                RepairUtf8(member);
-            return;
-        }
-        // Rebuild the object under repaired names (two bad names may now coincide; the later wins).
-        Json::Value repaired(Json::objectValue);
-        for (const std::string& name : value.getMemberNames()) {
-            Json::Value member = value[name];
-            RepairUtf8(member);
-            repaired[RepairUtf8(name)] = std::move(member);
-        }
-        value = std::move(repaired);
-    }
-}
 
 }  // namespace harmona::cgi

@@ -1,12 +1,14 @@
 // Repair of text that is not valid UTF-8, so that every reply is valid UTF-8 JSON.
 #pragma once
 
-#include <json/value.h>
-
 #include <string>
 #include <string_view>
 
 namespace harmona::cgi {
+
+// Length of the well-formed UTF-8 sequence that starts at text[i], or 0 when none does (no
+// overlong forms, surrogates or values above U+10FFFF; Unicode table 3-7).
+std::size_t Utf8SequenceLength(std::string_view text, std::size_t i);
 
 // True when `text` is well-formed UTF-8 (no overlong forms, surrogates or values above U+10FFFF).
 bool IsValidUtf8(std::string_view text);
@@ -14,7 +16,5 @@ bool IsValidUtf8(std::string_view text);
 // Each byte that does not start a well-formed sequence becomes U+FFFD.
 std::string RepairUtf8(std::string_view text);
 
-// Repairs every string and member name inside `value`, in place.
-void RepairUtf8(Json::Value& value);
 
 }  // namespace harmona::cgi

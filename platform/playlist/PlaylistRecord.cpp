@@ -23,7 +23,8 @@ void CopyUtf8Field(char* field, std::size_t size, std::string_view text) {
         while (length > 0 && (static_cast<unsigned char>(text[length]) & 0xC0) == 0x80)
             --length;
     }
-    std::memcpy(field, text.data(), length);
+    if (length > 0)  // an empty view may have a null data(), which memcpy must not get
+        std::memcpy(field, text.data(), length);
     field[length] = '\0';
 }
 

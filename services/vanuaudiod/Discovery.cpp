@@ -6,11 +6,11 @@
 
 #include <cstring>
 
-#include "ControlPoint.h"
 #include "Description.h"
 #include "HttpGet.h"
 #include "Protocol.h"
-#include "UpnpLibrary.h"
+#include "upnp/ControlPoint.h"
+#include "upnp/UpnpLibrary.h"
 
 namespace vanuaudiod {
 namespace {

@@ -21,8 +21,29 @@ int HarmonaHandler::Process() {
     if (action == nullptr)
         return 0;
 
-    // The builders of "gettreenode", "refresh" and "rerandom100" are connected here as their Parts
-    // land (spec, Order of building); until then those actions are unknown actions.
+    // Part 1.1's dispatch table, tested in its order; every comparison is exact.
+    if (std::strcmp(action, "gettreenode") == 0) {
+        const char* node = webMan.In("node", nullptr);
+        if (node == nullptr)
+            return 0;
+        const int built =
+            std::strcmp(node, "audiotree_root") == 0 ? BuildRootTree() : GetChildNodes(node);
+        return built != 0 ? 1 : 0;
+    }
+    if (std::strcmp(action, "refresh") == 0) {
+        // "refresh" does not test that target is present (Part 1.1); an absent target goes to
+        // RefreshNode, which answers it like an unknown target: an empty reply.
+        const char* target = webMan.In("target", nullptr);
+        if (target != nullptr && std::strcmp(target, "mediaserver") == 0)
+            RefreshMediaServers();
+        else
+            RefreshNode(target);
+        return 1;  // whatever the builder did
+    }
+    if (std::strcmp(action, "rerandom100") == 0) {
+        CreateRandom100Playlist();  // prints its own reply (Part 4.4)
+        return 1;
+    }
     Json::Value reply(Json::objectValue);
     reply["success"] = true;
     if (std::strcmp(action, "avoid_timeout") == 0) {

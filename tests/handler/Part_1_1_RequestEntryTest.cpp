@@ -81,4 +81,44 @@ TEST_F(Part_1_1, LongestValidUserNameIsAuthorized) {
     EXPECT_EQ(r.body, "{\"success\":true}\n");
 }
 
+// The dispatch of "gettreenode" and "refresh" to their builders.
+
+TEST_F(Part_1_1, AudiotreeRootRunsTheRootBuilder) {
+    const CgiResult r = Get("action=gettreenode&node=audiotree_root");
+    EXPECT_EQ(r.exitStatus, 1);
+    ASSERT_TRUE(r.json.isArray()) << r.output;
+    // The radio category is always there, so the root builder answered.
+    bool radio = false;
+    for (const Json::Value& node : r.json)
+        radio = radio || node["id"] == "inetradio_root";
+    EXPECT_TRUE(radio) << r.body;
+}
+
+TEST_F(Part_1_1, UpperCaseRootIsRoutedToChildNodes) {
+    const CgiResult r = Get("action=gettreenode&node=AUDIOTREE_ROOT");
+    // "AUDIOTREE_ROOT" is a family "AUDIOTREE" with rest "ROOT": Part 2.2 answers with an empty
+    // reply.
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_EQ(r.body, "[]\n");
+}
+
+TEST_F(Part_1_1, RefreshMediaserverRunsTheMediaServerRefresh) {
+    const CgiResult r = Get("action=refresh&target=mediaserver");
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_EQ(r.json["success"], true);
+    EXPECT_TRUE(r.json.isMember("items"));
+}
+
+TEST_F(Part_1_1, RefreshIPodGoesToRefreshNodeAndExitsWithOne) {
+    const CgiResult r = Get("action=refresh&target=ipod");
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_EQ(r.json["success"], true);
+}
+
+TEST_F(Part_1_1, GettreenodeWithoutNodePrintsNothing) {
+    const CgiResult r = Get("action=gettreenode");
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.output, "");
+}
+
 }  // namespace

@@ -74,6 +74,19 @@ TEST(PrintResponse, InvalidUtf8InValuesAndNamesIsRepaired) {
     EXPECT_EQ(parsed["list"][0].asString(), "\xEF\xBF\xBD");
 }
 
+// Found by fuzz_reply_utf8: two bad member names repair to the same name; the object must still
+// hold each name once (strict parsers reject duplicates).
+TEST(PrintResponse, BadNamesThatCoincideAfterRepairAreWrittenOnce) {
+    Json::Value reply(Json::objectValue);
+    reply["\xB5"] = "first";
+    reply["\xC3"] = "second";
+    reply["ok"] = 1;
+    const std::string text = SerializeReply(reply);
+    EXPECT_EQ(text, "{\"ok\":1,\"\xEF\xBF\xBD\":\"second\"}");
+    Json::Value parsed;
+    EXPECT_TRUE(harmona::test::ParseJson(text, parsed)) << text;
+}
+
 TEST(SetError, ArrayElementsMoveToItemsInOrder) {
     TestHandler handler;
     Json::Value reply;

@@ -1,4 +1,4 @@
-#include "ControlPoint.h"
+#include "upnp/ControlPoint.h"
 
 #include <upnp/upnptools.h>
 

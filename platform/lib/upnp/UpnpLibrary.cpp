@@ -1,4 +1,4 @@
-#include "UpnpLibrary.h"
+#include "upnp/UpnpLibrary.h"
 
 #include <upnp/upnp.h>
 #include <upnp/upnptools.h>

@@ -1,0 +1,30 @@
+// What every benchmark measures of a CGI process: its wall time from spawn to exit (reply read to
+// its end), and its own peak resident memory (VmHWM read at its exit under ptrace; ru_maxrss would
+// also count the benchmark process, whose pages a spawned child shares until its exec).
+#pragma once
+
+#include <string>
+#include <vector>
+
+namespace harmona::bench {
+
+struct ProcessRun {
+    double wallMs = 0;
+    int exitStatus = -1;  // -1 when it did not exit normally
+    std::string output;   // standard output
+};
+
+// Runs `program` with exactly `environment` ("NAME=value") and standard input from /dev/null.
+ProcessRun RunProcess(const std::string& program, const std::vector<std::string>& environment);
+
+// The program's VmHWM in KiB at its exit (-1 when it could not be read); output discarded.
+long PeakMemoryKb(const std::string& program, const std::vector<std::string>& environment);
+
+// A GET request's CGI environment.
+std::vector<std::string> CgiEnvironment(const std::string& queryString, const std::string& user);
+
+double Median(std::vector<double> samples);
+// p from 0 to 1.
+double Percentile(std::vector<double> samples, double p);
+
+}  // namespace harmona::bench

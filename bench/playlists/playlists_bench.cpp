@@ -1,0 +1,384 @@
+// Playlist requests as a web server sees them: wall time and peak memory (VmHWM) of whole CGI
+// processes (spawn, reply read to the end, exit), beside a trivial C CGI timed in the same run, in
+// rounds that interleave the programs so that drift of the machine hits all alike.
+//
+// 1. "rerandom100" of the real audiotree.cgi over library.db files of 1,000, 100,000 and 1,000,000
+//    tracks (Part 4.4). Target: at 1,000,000 tracks within 2x its time at 1,000.
+// 2. The playlist category listings (Parts 4.1 to 4.3) with 10,000 personal playlist files, a
+//    personal smart playlist file of 10,000 playlists, and 10,000 shared playlists plus 10,000
+//    shared smart playlists. These builders are reached from a real request only through the root
+//    tree and the refresh action, not yet connected; bench_playlists_category_cgi is a CGI process
+//    that authorizes and serves one category's children with the real builders, as those requests
+//    will.
+//
+// Runs as root in a private mount namespace of its own, with tmpfs over /var/packages, /usr/vanu
+// and /tmp holding the fixtures; nothing reaches the real machine but empty mount points.
+#include <fcntl.h>
+#include <sched.h>
+#include <spawn.h>
+#include <sys/mount.h>
+#include <sys/ptrace.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <fstream>
+#include <numeric>
+#include <string>
+#include <vector>
+
+#include "sqlite/Database.h"
+#include "Plugin.h"
+
+namespace {
+
+[[noreturn]] void Die(const std::string& what) {
+    std::fprintf(stderr, "bench_playlists: %s: %s\n", what.c_str(), std::strerror(errno));
+    std::exit(2);
+}
+
+void MakeDirs(const std::string& path) {
+    for (std::size_t i = 1; i <= path.size(); ++i)
+        if (i == path.size() || path[i] == '/')
+            if (mkdir(path.substr(0, i).c_str(), 0755) != 0 && errno != EEXIST)
+                Die("mkdir " + path.substr(0, i));
+}
+
+void WriteFile(const std::string& path, const std::string& content) {
+    MakeDirs(path.substr(0, path.rfind('/')));
+    std::ofstream out(path, std::ios::binary | std::ios::trunc);
+    out << content;
+    if (!out)
+        Die("write " + path);
+}
+
+void EnterPrivateRoots() {
+    if (unshare(CLONE_NEWNS) != 0)
+        Die("unshare(CLONE_NEWNS) (run as root)");
+    if (mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0)
+        Die("make / private");
+    for (const char* root : {"/var/packages", "/usr/vanu", "/tmp"}) {
+        MakeDirs(root);
+        if (mount("tmpfs", root, "tmpfs", 0, "mode=1777") != 0)
+            Die(std::string("mount tmpfs ") + root);
+    }
+}
+
+constexpr const char* kLibraryDb = "/var/packages/Harmona/var/library.db";
+
+void Exec(harmona::sqlite::Database& db, const char* sql) {
+    if (db.Execute(sql) != SQLITE_OK) {
+        std::fprintf(stderr, "bench_playlists: %s: %s\n", sql, db.Error().c_str());
+        std::exit(2);
+    }
+}
+
+// library.db (platform.md section 6) with `tracks` tracks (ids 1..N) and `playlists` shared
+// playlists.
+void MakeLibrary(long tracks, int playlists) {
+    MakeDirs("/var/packages/Harmona/var");
+    unlink(kLibraryDb);
+    harmona::sqlite::Database db = harmona::sqlite::Database::Open(
+        kLibraryDb, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, 5000);
+    if (!db)
+        Die("create " + std::string(kLibraryDb));
+    Exec(db,
+         "PRAGMA user_version = 1; PRAGMA journal_mode = OFF; PRAGMA synchronous = OFF;"
+         "CREATE TABLE track (id INTEGER PRIMARY KEY, path TEXT NOT NULL UNIQUE, title TEXT,"
+         " artist TEXT, album TEXT, album_artist TEXT, genre TEXT, year INTEGER, track_no INTEGER,"
+         " disc_no INTEGER, duration_ms INTEGER, mtime INTEGER, added INTEGER);"
+         "CREATE TABLE playlist (id INTEGER PRIMARY KEY CHECK (id BETWEEN 0 AND 4294967295),"
+         " name TEXT NOT NULL);"
+         "CREATE TABLE playlist_entry (playlist_id INTEGER NOT NULL REFERENCES playlist(id) ON"
+         " DELETE CASCADE, position INTEGER NOT NULL, path TEXT NOT NULL,"
+         " PRIMARY KEY (playlist_id, position));"
+         "BEGIN");
+    harmona::sqlite::Statement track = db.Prepare(
+        "INSERT INTO track (id, path, title, artist, album, genre, duration_ms, added)"
+        " VALUES (?1, ?2, ?3, ?4, ?5, 'Rock', ?6, 0)");
+    for (long i = 1; i <= tracks; ++i) {
+        const std::string artist = "Artist " + std::to_string(i % 997);
+        track.Reset();
+        track.Bind(1, std::int64_t{i});
+        track.Bind(2, "/volume1/music/" + artist + "/Album " + std::to_string(i % 8191) +
+                          "/Track " + std::to_string(i) + ".mp3");
+        track.Bind(3, "Title " + std::to_string(i));
+        track.Bind(4, artist);
+        track.Bind(5, "Album " + std::to_string(i % 8191));
+        track.Bind(6, std::int64_t{(i % 600 + 60) * 1000});
+        if (track.Step() != SQLITE_DONE)
+            Die("insert track");
+    }
+    harmona::sqlite::Statement playlist = db.Prepare("INSERT INTO playlist VALUES (?1, ?2)");
+    for (int i = 0; i < playlists; ++i) {
+        playlist.Reset();
+        playlist.Bind(1, std::int64_t{i + 1});
+        playlist.Bind(2, "Shared playlist " + std::to_string((i * 7919) % playlists));
+        if (playlist.Step() != SQLITE_DONE)
+            Die("insert playlist");
+    }
+    Exec(db, "COMMIT");
+}
+
+std::string SmartFile(int count, const char* prefix) {
+    std::string text;
+    for (int i = 0; i < count; ++i)
+        text += "[" + std::string(prefix) + std::to_string((i * 7919) % count) +
+                "]\nrule0=\"genre is Rock\"\n";
+    return text;
+}
+
+struct Program {
+    std::string label;
+    std::string path;
+    std::string query;
+    std::string user;
+    std::string expect;  // a text the reply must hold
+    std::vector<double> ms;
+    std::vector<long> maxRssKb;  // peak resident memory (VmHWM) of one traced run
+};
+
+// Runs one CGI process to its end; returns its wall time in ms and its output.
+double RunOnce(const Program& program, std::string& output, long& maxRssKb) {
+    const std::vector<std::string> env = {"GATEWAY_INTERFACE=CGI/1.1", "REQUEST_METHOD=GET",
+                                          "QUERY_STRING=" + program.query,
+                                          "REMOTE_USER=" + program.user, "PATH=/usr/bin:/bin"};
+    std::vector<char*> envp;
+    for (const std::string& e : env)
+        envp.push_back(const_cast<char*>(e.c_str()));
+    envp.push_back(nullptr);
+    char* argv[] = {const_cast<char*>(program.path.c_str()), nullptr};
+
+    int out[2];
+    if (pipe2(out, O_CLOEXEC) != 0)
+        Die("pipe");
+    posix_spawn_file_actions_t actions;
+    posix_spawn_file_actions_init(&actions);
+    posix_spawn_file_actions_adddup2(&actions, out[1], 1);
+    posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
+
+    const auto start = std::chrono::steady_clock::now();
+    pid_t pid = 0;
+    if (posix_spawn(&pid, program.path.c_str(), &actions, nullptr, argv, envp.data()) != 0)
+        Die("spawn " + program.path);
+    close(out[1]);
+    output.clear();
+    char buffer[65536];
+    for (;;) {
+        const ssize_t n = read(out[0], buffer, sizeof(buffer));
+        if (n < 0 && errno == EINTR)
+            continue;
+        if (n <= 0)
+            break;
+        output.append(buffer, static_cast<std::size_t>(n));
+    }
+    int status = 0;
+    rusage usage{};
+    while (wait4(pid, &status, 0, &usage) < 0 && errno == EINTR) {
+    }
+    const auto end = std::chrono::steady_clock::now();
+    close(out[0]);
+    posix_spawn_file_actions_destroy(&actions);
+    maxRssKb = usage.ru_maxrss;
+    return std::chrono::duration<double, std::milli>(end - start).count();
+}
+
+// Peak resident memory of the program's own image: the child is traced, stopped at its exit, and
+// its VmHWM read then. (ru_maxrss would also count this big benchmark process, whose memory a
+// spawned child shares until its exec.) Output goes to /dev/null; not timed.
+long PeakMemoryKb(const Program& program) {
+    const std::vector<std::string> env = {"GATEWAY_INTERFACE=CGI/1.1", "REQUEST_METHOD=GET",
+                                          "QUERY_STRING=" + program.query,
+                                          "REMOTE_USER=" + program.user, "PATH=/usr/bin:/bin"};
+    std::vector<char*> envp;
+    for (const std::string& e : env)
+        envp.push_back(const_cast<char*>(e.c_str()));
+    envp.push_back(nullptr);
+    char* argv[] = {const_cast<char*>(program.path.c_str()), nullptr};
+    const pid_t pid = fork();
+    if (pid < 0)
+        Die("fork");
+    if (pid == 0) {
+        const int null = open("/dev/null", O_RDWR);
+        dup2(null, 0);
+        dup2(null, 1);
+        ptrace(PTRACE_TRACEME, 0, nullptr, nullptr);
+        execve(argv[0], argv, envp.data());
+        _exit(127);
+    }
+    int status = 0;
+    waitpid(pid, &status, 0);  // stopped after its exec
+    ptrace(PTRACE_SETOPTIONS, pid, nullptr, reinterpret_cast<void*>(PTRACE_O_TRACEEXIT));
+    ptrace(PTRACE_CONT, pid, nullptr, nullptr);
+    long peakKb = -1;
+    while (waitpid(pid, &status, 0) == pid && !WIFEXITED(status) && !WIFSIGNALED(status)) {
+        if (status >> 8 == (SIGTRAP | (PTRACE_EVENT_EXIT << 8))) {
+            std::ifstream in("/proc/" + std::to_string(pid) + "/status");
+            std::string line;
+            while (std::getline(in, line))
+                if (line.rfind("VmHWM:", 0) == 0)
+                    peakKb = std::atol(line.c_str() + 6);
+        }
+        const int signal = WIFSTOPPED(status) && WSTOPSIG(status) != SIGTRAP ? WSTOPSIG(status) : 0;
+        ptrace(PTRACE_CONT, pid, nullptr, reinterpret_cast<void*>(static_cast<long>(signal)));
+    }
+    return peakKb;
+}
+
+template <typename T>
+double Median(std::vector<T> v) {
+    std::sort(v.begin(), v.end());
+    const std::size_t n = v.size();
+    return n % 2 ? double(v[n / 2]) : (double(v[n / 2 - 1]) + double(v[n / 2])) / 2;
+}
+
+double Percentile(std::vector<double> v, double p) {
+    std::sort(v.begin(), v.end());
+    return v[std::min(v.size() - 1, static_cast<std::size_t>(p * static_cast<double>(v.size())))];
+}
+
+// Runs `programs` in `runs` interleaved rounds (after a warm-up) and prints the figures.
+void Measure(const std::string& title, std::vector<Program>& programs, int runs) {
+    std::string output;
+    long rss = 0;
+    for (Program& program : programs) {
+        RunOnce(program, output, rss);
+        if (output.find(program.expect) == std::string::npos) {
+            std::fprintf(stderr, "bench_playlists: %s: unexpected reply:\n%.2000s\n",
+                         program.label.c_str(), output.c_str());
+            std::exit(2);
+        }
+    }
+    for (Program& program : programs)
+        program.maxRssKb.push_back(PeakMemoryKb(program));
+    for (int warm = 0; warm < 5; ++warm)
+        for (Program& program : programs)
+            RunOnce(program, output, rss);
+    for (int round = 0; round < runs; ++round) {
+        for (std::size_t k = 0; k < programs.size(); ++k) {
+            Program& program = programs[(k + static_cast<std::size_t>(round)) % programs.size()];
+            program.ms.push_back(RunOnce(program, output, rss));
+        }
+    }
+    const double trivialMedian = Median(programs[0].ms);
+    std::printf("\n%s (%d runs each)\n", title.c_str(), runs);
+    std::printf("  %-46s %9s %9s %9s %9s %10s\n", "program", "median", "p90", "min", "x trivial",
+                "peak mem");
+    for (const Program& program : programs)
+        std::printf("  %-46s %7.3fms %7.3fms %7.3fms %8.2fx %7.0f KiB\n", program.label.c_str(),
+                    Median(program.ms), Percentile(program.ms, 0.9),
+                    *std::min_element(program.ms.begin(), program.ms.end()),
+                    Median(program.ms) / trivialMedian, Median(program.maxRssKb));
+    std::fflush(stdout);
+}
+
+std::vector<long> ParseSizes(const char* text) {
+    std::vector<long> sizes;
+    for (const char* at = text; *at != '\0';) {
+        char* end = nullptr;
+        const long n = std::strtol(at, &end, 10);
+        if (end == at || n < 1)
+            Die("bad --sizes");
+        sizes.push_back(n);
+        at = *end == ',' ? end + 1 : end;
+    }
+    return sizes;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    int runs = 100;
+    int lists = 10000;
+    std::vector<long> sizes = {1000, 100000, 1000000};
+    for (int i = 1; i + 1 < argc; i += 2) {
+        if (std::strcmp(argv[i], "--runs") == 0)
+            runs = std::max(1, std::atoi(argv[i + 1]));
+        else if (std::strcmp(argv[i], "--lists") == 0)
+            lists = std::max(1, std::atoi(argv[i + 1]));
+        else if (std::strcmp(argv[i], "--sizes") == 0)
+            sizes = ParseSizes(argv[i + 1]);
+    }
+    const std::string dir = harmona::plugin::ProgramDirectory();
+    EnterPrivateRoots();
+    WriteFile(
+        "/var/packages/Harmona/etc/users.conf",
+        "[admin]\npermission=29\nlanguage=enu\n[alice]\npermission=29\n[bob]\npermission=29\n");
+    WriteFile("/var/packages/Harmona/target/app/texts/enu/strings",
+              "[player]\nrefresh_btn_title=Refresh\n[playlist]\nnewplaylist=\"New Playlist\"\n"
+              "error_create_random100=\"Could not create the random playlist.\"\n");
+
+    const std::string trivial = dir + "bench_trivial_cgi";
+    const std::string cgi = dir + "audiotree.cgi";
+    const std::string categoryCgi = dir + "bench_playlists_category_cgi";
+    const std::string ok = "{\"success\":true}";
+
+    std::vector<double> randomMedians;
+    for (long size : sizes) {
+        const auto start = std::chrono::steady_clock::now();
+        MakeLibrary(size, 0);
+        std::printf(
+            "\n[library.db with %ld tracks written in %.1f s]\n", size,
+            std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count());
+        std::vector<Program> programs = {
+            {"trivial C CGI", trivial, "", "admin", ok, {}, {}},
+            {"audiotree.cgi rerandom100, " + std::to_string(size) + " tracks",
+             cgi,
+             "action=rerandom100",
+             "admin",
+             ok,
+             {},
+             {}}};
+        Measure("Random-100 over " + std::to_string(size) + " tracks", programs, runs);
+        randomMedians.push_back(Median(programs[1].ms));
+    }
+    if (randomMedians.size() > 1)
+        std::printf("\nRandom-100 median at %ld tracks / at %ld tracks: %.2fx (target <= 2x)\n",
+                    sizes.back(), sizes.front(), randomMedians.back() / randomMedians.front());
+
+    // The listings: alice has `lists` playlist files, bob a smart playlist file of `lists`
+    // playlists; the shared category has `lists` playlists and `lists` smart playlists.
+    MakeLibrary(1000, lists);
+    for (int i = 0; i < lists; ++i)
+        WriteFile("/usr/vanu/etc/preference/alice/playlists/Playlist " +
+                      std::to_string((i * 7919) % lists) + ".m3u",
+                  "#EXTM3U\n");
+    WriteFile("/usr/vanu/etc/preference/bob/playlists/smart.playlist", SmartFile(lists, "Smart "));
+    WriteFile("/var/packages/Harmona/etc/smart.playlist", SmartFile(lists, "Shared smart "));
+    const std::string n = std::to_string(lists);
+    std::vector<Program> listings = {
+        {"trivial C CGI", trivial, "", "admin", ok, {}, {}},
+        {"personal category, " + n + " playlist files",
+         categoryCgi,
+         "category=personal",
+         "alice",
+         "musiclib_music_personal/playlist/Playlist " + std::to_string(lists - 1),
+         {},
+         {}},
+        {"personal category, " + n + " smart playlists",
+         categoryCgi,
+         "category=personal",
+         "bob",
+         "musiclib_music_personal/smart/Smart " + std::to_string(lists - 1),
+         {},
+         {}},
+        {"shared category, " + n + " + " + n + " smart",
+         categoryCgi,
+         "category=shared",
+         "admin",
+         "musiclib_music_shared/smart/Shared smart " + std::to_string(lists - 1),
+         {},
+         {}}};
+    Measure(
+        "Playlist category listings (builders in a CGI process; root/refresh not yet connected)",
+        listings, runs);
+    return 0;
+}

@@ -1,0 +1,223 @@
+// Start-up cost of the audio tree CGI: wall time of whole CGI processes (spawn, reply read to the
+// end, exit) as a web server sees them, beside a trivial C CGI timed in the same run, in rounds
+// that interleave the programs so that drift of the machine hits all alike.
+//
+// Runs as root in a private mount namespace of its own, with tmpfs over /var/packages and
+// /usr/vanu holding the fixtures (users.conf, a text table, an iPod database written with libgpod
+// and its mountpoint file); nothing reaches the real machine but two empty mount points.
+#include <fcntl.h>
+#include <spawn.h>
+#include <sys/mount.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <sched.h>
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <fstream>
+#include <numeric>
+#include <string>
+#include <vector>
+
+#include "gpod/Database.h"
+#include "Plugin.h"
+
+extern char** environ;
+
+namespace {
+
+[[noreturn]] void Die(const std::string& what) {
+    std::fprintf(stderr, "bench_startup: %s: %s\n", what.c_str(), std::strerror(errno));
+    std::exit(2);
+}
+
+void MakeDirs(const std::string& path) {
+    for (std::size_t i = 1; i <= path.size(); ++i)
+        if (i == path.size() || path[i] == '/')
+            if (mkdir(path.substr(0, i).c_str(), 0755) != 0 && errno != EEXIST)
+                Die("mkdir " + path.substr(0, i));
+}
+
+void WriteFile(const std::string& path, const std::string& content) {
+    MakeDirs(path.substr(0, path.rfind('/')));
+    std::ofstream out(path, std::ios::binary | std::ios::trunc);
+    out << content;
+    if (!out)
+        Die("write " + path);
+}
+
+void EnterPrivateRoots() {
+    if (unshare(CLONE_NEWNS) != 0)
+        Die("unshare(CLONE_NEWNS) (run as root)");
+    if (mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0)
+        Die("make / private");
+    for (const char* root : {"/var/packages", "/usr/vanu"}) {
+        MakeDirs(root);
+        if (mount("tmpfs", root, "tmpfs", 0, "mode=755") != 0)
+            Die(std::string("mount tmpfs ") + root);
+    }
+}
+
+constexpr const char* kIPodMount = "/usr/vanu/bench-ipod";
+
+void AttachIPod(int playlists) {
+    MakeDirs(std::string(kIPodMount) + "/iPod_Control/iTunes");
+    harmona::gpod::Database database = harmona::gpod::Database::Create(kIPodMount);
+    Itdb_Playlist* master = itdb_playlist_new("iPod", FALSE);
+    itdb_playlist_set_mpl(master);
+    itdb_playlist_add(database.Get(), master, -1);
+    for (int i = 0; i < playlists; ++i)
+        itdb_playlist_add(database.Get(),
+                          itdb_playlist_new(("Playlist " + std::to_string(i)).c_str(), FALSE), -1);
+    std::string error;
+    if (!database.Write(error)) {
+        std::fprintf(stderr, "bench_startup: itdb_write: %s\n", error.c_str());
+        std::exit(2);
+    }
+    WriteFile("/usr/vanu/etc/audio/ipod/mountpoint", std::string(kIPodMount) + "\n");
+}
+
+struct Program {
+    std::string label;
+    std::string path;
+    std::string query;
+    std::string expect;  // a text the reply must hold
+    std::vector<double> ms;
+};
+
+// Runs one CGI process to its end; returns its wall time in ms and its standard output.
+double RunOnce(const Program& program, std::string& output) {
+    const std::vector<std::string> env = {"GATEWAY_INTERFACE=CGI/1.1", "REQUEST_METHOD=GET",
+                                          "QUERY_STRING=" + program.query, "REMOTE_USER=admin",
+                                          "PATH=/usr/bin:/bin"};
+    std::vector<char*> envp;
+    for (const std::string& e : env)
+        envp.push_back(const_cast<char*>(e.c_str()));
+    envp.push_back(nullptr);
+    char* argv[] = {const_cast<char*>(program.path.c_str()), nullptr};
+
+    int out[2];
+    if (pipe2(out, O_CLOEXEC) != 0)
+        Die("pipe");
+    posix_spawn_file_actions_t actions;
+    posix_spawn_file_actions_init(&actions);
+    posix_spawn_file_actions_adddup2(&actions, out[1], 1);
+    posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
+
+    const auto start = std::chrono::steady_clock::now();
+    pid_t pid = 0;
+    if (posix_spawn(&pid, program.path.c_str(), &actions, nullptr, argv, envp.data()) != 0)
+        Die("spawn " + program.path);
+    close(out[1]);
+    output.clear();
+    char buffer[65536];
+    for (;;) {
+        const ssize_t n = read(out[0], buffer, sizeof(buffer));
+        if (n < 0 && errno == EINTR)
+            continue;
+        if (n <= 0)
+            break;
+        output.append(buffer, static_cast<std::size_t>(n));
+    }
+    int status = 0;
+    while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
+    }
+    const auto end = std::chrono::steady_clock::now();
+    close(out[0]);
+    posix_spawn_file_actions_destroy(&actions);
+    return std::chrono::duration<double, std::milli>(end - start).count();
+}
+
+double Median(std::vector<double> v) {
+    std::sort(v.begin(), v.end());
+    const std::size_t n = v.size();
+    return n % 2 ? v[n / 2] : (v[n / 2 - 1] + v[n / 2]) / 2;
+}
+
+double Mean(const std::vector<double>& v) {
+    return std::accumulate(v.begin(), v.end(), 0.0) / static_cast<double>(v.size());
+}
+
+double Percentile(std::vector<double> v, double p) {
+    std::sort(v.begin(), v.end());
+    return v[std::min(v.size() - 1, static_cast<std::size_t>(p * static_cast<double>(v.size())))];
+}
+
+// Runs `programs` in `runs` interleaved rounds (after a warm-up) and prints the figures.
+void Measure(const char* title, std::vector<Program>& programs, int runs) {
+    std::string output;
+    for (Program& program : programs) {
+        RunOnce(program, output);
+        if (output.find(program.expect) == std::string::npos) {
+            std::fprintf(stderr, "bench_startup: %s: unexpected reply:\n%s\n",
+                         program.label.c_str(), output.c_str());
+            std::exit(2);
+        }
+    }
+    for (int warm = 0; warm < 20; ++warm)
+        for (Program& program : programs)
+            RunOnce(program, output);
+    for (int round = 0; round < runs; ++round) {
+        // Rotate the order so that no program always runs right after another.
+        for (std::size_t k = 0; k < programs.size(); ++k) {
+            Program& program = programs[(k + static_cast<std::size_t>(round)) % programs.size()];
+            program.ms.push_back(RunOnce(program, output));
+        }
+    }
+    const double trivialMedian = Median(programs[0].ms);
+    const double trivialMean = Mean(programs[0].ms);
+    std::printf("\n%s (%d runs each)\n", title, runs);
+    std::printf("  %-34s %8s %8s %8s %8s %9s %9s\n", "program", "median", "mean", "p90", "min",
+                "x median", "x mean");
+    for (const Program& program : programs)
+        std::printf("  %-34s %7.3fms %7.3fms %7.3fms %7.3fms %8.2fx %8.2fx\n",
+                    program.label.c_str(), Median(program.ms), Mean(program.ms),
+                    Percentile(program.ms, 0.9),
+                    *std::min_element(program.ms.begin(), program.ms.end()),
+                    Median(program.ms) / trivialMedian, Mean(program.ms) / trivialMean);
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    int runs = 400;
+    int playlists = 50;
+    for (int i = 1; i + 1 < argc; i += 2) {
+        if (std::strcmp(argv[i], "--runs") == 0)
+            runs = std::max(1, std::atoi(argv[i + 1]));
+        else if (std::strcmp(argv[i], "--playlists") == 0)
+            playlists = std::max(0, std::atoi(argv[i + 1]));
+    }
+    const std::string dir = harmona::plugin::ProgramDirectory();
+    EnterPrivateRoots();
+    WriteFile("/var/packages/Harmona/etc/users.conf", "[admin]\npermission=29\nlanguage=enu\n");
+    WriteFile("/var/packages/Harmona/target/app/texts/enu/strings",
+              "[player]\nrefresh_btn_title=Refresh\n");
+
+    const std::string trivial = dir + "bench_trivial_cgi";
+    const std::string cgi = dir + "audiotree.cgi";
+    const std::string ipodCgi = dir + "bench_ipod_cgi";
+    const std::string ok = "{\"success\":true}";
+
+    std::vector<Program> plain = {
+        {"trivial C CGI", trivial, "", ok, {}},
+        {"audiotree.cgi avoid_timeout", cgi, "action=avoid_timeout", ok, {}}};
+    Measure("No iPod attached", plain, runs);
+
+    AttachIPod(playlists);
+    std::vector<Program> ipod = {
+        {"trivial C CGI", trivial, "", ok, {}},
+        {"audiotree.cgi avoid_timeout", cgi, "action=avoid_timeout", ok, {}},
+        {"iPod children (" + std::to_string(playlists) + " playlists)",
+         ipodCgi,
+         "",
+         playlists > 0 ? "ipod_root" : "ipod_refresh",
+         {}}};
+    Measure("iPod attached", ipod, runs);
+    return 0;
+}

@@ -1,0 +1,40 @@
+// A ContentDirectory:1 Browse request (platform.md section 9): what to browse and where.
+#pragma once
+
+#include <string>
+
+enum DMAGENT_BROWSETYPES {
+    BrowseMetadata = 0,
+    BrowseDirectChildren = 1,
+};
+
+class DMABrowse {
+  public:
+    DMABrowse(DMAGENT_BROWSETYPES type, std::string controlUrl);
+    virtual ~DMABrowse();
+
+    // Checks and builds the request: non-zero when the control URL is not an absolute http:// URL
+    // or the object id is empty (or the browse type is unknown); 0 when it is ready to be sent.
+    virtual int Prepare();
+
+    std::string objectId;
+    std::string filter = "*";
+    unsigned int startingIndex = 0;
+    unsigned int requestedCount = 0;  // 0: every object (the parser pages as needed)
+    std::string sortCriteria;
+
+    DMAGENT_BROWSETYPES Type() const { return type_; }
+    const std::string& ControlUrl() const { return controlUrl_; }
+    // "BrowseMetadata" or "BrowseDirectChildren".
+    const char* BrowseFlag() const;
+    // True after a successful Prepare.
+    bool IsPrepared() const { return prepared_; }
+    // The SOAP envelope that Prepare built (the first page).
+    const std::string& Envelope() const { return envelope_; }
+
+  private:
+    DMAGENT_BROWSETYPES type_;
+    std::string controlUrl_;
+    bool prepared_ = false;
+    std::string envelope_;
+};

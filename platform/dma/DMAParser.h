@@ -1,0 +1,41 @@
+// Sends a ContentDirectory:1 Browse and parses its reply (platform.md section 9). The HTTP client
+// lives in the on-demand plugin of HttpPost.h, loaded only here.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "DMABrowse.h"
+#include "ItemNode.h"
+
+class DMAParser {
+  public:
+    using ItemList = std::vector<ItemNode*>;
+
+    DMAParser() = default;
+    ~DMAParser();
+    DMAParser(const DMAParser&) = delete;
+    DMAParser& operator=(const DMAParser&) = delete;
+
+    // Sends the prepared browse (every page of it when requestedCount is 0) and parses the reply;
+    // 0 on a BrowseResponse, non-zero on any failure (see platform.md section 9).
+    int Parse(DMABrowse* browse);
+
+    // The parse result: null when the reply had no Result (or an empty one), else the DIDL-Lite
+    // objects in document order. The items belong to the parser.
+    const ItemList* GetResult() const { return hasResult_ ? &items_ : nullptr; }
+
+    // TotalMatches of the last page (0 when absent).
+    unsigned long TotalMatches() const { return totalMatches_; }
+    // Why the last Parse failed ("" after a success).
+    const std::string& Error() const { return error_; }
+
+  private:
+    void Clear();
+    int Fail(std::string why);
+
+    ItemList items_;
+    bool hasResult_ = false;
+    unsigned long totalMatches_ = 0;
+    std::string error_;
+};

@@ -1,0 +1,95 @@
+// The HTTP plugin: one POST with libcurl, with the time limits and the streaming reply of
+// HttpPost.h. Built as a MODULE and loaded on demand (see HttpPost.h for why).
+#include <cstdio>
+#include <cstring>
+
+#include "curl/Easy.h"
+#include "HttpPost.h"
+
+namespace {
+
+struct SinkState {
+    const harmona_http_post_request* request;
+    bool aborted = false;
+};
+
+size_t WriteToSink(char* data, size_t size, size_t count, void* context) {
+    auto* state = static_cast<SinkState*>(context);
+    const size_t bytes = size * count;
+    if (state->request->sink(state->request->sinkContext, data, bytes) != 0) {
+        state->aborted = true;
+        return 0;  // anything other than `bytes` makes libcurl abort with CURLE_WRITE_ERROR
+    }
+    return bytes;
+}
+
+void SetError(harmona_http_post_result* result, const char* text) {
+    std::snprintf(result->error, sizeof(result->error), "%s", text);
+}
+
+// Every option that matters for a hostile or slow server; false when libcurl refused one.
+bool Configure(harmona::curl::Easy& easy, const harmona_http_post_request* request,
+               harmona::curl::StringList& headers, SinkState& state) {
+    bool ok = true;
+    ok &= easy.SetOption(CURLOPT_URL, request->url) == CURLE_OK;
+    // Only plain HTTP, never a redirect, never a proxy from the environment, no signals (SIGALRM
+    // for DNS time-outs would disturb the CGI).
+    ok &= easy.SetOption(CURLOPT_PROTOCOLS_STR, "http") == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_FOLLOWLOCATION, 0L) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_NOPROXY, "*") == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_NOSIGNAL, 1L) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_CONNECTTIMEOUT_MS, request->connectTimeoutMs) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_TIMEOUT_MS, request->totalTimeoutMs) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_POST, 1L) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_POSTFIELDS, request->body) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(request->bodySize)) ==
+          CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_WRITEFUNCTION, WriteToSink) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_WRITEDATA, &state) == CURLE_OK;
+    for (size_t i = 0; i < request->headerCount; ++i)
+        ok &= headers.Append(request->headers[i]);
+    // libcurl would wait up to a second for "100 Continue" on a large body; servers rarely send it.
+    ok &= headers.Append("Expect:");
+    ok &= easy.SetOption(CURLOPT_HTTPHEADER, headers.Get()) == CURLE_OK;
+    return ok;
+}
+
+}  // namespace
+
+extern "C" __attribute__((visibility("default"))) int harmona_http_post(
+    const harmona_http_post_request* request, harmona_http_post_result* result) {
+    if (result == nullptr)
+        return -1;
+    result->status = 0;
+    result->aborted = 0;
+    result->error[0] = '\0';
+    if (request == nullptr || request->url == nullptr || request->sink == nullptr ||
+        (request->body == nullptr && request->bodySize != 0)) {
+        SetError(result, "bad request");
+        return -1;
+    }
+    harmona::curl::GlobalInit global;
+    if (!global.Ok()) {
+        SetError(result, "curl_global_init failed");
+        return -1;
+    }
+    harmona::curl::Easy easy;
+    if (!easy) {
+        SetError(result, "curl_easy_init failed");
+        return -1;
+    }
+    harmona::curl::StringList headers;
+    SinkState state{request};
+    if (!Configure(easy, request, headers, state)) {
+        SetError(result, "curl refused an option");
+        return -1;
+    }
+    const CURLcode code = easy.Perform();
+    result->status = easy.ResponseCode();
+    result->aborted = state.aborted ? 1 : 0;
+    if (code != CURLE_OK) {
+        SetError(result, curl_easy_strerror(code));
+        return -1;
+    }
+    return 0;
+}

@@ -1,0 +1,258 @@
+#include "SoapBrowse.h"
+
+#include <cstdlib>
+#include <cstring>
+#include <pugixml.hpp>
+
+#include "ItemNode.h"
+
+namespace harmona::dma {
+
+std::string XmlEscape(const std::string& text) {
+    std::string out;
+    out.reserve(text.size() + text.size() / 8);
+    for (const char c : text) {
+        switch (c) {
+            case '&':
+                out += "&amp;";
+                break;
+            case '<':
+                out += "&lt;";
+                break;
+            case '>':
+                out += "&gt;";
+                break;
+            case '"':
+                out += "&quot;";
+                break;
+            case '\'':
+                out += "&apos;";
+                break;
+            case '\r':
+                out += "&#13;";
+                break;
+            case '\n':
+                out += "&#10;";
+                break;
+            case '\t':
+                out += "&#9;";
+                break;
+            default:
+                out += c;
+        }
+    }
+    return out;
+}
+
+bool IsAbsoluteHttpUrl(const std::string& url) {
+    static constexpr char kScheme[] = "http://";
+    const std::size_t schemeLength = sizeof(kScheme) - 1;
+    if (url.size() <= schemeLength || strncasecmp(url.c_str(), kScheme, schemeLength) != 0)
+        return false;
+    const std::size_t hostEnd = url.find_first_of("/?#", schemeLength);
+    const std::string authority = url.substr(schemeLength, hostEnd - schemeLength);
+    if (authority.empty() || authority[0] == ':' || authority.find('@') != std::string::npos)
+        return false;
+    for (const char c : url)
+        if (static_cast<unsigned char>(c) <= 0x20 || c == 0x7f)
+            return false;
+    return true;
+}
+
+std::string BuildBrowseEnvelope(const std::string& objectId, const char* browseFlag,
+                                const std::string& filter, unsigned long startingIndex,
+                                unsigned long requestedCount, const std::string& sortCriteria) {
+    std::string body;
+    body.reserve(512 + objectId.size() * 2);
+    body += "<?xml version=\"1.0\" encoding=\"utf-8\"?>\r\n";
+    body += "<s:Envelope xmlns:s=\"";
+    body += kSoapEnvelopeNs;
+    body += "\" s:encodingStyle=\"http://schemas.xmlsoap.org/soap/encoding/\"><s:Body>";
+    body += "<u:Browse xmlns:u=\"";
+    body += kContentDirectoryNs;
+    body += "\"><ObjectID>" + XmlEscape(objectId) + "</ObjectID>";
+    body += "<BrowseFlag>" + XmlEscape(browseFlag) + "</BrowseFlag>";
+    body += "<Filter>" + XmlEscape(filter) + "</Filter>";
+    body += "<StartingIndex>" + std::to_string(startingIndex) + "</StartingIndex>";
+    body += "<RequestedCount>" + std::to_string(requestedCount) + "</RequestedCount>";
+    body += "<SortCriteria>" + XmlEscape(sortCriteria) + "</SortCriteria>";
+    body += "</u:Browse></s:Body></s:Envelope>\r\n";
+    return body;
+}
+
+namespace {
+
+// pugixml knows no namespaces: these resolve an element's prefix through the xmlns declarations of
+// the element and its ancestors, so that any prefix (or a default namespace) matches by URI.
+const char* LocalName(const char* qualified) {
+    const char* colon = std::strchr(qualified, ':');
+    return colon != nullptr ? colon + 1 : qualified;
+}
+
+const char* NamespaceOf(pugi::xml_node element) {
+    const char* name = element.name();
+    const char* colon = std::strchr(name, ':');
+    std::string attribute = "xmlns";
+    if (colon != nullptr)
+        attribute += ":" + std::string(name, colon);
+    for (pugi::xml_node n = element; n.type() == pugi::node_element; n = n.parent()) {
+        const pugi::xml_attribute declaration = n.attribute(attribute.c_str());
+        if (declaration)
+            return declaration.value();
+    }
+    return "";
+}
+
+bool Is(pugi::xml_node element, const char* ns, const char* local) {
+    return element.type() == pugi::node_element &&
+           std::strcmp(LocalName(element.name()), local) == 0 &&
+           std::strcmp(NamespaceOf(element), ns) == 0;
+}
+
+pugi::xml_node FindChild(pugi::xml_node parent, const char* ns, const char* local) {
+    for (pugi::xml_node child : parent.children())
+        if (Is(child, ns, local))
+            return child;
+    return {};
+}
+
+// A child element by local name only: the arguments of a SOAP action reply are unqualified, but
+// some servers qualify them; either is accepted.
+pugi::xml_node FindArgument(pugi::xml_node parent, const char* local) {
+    for (pugi::xml_node child : parent.children())
+        if (child.type() == pugi::node_element && std::strcmp(LocalName(child.name()), local) == 0)
+            return child;
+    return {};
+}
+
+// All character data directly inside `element` (text and CDATA pieces joined).
+std::string TextOf(pugi::xml_node element) {
+    std::string text;
+    for (pugi::xml_node child : element.children())
+        if (child.type() == pugi::node_pcdata || child.type() == pugi::node_cdata)
+            text += child.value();
+    return text;
+}
+
+unsigned long ToUnsigned(const std::string& text) {
+    const char* begin = text.c_str();
+    while (*begin == ' ' || *begin == '\t' || *begin == '\r' || *begin == '\n')
+        ++begin;
+    if (*begin < '0' || *begin > '9')
+        return 0;
+    return std::strtoul(begin, nullptr, 10);
+}
+
+std::string Trimmed(const std::string& text) {
+    const std::size_t first = text.find_first_not_of(" \t\r\n");
+    if (first == std::string::npos)
+        return "";
+    const std::size_t last = text.find_last_not_of(" \t\r\n");
+    return text.substr(first, last - first + 1);
+}
+
+constexpr unsigned kParseOptions = pugi::parse_default;  // no parse_doctype: a DTD is skipped
+
+bool ParseInPlace(pugi::xml_document& document, std::string& text) {
+    const pugi::xml_parse_result parsed =
+        document.load_buffer_inplace(text.data(), text.size(), kParseOptions, pugi::encoding_auto);
+    return static_cast<bool>(parsed);
+}
+
+const char* ContentDirectoryPrefix = "urn:schemas-upnp-org:service:ContentDirectory:";
+
+}  // namespace
+
+ReplyStatus ParseBrowseResponse(std::string& reply, BrowsePage& page) {
+    page = BrowsePage{};
+    pugi::xml_document document;
+    if (!ParseInPlace(document, reply))
+        return ReplyStatus::Malformed;
+    const pugi::xml_node envelope = document.document_element();
+    if (!Is(envelope, kSoapEnvelopeNs, "Envelope"))
+        return ReplyStatus::Malformed;
+    const pugi::xml_node body = FindChild(envelope, kSoapEnvelopeNs, "Body");
+    if (!body)
+        return ReplyStatus::Malformed;
+    if (FindChild(body, kSoapEnvelopeNs, "Fault"))
+        return ReplyStatus::Fault;
+    pugi::xml_node response;
+    for (pugi::xml_node child : body.children()) {
+        if (child.type() == pugi::node_element &&
+            std::strcmp(LocalName(child.name()), "BrowseResponse") == 0 &&
+            std::strncmp(NamespaceOf(child), ContentDirectoryPrefix,
+                         std::strlen(ContentDirectoryPrefix)) == 0) {
+            response = child;
+            break;
+        }
+    }
+    if (!response)
+        return ReplyStatus::NotBrowseResponse;
+    const pugi::xml_node result = FindArgument(response, "Result");
+    if (result) {
+        page.result = TextOf(result);
+        page.hasResult = !Trimmed(page.result).empty();
+    }
+    page.totalMatches = ToUnsigned(TextOf(FindArgument(response, "TotalMatches")));
+    page.numberReturned = ToUnsigned(TextOf(FindArgument(response, "NumberReturned")));
+    return ReplyStatus::Ok;
+}
+
+namespace {
+
+void FillItem(pugi::xml_node object, ItemNode& item) {
+    item.isContainer = std::strcmp(LocalName(object.name()), "container") == 0;
+    item.id = object.attribute("id").value();
+    item.parentID = object.attribute("parentID").value();
+    item.childCount = object.attribute("childCount").value();
+    std::string creator;
+    bool haveRes = false, haveArtist = false;
+    for (pugi::xml_node child : object.children()) {
+        if (child.type() != pugi::node_element)
+            continue;
+        const char* local = LocalName(child.name());
+        const char* ns = NamespaceOf(child);
+        if (std::strcmp(ns, kDublinCoreNs) == 0) {
+            if (std::strcmp(local, "title") == 0)
+                item.title = TextOf(child);
+            else if (std::strcmp(local, "creator") == 0)
+                creator = TextOf(child);
+        } else if (std::strcmp(ns, kUpnpNs) == 0) {
+            if (std::strcmp(local, "class") == 0)
+                item.upnpClass = Trimmed(TextOf(child));
+            else if (std::strcmp(local, "artist") == 0 && !haveArtist) {
+                item.artist = TextOf(child);
+                haveArtist = true;
+            } else if (std::strcmp(local, "album") == 0)
+                item.album = TextOf(child);
+        } else if (std::strcmp(ns, kDidlNs) == 0 && std::strcmp(local, "res") == 0 && !haveRes) {
+            item.res = Trimmed(TextOf(child));
+            haveRes = true;
+        }
+    }
+    if (!haveArtist)
+        item.artist = creator;
+}
+
+}  // namespace
+
+long ParseDidl(std::string& didl, std::vector<ItemNode*>& items) {
+    pugi::xml_document document;
+    if (!ParseInPlace(document, didl))
+        return -1;
+    const pugi::xml_node root = document.document_element();
+    if (!Is(root, kDidlNs, "DIDL-Lite"))
+        return -1;
+    long count = 0;
+    for (pugi::xml_node object : root.children()) {
+        if (!Is(object, kDidlNs, "container") && !Is(object, kDidlNs, "item"))
+            continue;
+        auto* item = new ItemNode;
+        FillItem(object, *item);
+        items.push_back(item);
+        ++count;
+    }
+    return count;
+}
+
+}  // namespace harmona::dma

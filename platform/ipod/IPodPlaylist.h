@@ -1,0 +1,33 @@
+// The iPod library of the platform (platform.md section 8; spec Part 5.1).
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+
+#include "PlaylistRecord.h"
+
+// Lists the playlists of the attached iPod: the mountpoint file's first line names the folder that
+// holds iPod_Control; its database is read with libgpod (loaded on demand, see IPodPluginApi.h).
+// In database order, without the master playlist; name = the playlist's name (cut to 254 bytes on a
+// UTF-8 boundary), key = its 64-bit id as 16 lowercase hexadecimal digits. Returns 0 with *head
+// set (null when there is no playlist; free with VANUPlayListFree), or -1 with *head null when the
+// mountpoint file is missing or unusable, the database cannot be read or the reader plugin is
+// missing.
+int VANUIPodPlaylistGetAll(PLAYLIST_INFO** head);
+
+namespace harmona::ipod {
+
+// The longest first line of the mountpoint file that is accepted (PATH_MAX - 1).
+inline constexpr std::size_t kMaxMountpointBytes = 4095;
+
+// Reads the first line of the mountpoint file at `path` (a regular file; at most
+// kMaxMountpointBytes bytes before the line end are read, a CR before the LF is dropped). False
+// when the file is missing or not a regular file, or the line is empty, too long, holds a NUL byte
+// or is not an absolute path.
+bool ReadMountpoint(const char* path, std::string& mountpoint);
+
+// The key of a playlist: its id as 16 lowercase hexadecimal digits.
+std::string FormatIPodKey(std::uint64_t id);
+
+}  // namespace harmona::ipod

@@ -1,0 +1,21 @@
+// How every platform call opens library.db (platform.md section 6): read-only, with a busy timeout
+// so that a running indexer never makes a request fail, and only when it is a regular file (a FIFO
+// or device planted there could block or feed the reader endlessly).
+#pragma once
+
+#include "sqlite/Database.h"
+
+namespace harmona::playlist {
+
+enum class LibraryStatus { ok, missing, unusable };
+
+struct LibraryOpenResult {
+    LibraryStatus status = LibraryStatus::unusable;
+    sqlite::Database db;  // open when status is ok
+};
+
+// Opens the database at `path` read-only. `missing`: no such file; `unusable`: not a regular file,
+// or SQLite refused it. (A file that is not a database opens; the first query fails.)
+LibraryOpenResult OpenLibrary(const char* path);
+
+}  // namespace harmona::playlist

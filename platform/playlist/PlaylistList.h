@@ -1,0 +1,29 @@
+// Listing of the personal and the shared playlists (platform.md section 7; spec Part 4.2).
+#pragma once
+
+#include "PlaylistRecord.h"
+
+// The personal playlists of the user whose preference directory is `prefDir`: the regular files of
+// `<prefDir>/playlists/` whose names end in ".m3u" or ".m3u8" (any letter case), named without that
+// ending, in byte order of the names, with ids from 1 in that order. `offset` records are skipped
+// and at most `limit` are returned (0: no limit); 0 and 0 give the whole list.
+// Returns 0 and sets *head (null for an empty list; a missing preference or playlists directory
+// gives an empty list); -1 when the playlists path cannot be read as a directory or the arguments
+// are null.
+int VANUPersonalPlaylistListAll(const char* prefDir, PLAYLIST_INFO** head, int offset, int limit);
+
+// The shared playlists: the rows of table `playlist` of library.db ordered by name (ASCII letter
+// case ignored), then id. `offset` and `limit` as above; `reserved` must be 0.
+// Returns 0 and sets *head (a missing database file gives an empty list); -1 when the file is not
+// such a database or cannot be read.
+int VANUPlaylistListAll(PLAYLIST_INFO** head, int offset, int limit, int reserved);
+
+namespace harmona::playlist {
+
+// Opening of library.db as every request does it: read-only, waiting this long for a writer.
+inline constexpr int kLibraryBusyTimeoutMs = 3000;
+
+// The same listing as VANUPlaylistListAll, from the database at `path`.
+int ListSharedPlaylists(const char* path, PLAYLIST_INFO** head, int offset, int limit);
+
+}  // namespace harmona::playlist

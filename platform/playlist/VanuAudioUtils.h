@@ -1,0 +1,17 @@
+// The smart playlist enumerator of the platform (platform.md section 7; spec Part 4.3).
+#pragma once
+
+#include <string>
+#include <vector>
+
+class VanuAudioUtils {
+  public:
+    // The names of the smart playlists of the smart playlist file at `path` (a conf file whose
+    // every section is one smart playlist; null: the shared file
+    // /var/packages/Harmona/etc/smart.playlist): every non-empty section name in file order,
+    // duplicates included. `total` receives the number of all names; `offset` names are skipped and
+    // at most `limit` returned (0: no limit), so 0 and 0 give all names. A missing or unreadable
+    // file gives an empty list.
+    static std::vector<std::string> SmartPLSEnum(int offset, int limit, int& total,
+                                                 const char* path);
+};

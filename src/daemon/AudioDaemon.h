@@ -1,0 +1,79 @@
+// The audio daemon client (spec Parts 6.1 and 6.2): the control socket exchange and its command
+// wrappers, the audio file type test and the equalizer profile lookup. Plain functions returning 0
+// for success and -1 for failure (the file type and profile helpers say their own results).
+#pragma once
+
+#include <cstdint>
+
+// The request record, written to the socket as it lies in memory: the command code in the host's
+// native byte order, then 8192 bytes of NUL-terminated argument text (Part 6.1).
+struct AudioDaemonRequest {
+    std::int32_t command;
+    char arguments[8192];
+};
+static_assert(sizeof(AudioDaemonRequest) == 8196, "the daemon reads exactly 8196 bytes a request");
+
+// ---- unit ctrl: connection and exchange (Part 6.1) ----
+
+// A connected socket descriptor (>= 0) to /tmp/vanuaudiod.sock, or a negative value on failure.
+int AudioDaemonConnect();
+
+// Sends `request` on a connection of its own and reads one reply into `reply` (zeroed first, at
+// most `replySize` bytes, one read). 0 when a reply of at least one byte was read, -1 otherwise.
+// Both waits share one budget of half a second.
+int AudioDaemonCall(const AudioDaemonRequest* request, char* reply, int replySize);
+
+// ---- unit info: one wrapper per command code (Part 6.1's table) ----
+// Each returns AudioDaemonCall's result (0 or -1), or -1 when its own argument check fails. The
+// wrappers without a reply buffer discard the reply: they only say whether the daemon answered.
+// The daemon's meaning of most codes lies outside the spec, so they are named by their code.
+
+int AudioDaemonCommand1();
+int AudioDaemonCommand2();
+int AudioDaemonCommand3();
+int AudioDaemonCommand4();
+int AudioDaemonCommand5();
+int AudioDaemonCommand6();
+int AudioDaemonCommand7();
+int AudioDaemonCommand8(int value);
+int AudioDaemonCommand9(int value);
+int AudioDaemonCommand10();
+int AudioDaemonCommand11(int value);
+int AudioDaemonCommand12();
+int AudioDaemonCommand13();
+// Command 14: asks the daemon to prepare its media server list (Part 3.2).
+int AudioDaemonPrepareMediaServerList();
+int AudioDaemonCommand15();
+// Command 16: the media servers from `offset`, at most `count` of them, as JSON text in `reply`.
+int AudioDaemonGetMediaServerList(int offset, int count, char* reply, int replySize);
+int AudioDaemonCommand17(int first, int second, char* reply, int replySize);
+int AudioDaemonCommand18(int value);
+int AudioDaemonCommand19(char* reply, int replySize);
+int AudioDaemonCommand27(int first, int second, char* reply, int replySize);
+int AudioDaemonCommand28();
+int AudioDaemonCommand29();
+int AudioDaemonCommand31();
+int AudioDaemonCommand32(int value);
+int AudioDaemonCommand33();
+int AudioDaemonCommand34();
+// Command 35: exactly ten values, sent as "%3.1f" each, joined by single spaces.
+int AudioDaemonCommand35(const float values[10]);
+int AudioDaemonCommand36(int value);
+int AudioDaemonCommand37(const char* text);
+int AudioDaemonCommand38(const char* text);
+
+// ---- unit ctrl: equalizer profiles (Part 6.2) ----
+
+// Looks `label` up in the profile file at `path`: 1 found (the trimmed value is in `value`), 0 not
+// in the file, -1 failure (unopenable file, an illegal line, a failed trim, bad arguments).
+int LoadEqualizerProfile(const char* path, const char* label, char* value, int size);
+
+// The default equalizer profile's value: 1 found, 0 equalizer off or no such profile, negative on
+// failure.
+int GetDefaultEqualizerProfile(char* value, int size);
+
+// ---- file type (Part 6.2) ----
+
+// 1 when `path` names an audio file playable for `selector` (0: anything; 2, 3 and any other value:
+// the extension lists of Part 6.2; paths beginning with "http" always), 0 otherwise.
+int IsSupportedAudioFile(int selector, const char* path);

@@ -1,0 +1,51 @@
+// Part 6.2: Audio file type and equalizer profile helpers (the file type test).
+#include <strings.h>
+
+#include <cstring>
+#include <iterator>
+
+#include "AudioDaemon.h"
+
+namespace {
+
+// The extension lists of Part 6.2, in their order.
+constexpr const char* kPortableList[] = {"mp3", "m4a", "m4b"};
+constexpr const char* kLosslessList[] = {"aac", "aif", "aiff", "ape", "flac", "m4a",
+                                         "m4b", "mp3", "ogg",  "wav", "wma"};
+constexpr const char* kDefaultList[] = {"mp3",  "m4a", "ogg", "aac", "wma", "flac",
+                                        "aiff", "aif", "mp1", "mp2", "mpa", "wav",
+                                        "ac3",  "ra",  "ram", "m4p", "m4b", "ape"};
+
+template <size_t N>
+bool InList(const char* const (&list)[N], const char* extension) {
+    for (const char* entry : list) {
+        if (strcasecmp(entry, extension) == 0)
+            return true;
+    }
+    return false;
+}
+
+}  // namespace
+
+int IsSupportedAudioFile(int selector, const char* path) {
+    if (selector == 0)
+        return 1;
+    if (path == nullptr)
+        return 0;
+    // Streams are always accepted; the prefix is compared case-sensitively.
+    if (std::strncmp(path, "http", 4) == 0)
+        return 1;
+    // The last "." of the whole path, so a dot in a folder name takes the rest as extension.
+    const char* dot = std::strrchr(path, '.');
+    if (dot == nullptr)
+        return 0;
+    const char* extension = dot + 1;
+    switch (selector) {
+        case 2:
+            return InList(kPortableList, extension) ? 1 : 0;
+        case 3:
+            return InList(kLosslessList, extension) ? 1 : 0;
+        default:
+            return InList(kDefaultList, extension) ? 1 : 0;
+    }
+}

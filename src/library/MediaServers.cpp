@@ -1,0 +1,156 @@
+// Part 3.2: Media server list.
+#include <json/reader.h>
+#include <syslog.h>
+
+#include <climits>
+#include <cstdio>
+#include <cstring>
+#include <string>
+
+#include "AudioDaemon.h"
+#include "HarmonaHandler.h"
+
+namespace {
+
+// The unit name and line of the "Parse error" log line. The spec gives neither for this Part; the
+// handler's unit is "audio" (Part 4.2 names it), and the line is this project's own fixed number.
+constexpr const char* kUnit = "audio";
+constexpr int kLineParseError = 1130;
+
+constexpr const char* kRootId = "mediaserver_root";
+constexpr const char* kScanButtonId = "mediaserver_refresh";
+constexpr const char* kScanButtonIcon = "3rdparty/Harmona/images/button/btn_search_dms.png";
+constexpr const char* kServerIcon = "3rdparty/Harmona/images/files_class/icon_mediaserver.png";
+
+// Paging and buffers of Part 3.2.
+constexpr int kPageSize = 10;
+constexpr int kReplySize = 40960;
+constexpr int kNodeIdSize = 1024;
+
+// jsoncpp's old Reader throws (rather than fails) when arrays and objects nest deeper than its
+// stack limit of 1000; a daemon's reply must never get there. Text nested deeper than this is
+// treated as a parse failure before the Reader sees it.
+constexpr int kMaxNesting = 900;
+
+// The deepest nesting of arrays and objects in `text`, skipping strings and the comments that the
+// Reader accepts. Unbalanced text may count too deep or too shallow: the Reader then rejects it.
+int NestingDepth(const char* text, size_t length) {
+    int depth = 0;
+    int deepest = 0;
+    for (size_t i = 0; i < length; ++i) {
+        const char c = text[i];
+        if (c == '"') {
+            for (++i; i < length && text[i] != '"'; ++i) {
+                if (text[i] == '\\')
+                    ++i;
+            }
+        } else if (c == '/' && i + 1 < length && text[i + 1] == '/') {
+            while (i < length && text[i] != '\n')
+                ++i;
+        } else if (c == '/' && i + 1 < length && text[i + 1] == '*') {
+            for (i += 2; i + 1 < length && !(text[i] == '*' && text[i + 1] == '/'); ++i) {
+            }
+            ++i;
+        } else if (c == '[' || c == '{') {
+            if (++depth > deepest)
+                deepest = depth;
+        } else if (c == ']' || c == '}') {
+            --depth;
+        }
+    }
+    return deepest;
+}
+
+// Parses the reply's text up to its first NUL with the Reader, comments collected (Part 3.2). A
+// reply that filled the whole buffer has no NUL and is not read past the buffer: a failure.
+bool ParseReply(Json::Reader& reader, const char* reply, size_t size, Json::Value& root) {
+    const void* nul = std::memchr(reply, '\0', size);
+    if (nul == nullptr)
+        return false;
+    const size_t length = static_cast<size_t>(static_cast<const char*>(nul) - reply);
+    if (NestingDepth(reply, length) > kMaxNesting)
+        return false;
+    return reader.parse(reply, reply + length, root, true);
+}
+
+// A member of an object, or null for anything else (a non-object would make jsoncpp throw).
+const Json::Value& Member(const Json::Value& value, const char* name) {
+    static const Json::Value null;
+    if (!value.isObject())
+        return null;
+    const Json::Value* member = value.find(name, name + std::strlen(name));
+    return member != nullptr ? *member : null;
+}
+
+// "total" as an integer; absent or not an integer of int's range counts as 0.
+int TotalOf(const Json::Value& root) {
+    const Json::Value& total = Member(root, "total");
+    return total.isInt() ? total.asInt() : 0;
+}
+
+}  // namespace
+
+int HarmonaHandler::GetMediaServerNodes(Json::Value& children) {
+    const Json::Value texts = LoadUITexts();
+    const Json::Value& label = Member(Member(texts, "common"), "btn_scan_dms");
+    Json::Value node;
+    FillTreeNode(node, kScanButtonId, "", label.isString() ? label.asString() : std::string(),
+                 kScanButtonIcon, NODE_LEAF);
+    children.append(node);
+    AppendMediaServers(children);
+    return 1;
+}
+
+int HarmonaHandler::AppendMediaServers(Json::Value& children) {
+#pragma GCC diagnostic push
+#pragma GCC diagnostic ignored "-Wdeprecated-declarations"
+    Json::Reader reader;  // the spec's parser; jsoncpp marks it deprecated
+#pragma GCC diagnostic pop
+    Json::Value root;
+    if (AudioDaemonPrepareMediaServerList() != 0)
+        return 0;
+    Json::Value node;
+    int offset = 0;
+    for (;;) {
+        static char reply[kReplySize];  // 40 KB: kept off the stack
+        if (AudioDaemonGetMediaServerList(offset, kPageSize, reply, kReplySize) != 0)
+            return 0;
+        if (!ParseReply(reader, reply, kReplySize, root)) {
+            syslog(LOG_ERR, "%s:%d Parse error", kUnit, kLineParseError);
+            return 0;
+        }
+        const Json::Value& list = Member(root, "list");
+        for (Json::ArrayIndex i = 0; list.isArray() && i < list.size(); ++i) {
+            const Json::Value& server = list[i];
+            const Json::Value& controlUrl = Member(server, "control_url");
+            const Json::Value& name = Member(server, "friendly_name");
+            const Json::Value& ip = Member(server, "ip");
+            // An element without a textual control URL has no id to give; one without a name
+            // has no text unless its ip is a string (Part 3.2 lets such elements be skipped).
+            const bool named = name.isString() && !name.asString().empty();
+            if (!controlUrl.isString() || (!named && !ip.isString()))
+                continue;
+            char id[kNodeIdSize];
+            std::snprintf(id, sizeof(id), "mediaserver_%s", controlUrl.asCString());
+            FillTreeNode(node, id, kRootId, named ? name.asString() : ip.asString(), kServerIcon,
+                         NODE_LEAF);
+            children.append(std::move(node));
+        }
+        const int total = TotalOf(root);
+        // The offset would overflow past INT_MAX; no int total can be above it anyway.
+        if (offset > INT_MAX - kPageSize)
+            return total;
+        offset += kPageSize;
+        if (!(offset < total))
+            return total;
+    }
+}
+
+void HarmonaHandler::RefreshMediaServers() {
+    Json::Value reply;
+    Json::Value items;
+    AppendMediaServers(items);
+    reply["items"] = std::move(items);
+    SetSuccess(reply, true);
+    PrintResponse(std::move(reply), kReplyContentType);
+}

@@ -1,0 +1,27 @@
+// Part 4.4: Random-100 playlist.
+#include <cstdio>
+
+#include "AudioFile.h"
+#include "HarmonaHandler.h"
+
+namespace {
+
+constexpr int kRandomSongCount = 100;
+constexpr int kCreateRandomErrorLine = 616;
+constexpr std::size_t kPathSize = 4096;
+
+}  // namespace
+
+void HarmonaHandler::CreateRandom100Playlist() {
+    Json::Value reply;
+    char path[kPathSize] = {};
+    // The user name goes in as it is; the platform's login check already forbids "/" in it.
+    std::snprintf(path, sizeof path, "/tmp/==DynaRandom100==.%s",
+                  webMan.GetLoginUserName().c_str());
+
+    if (AudioFile::PlaylistRandomCreate(path, kRandomSongCount))
+        SetSuccess(reply, true);
+    else
+        SetError(reply, "playlist", "error_create_random100", kCreateRandomErrorLine);
+    PrintResponse(reply, kReplyContentType);
+}

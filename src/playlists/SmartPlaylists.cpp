@@ -1,0 +1,54 @@
+// Part 4.3: Smart playlists.
+#include "SmartPlaylists.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "HarmonaHandler.h"
+#include "VanuAudioUtils.h"
+#include "VanuSystem.h"
+
+namespace {
+
+constexpr const char* kSmartIcon = "3rdparty/Harmona/images/files_class/icon_smartpls.png";
+constexpr const char* kUserSmartFile = "/playlists/smart.playlist";
+constexpr std::size_t kNodeIdSize = 4096;
+
+}  // namespace
+
+int HarmonaHandler::ListSmartPlaylists(Json::Value& children, const char* category) {
+    std::vector<std::string> names;
+    Json::Value node;
+    int total = 0;
+    const char* idFormat = nullptr;
+    const char* pid = nullptr;
+
+    if (std::strcmp(category, "music_personal") == 0) {
+        const std::string path = webMan.GetPreferenceDir() + kUserSmartFile;
+        if (!CORXFileExist(path.c_str()))
+            return 1;
+        names = VanuAudioUtils::SmartPLSEnum(0, 0, total, path.c_str());
+        idFormat = "musiclib_music_personal/smart/%s";
+        pid = "musiclib_music_personal";
+    } else if (std::strcmp(category, "music_shared") == 0) {
+        names = VanuAudioUtils::SmartPLSEnum(0, 0, total, nullptr);
+        idFormat = "musiclib_music_shared/smart/%s";
+        pid = "musiclib_music_shared";
+    } else {
+        return 1;  // an unknown category lists nothing and is no error (Part 4.3)
+    }
+
+    // Every enumerated name gives one node; names equal ignoring case keep their order.
+    std::stable_sort(names.begin(), names.end(), SmartPlaylistNameOrder());
+
+    char id[kNodeIdSize];
+    for (const std::string& name : names) {
+        std::snprintf(id, sizeof id, idFormat, name.c_str());
+        FillTreeNode(node, id, pid, name, kSmartIcon, NODE_LEAF);
+        children.append(std::move(node));
+    }
+    return 1;
+}

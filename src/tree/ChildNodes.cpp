@@ -1,0 +1,21 @@
+// Part 2.2: Child node routing.
+#include <cstring>
+#include <utility>
+
+#include "HarmonaHandler.h"
+
+int HarmonaHandler::GetChildNodes(const char* nodeId) {
+    Json::Value reply;
+    int result = 0;
+    const char* underscore = std::strchr(nodeId, '_');
+    // No underscore, or nothing after it: a malformed id, answered with the empty reply.
+    if (underscore != nullptr && underscore[1] != '\0') {
+        if (std::strncmp(nodeId, "musiclib", 8) == 0)
+            result = GetMusicLibraryNodes(reply, underscore + 1) != 0 ? 1 : 0;
+        else
+            result = 1;  // other families come inline with the root tree or through "refresh"
+    }
+    // Passed by value, moved: a list of thousands of nodes is not copied once more.
+    PrintResponse(std::move(reply), kReplyContentType);
+    return result;
+}

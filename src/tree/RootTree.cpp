@@ -1,0 +1,116 @@
+// Part 2.1: Root tree.
+#include "RootTree.h"
+
+#include <sys/stat.h>
+
+#include "HarmonaHandler.h"
+#include "PlatformPaths.h"
+#include "VanuSystem.h"
+
+namespace harmona::tree {
+
+// The platform's number of the service the library categories depend on (the local media server).
+constexpr int kLibraryService = 3;
+
+namespace {
+
+// Every category node hides its icon this way (Part 1.2).
+constexpr const char* kBlankIcon = "3rdparty/Harmona/images/s.gif";
+constexpr const char* kHiddenIconClass = "x-tree-hide-icon";
+
+}  // namespace
+
+const std::vector<RootCategory>& RootCategories() {
+    static const std::vector<RootCategory> categories = {
+        {"musiclib_root", "playlist", "music_library", RootCondition::library,
+         [](HarmonaHandler& h, Json::Value& c) { return h.GetMusicLibraryNodes(c, "root"); },
+         "error", "Could not get the entry", true},
+        {"musiclib_music_personal", "playlist", "personal_playlist", RootCondition::library,
+         [](HarmonaHandler& h, Json::Value& c) { return h.AddPersonalPlaylistCategory(c); },
+         "common", "error_system", false},
+        {"musiclib_music_shared", "playlist", "shared_playlist", RootCondition::library,
+         [](HarmonaHandler& h, Json::Value& c) { return h.AddSharedPlaylistCategory(c); }, "common",
+         "error_system", false},
+        {"ipod_root", "player", "player_source_ipod", RootCondition::ipod,
+         [](HarmonaHandler& h, Json::Value& c) { return h.AddIPodChildren(c); }, "common",
+         "error_system", false},
+        {"inetradio_root", "radio", "radio", RootCondition::always,
+         [](HarmonaHandler& h, Json::Value& c) { return h.AddRadioChildren(c); }, "common",
+         "error_system", true},
+        {"mediaserver_root", "common", "player_source_dms", RootCondition::mediaServer,
+         [](HarmonaHandler& h, Json::Value& c) { return h.GetMediaServerNodes(c); }, "common",
+         "error_system", false},
+    };
+    return categories;
+}
+
+int BuildRootTreeFrom(HarmonaHandler& handler, const std::vector<RootCategory>& categories) {
+    Json::Value reply;
+    const Json::Value texts = handler.LoadUITexts();  // first, whatever categories will be shown
+
+    // Both calls are made, service status first; one result governs the three library categories.
+    const bool serviceRunning = handler.IsLibraryServiceRunning();
+    const bool libraryShown = VANUAudioHasShare() != 0 && serviceRunning;
+    bool ipodChecked = false;
+    bool ipodShown = false;
+
+    for (const RootCategory& category : categories) {
+        bool shown = true;
+        switch (category.condition) {
+            case RootCondition::library:
+                shown = libraryShown;
+                break;
+            case RootCondition::ipod:
+                // HasIPodDirectory is called whatever the permission bits (step 4 of the
+                // algorithm).
+                if (!ipodChecked) {
+                    ipodShown = handler.HasIPodDirectory();
+                    ipodChecked = true;
+                }
+                shown = ipodShown && (handler.userPermission & PERM_IPOD) != 0;
+                break;
+            case RootCondition::always:
+                break;
+            case RootCondition::mediaServer:
+                shown = (handler.userPermission & PERM_MEDIA_SERVER) != 0;
+                break;
+        }
+        if (!shown)
+            continue;
+
+        Json::Value node;
+        Json::Value children;
+        handler.FillTreeNode(node, category.id, "",
+                             texts[category.textSection][category.textKey].asString(), kBlankIcon,
+                             0);
+        node["iconCls"] = kHiddenIconClass;
+        if (category.build(handler, children) == 0) {
+            handler.SetError(reply, category.errorSection, category.errorKey, __LINE__);
+            handler.PrintResponse(reply, kReplyContentType);
+            return 0;
+        }
+        node["children"] = std::move(children);
+        if (category.expanded)
+            node["expanded"] = true;
+        reply.append(std::move(node));
+    }
+    handler.PrintResponse(std::move(reply), kReplyContentType);
+    return 1;
+}
+
+}  // namespace harmona::tree
+
+int HarmonaHandler::BuildRootTree() {
+    return harmona::tree::BuildRootTreeFrom(*this, harmona::tree::RootCategories());
+}
+
+bool HarmonaHandler::HasIPodDirectory() {
+    struct stat st {};
+    if (stat(harmona::paths::kIPodDirectory, &st) != 0)
+        return false;
+    return (st.st_mode & S_IFMT) == S_IFDIR;
+}
+
+bool HarmonaHandler::IsLibraryServiceRunning() {
+    return VANUServiceStatusGet(harmona::tree::kLibraryService) > 0;
+}

@@ -1,0 +1,145 @@
+// platform.md section 5: configuration, shares, services and the CORX helpers that Part 6.2 and
+// Part 2.1 call, against real files at their fixed paths inside the sandbox.
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstring>
+#include <string>
+
+#include "Fixtures.h"
+#include "VanuSystem.h"
+
+using namespace harmona::test;
+
+namespace {
+
+TEST(Platform_5, ConfGetCopiesTheValueAndReturnsItsLength) {
+    WriteFile(kAudioConf, "# comment\naudio_default_equalizer = Rock \n[section]\nother=1\n");
+    char buffer[64];
+    EXPECT_EQ(VANUAudioConfGet("audio_default_equalizer", buffer, sizeof(buffer)), 4);
+    EXPECT_STREQ(buffer, "Rock");
+}
+
+TEST(Platform_5, ConfGetReadsOnlyKeysOutsideSections) {
+    WriteFile(kAudioConf, "[section]\naudio_default_equalizer=Rock\n");
+    char buffer[64] = "keep";
+    EXPECT_EQ(VANUAudioConfGet("audio_default_equalizer", buffer, sizeof(buffer)), 0);
+    EXPECT_STREQ(buffer, "keep");
+}
+
+TEST(Platform_5, ConfGetCutsToTheBufferButReturnsTheFullLength) {
+    WriteFile(kAudioConf, "key=\"abcdefghij\"\n");
+    char buffer[5];
+    EXPECT_EQ(VANUAudioConfGet("key", buffer, sizeof(buffer)), 10);
+    EXPECT_STREQ(buffer, "abcd");
+    char one[1];
+    EXPECT_EQ(VANUAudioConfGet("key", one, 1), 10);
+    EXPECT_STREQ(one, "");
+}
+
+TEST(Platform_5, ConfGetGivesZeroForAbsentOrEmptyValuesAndAMissingFile) {
+    char buffer[16];
+    EXPECT_EQ(VANUAudioConfGet("key", buffer, sizeof(buffer)), 0);  // no file
+    WriteFile(kAudioConf, "key=\nquoted=\"\"\n");
+    EXPECT_EQ(VANUAudioConfGet("key", buffer, sizeof(buffer)), 0);
+    EXPECT_EQ(VANUAudioConfGet("quoted", buffer, sizeof(buffer)), 0);
+    EXPECT_EQ(VANUAudioConfGet("absent", buffer, sizeof(buffer)), 0);
+}
+
+TEST(Platform_5, ConfGetRefusesBadArgumentsAndAnUnreadableFile) {
+    WriteFile(kAudioConf, "key=1\n");
+    char buffer[16];
+    EXPECT_EQ(VANUAudioConfGet(nullptr, buffer, sizeof(buffer)), -1);
+    EXPECT_EQ(VANUAudioConfGet("key", nullptr, 16), -1);
+    EXPECT_EQ(VANUAudioConfGet("key", buffer, 0), -1);
+    EXPECT_EQ(VANUAudioConfGet("key", buffer, -1), -1);
+    ASSERT_EQ(std::remove(kAudioConf), 0);
+    ASSERT_EQ(mkdir(kAudioConf, 0755), 0);  // a folder where the file should be
+    EXPECT_EQ(VANUAudioConfGet("key", buffer, sizeof(buffer)), -1);
+}
+
+TEST(Platform_5, ConfGetLastOfTwoEqualKeysCounts) {
+    WriteFile(kAudioConf, "\xEF\xBB\xBFkey=first\r\nkey=second\r\n");
+    char buffer[16];
+    EXPECT_EQ(VANUAudioConfGet("key", buffer, sizeof(buffer)), 6);
+    EXPECT_STREQ(buffer, "second");
+}
+
+TEST(Platform_5, TrimSpaceRemovesWhiteSpaceAroundInPlace) {
+    char text[] = " \t 1.0 2.0 \r\n";
+    EXPECT_GE(CORXStrTrimSpace(text, 0), 0);
+    EXPECT_STREQ(text, "1.0 2.0");
+    char blank[] = " \n\t ";
+    EXPECT_GE(CORXStrTrimSpace(blank, 0), 0);
+    EXPECT_STREQ(blank, "");
+    char empty[] = "";
+    EXPECT_GE(CORXStrTrimSpace(empty, 0), 0);
+    EXPECT_STREQ(empty, "");
+    char inner[] = "a  b";
+    EXPECT_GE(CORXStrTrimSpace(inner, 0), 0);
+    EXPECT_STREQ(inner, "a  b");
+    EXPECT_LT(CORXStrTrimSpace(nullptr, 0), 0);
+}
+
+TEST(Platform_5, FileExistFollowsStat) {
+    EXPECT_EQ(CORXFileExist("/tmp/none"), 0);
+    EXPECT_EQ(CORXFileExist(nullptr), 0);
+    WriteFile("/tmp/some", "x");
+    EXPECT_NE(CORXFileExist("/tmp/some"), 0);
+    EXPECT_NE(CORXFileExist("/tmp"), 0);
+}
+
+TEST(Platform_5, HasShareLooksAtTheDefaultShareFolder) {
+    EXPECT_EQ(VANUAudioHasShare(), 0);
+    WriteFile("/volume1/music", "a file, not a folder");
+    EXPECT_EQ(VANUAudioHasShare(), 0);
+    std::remove("/volume1/music");
+    MakeDirs("/volume1/music");
+    EXPECT_NE(VANUAudioHasShare(), 0);
+}
+
+TEST(Platform_5, HasShareFollowsTheConfiguredSharePath) {
+    MakeDirs("/volume1/music");
+    WriteFile(kAudioConf, "audio_share_path=/volume1/audio\n");
+    EXPECT_EQ(VANUAudioHasShare(), 0);
+    MakeDirs("/volume1/audio");
+    EXPECT_NE(VANUAudioHasShare(), 0);
+}
+
+TEST(Platform_5, ServiceStatusReadsThePidFile) {
+    EXPECT_EQ(VANUServiceStatusGet(3), 0);  // no pid file
+    WriteFile("/run/vanu/service/3.pid", std::to_string(getpid()) + "\n");
+    EXPECT_EQ(VANUServiceStatusGet(3), 1);
+    WriteFile("/run/vanu/service/64.pid", std::to_string(getpid()));
+    EXPECT_EQ(VANUServiceStatusGet(64), 1);
+    WriteFile("/run/vanu/service/3.pid", "");
+    EXPECT_EQ(VANUServiceStatusGet(3), 0);
+    WriteFile("/run/vanu/service/3.pid", "abc\n");
+    EXPECT_EQ(VANUServiceStatusGet(3), 0);
+    WriteFile("/run/vanu/service/3.pid", "0\n");
+    EXPECT_EQ(VANUServiceStatusGet(3), 0);
+    WriteFile("/run/vanu/service/3.pid", "-1\n");
+    EXPECT_EQ(VANUServiceStatusGet(3), 0);
+    WriteFile("/run/vanu/service/3.pid", "99999999999999999999\n");
+    EXPECT_EQ(VANUServiceStatusGet(3), 0);
+}
+
+TEST(Platform_5, ServiceStatusOfAnEndedProcessIsZero) {
+    const pid_t child = fork();
+    ASSERT_GE(child, 0);
+    if (child == 0)
+        _exit(0);
+    ASSERT_EQ(waitpid(child, nullptr, 0), child);  // reaped: the pid names no process now
+    WriteFile("/run/vanu/service/3.pid", std::to_string(child) + "\n");
+    EXPECT_EQ(VANUServiceStatusGet(3), 0);
+}
+
+TEST(Platform_5, ServiceStatusOutsideOneToSixtyFourIsMinusOne) {
+    EXPECT_EQ(VANUServiceStatusGet(0), -1);
+    EXPECT_EQ(VANUServiceStatusGet(65), -1);
+    EXPECT_EQ(VANUServiceStatusGet(-3), -1);
+}
+
+}  // namespace

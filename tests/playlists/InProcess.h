@@ -1,0 +1,62 @@
+// The playlist builders of Parts 4.1 to 4.3 are reached from a real request only through the root
+// tree and the refresh action (Parts 2.1, 2.3). Until those exist, these tests run the builders in
+// the test process: the handler is constructed as the CGI entry does it, with the request's
+// environment set as a web server would set it.
+#pragma once
+
+#include <json/json.h>
+#include <stdlib.h>
+#include <syslog.h>
+
+#include <string>
+#include <vector>
+
+#include "CgiRunner.h"
+#include "HarmonaHandler.h"
+#include "Sandbox.h"
+
+namespace harmona::test {
+
+// Sets the CGI environment of a GET request by `user` (no parameters).
+inline void SetRequestEnvironment(const std::string& user) {
+    setenv("REMOTE_USER", user.c_str(), 1);
+    setenv("REQUEST_METHOD", "GET", 1);
+    setenv("QUERY_STRING", "", 1);
+    unsetenv("HTTP_ACCEPT_LANGUAGE");
+    unsetenv("CONTENT_LENGTH");
+    unsetenv("CONTENT_TYPE");
+}
+
+// A handler for `user` whose permission bits Process would have read.
+struct InProcessHandler {
+    explicit InProcessHandler(const std::string& user, int permission) {
+        SetRequestEnvironment(user);
+        handler.userPermission = permission;
+    }
+    HarmonaHandler handler;
+};
+
+// The messages that the test process sent to the system log since the last call.
+inline std::vector<std::string> LoggedErrors() {
+    std::vector<std::string> messages;
+    for (const LogLine& line : TakeLogLines(100))
+        if ((line.priority & 7) == LOG_ERR)
+            messages.push_back(line.message);
+    return messages;
+}
+
+inline std::vector<std::string> Ids(const Json::Value& nodes) {
+    std::vector<std::string> ids;
+    for (const Json::Value& node : nodes)
+        ids.push_back(node["id"].asString());
+    return ids;
+}
+
+inline std::vector<std::string> Texts(const Json::Value& nodes) {
+    std::vector<std::string> texts;
+    for (const Json::Value& node : nodes)
+        texts.push_back(node["text"].asString());
+    return texts;
+}
+
+}  // namespace harmona::test

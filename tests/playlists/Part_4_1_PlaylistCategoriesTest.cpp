@@ -1,0 +1,177 @@
+// Part 4.1: playlist category nodes, built in the test process (see InProcess.h) over real
+// playlist files and a real library.db.
+#include <gtest/gtest.h>
+
+#include "Fixtures.h"
+#include "InProcess.h"
+#include "PlaylistFixtures.h"
+
+using namespace harmona::test;
+
+namespace {
+
+constexpr int kAllButNewShared = PERM_IPOD | PERM_MEDIA_SERVER;
+constexpr int kEverything = PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER;
+
+class Part_4_1 : public ::testing::Test {
+  protected:
+    void SetUp() override { StandardFixture(); }
+};
+
+void ExpectRefreshButton(const Json::Value& node, const std::string& category) {
+    EXPECT_EQ(node["id"].asString(), "musiclib_music_" + category + "_refresh");
+    EXPECT_FALSE(node.isMember("pid"));
+    EXPECT_EQ(node["text"].asString(), "Refresh");
+    EXPECT_EQ(node["qtip"].asString(), "Refresh");
+    EXPECT_EQ(node["icon"].asString(), "3rdparty/Harmona/images/button/btn_refresh.png");
+    EXPECT_TRUE(node["leaf"].asBool());
+    EXPECT_FALSE(node["allowDrop"].asBool());
+    EXPECT_FALSE(node["allowDrag"].asBool());
+    EXPECT_FALSE(node["draggable"].asBool());
+    EXPECT_FALSE(node["expanded"].asBool());
+}
+
+void ExpectNewButton(const Json::Value& node, const std::string& category) {
+    EXPECT_EQ(node["id"].asString(), "musiclib_music_" + category + "_new");
+    EXPECT_FALSE(node.isMember("pid"));
+    EXPECT_EQ(node["text"].asString(), "New Playlist");
+    EXPECT_EQ(node["icon"].asString(), "3rdparty/Harmona/images/button/btn_new_playlist.png");
+    EXPECT_TRUE(node["leaf"].asBool());
+    EXPECT_TRUE(node["allowDrop"].asBool());
+    EXPECT_FALSE(node["allowDrag"].asBool());
+    EXPECT_FALSE(node["draggable"].asBool());
+    EXPECT_FALSE(node["expanded"].asBool());
+}
+
+TEST_F(Part_4_1, WithoutNewSharedPermissionSharedHasRefreshThenPlaylistsAndPersonalBothButtons) {
+    AddUser("admin", kAllButNewShared);
+    MakeLibraryDb({}, {{7, "Road"}, {3, "chill"}});
+    WritePersonalPlaylistFile("admin", "mine.m3u");
+    InProcessHandler request("admin", kAllButNewShared);
+
+    Json::Value shared(Json::arrayValue);
+    ASSERT_EQ(request.handler.AddSharedPlaylistCategory(shared), 1);
+    ASSERT_EQ(shared.size(), 3u);
+    ExpectRefreshButton(shared[0], "shared");
+    EXPECT_EQ(Ids(shared), (std::vector<std::string>{"musiclib_music_shared_refresh",
+                                                     "musiclib_music_shared/playlist/3",
+                                                     "musiclib_music_shared/playlist/7"}));
+    EXPECT_EQ(shared[1]["pid"].asString(), "musiclib_music_shared");
+
+    Json::Value personal(Json::arrayValue);
+    ASSERT_EQ(request.handler.AddPersonalPlaylistCategory(personal), 1);
+    ASSERT_EQ(personal.size(), 3u);
+    ExpectRefreshButton(personal[0], "personal");
+    ExpectNewButton(personal[1], "personal");
+    EXPECT_EQ(personal[2]["id"].asString(), "musiclib_music_personal/playlist/mine");
+    EXPECT_EQ(personal[2]["pid"].asString(), "musiclib_music_personal");
+}
+
+TEST_F(Part_4_1, WithNewSharedPermissionSharedHasBothButtons) {
+    MakeLibraryDb({}, {{1, "Road"}});
+    InProcessHandler request("admin", kEverything);
+    Json::Value shared(Json::arrayValue);
+    ASSERT_EQ(request.handler.AddSharedPlaylistCategory(shared), 1);
+    ASSERT_EQ(shared.size(), 3u);
+    ExpectRefreshButton(shared[0], "shared");
+    ExpectNewButton(shared[1], "shared");
+    EXPECT_EQ(shared[2]["id"].asString(), "musiclib_music_shared/playlist/1");
+}
+
+TEST_F(Part_4_1, UserWithNoPlaylistsAndNoSmartFileGetsExactlyTheTwoPersonalButtons) {
+    InProcessHandler request("admin", kEverything);
+    Json::Value personal(Json::arrayValue);
+    ASSERT_EQ(request.handler.AddPersonalPlaylistCategory(personal), 1);
+    ASSERT_EQ(personal.size(), 2u);
+    ExpectRefreshButton(personal[0], "personal");
+    ExpectNewButton(personal[1], "personal");
+    EXPECT_TRUE(LoggedErrors().empty());
+}
+
+TEST_F(Part_4_1, OrdinaryPlaylistsComeBeforeSmartPlaylists) {
+    WritePersonalPlaylistFile("admin", "zz.m3u");
+    WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"aa"});
+    MakeLibraryDb({}, {{5, "zz shared"}});
+    WriteSmartPlaylistFile(kSharedSmartPlaylistFile, {"aa shared"});
+    InProcessHandler request("admin", kEverything);
+
+    Json::Value personal(Json::arrayValue);
+    ASSERT_EQ(request.handler.AddPersonalPlaylistCategory(personal), 1);
+    EXPECT_EQ(Ids(personal),
+              (std::vector<std::string>{
+                  "musiclib_music_personal_refresh", "musiclib_music_personal_new",
+                  "musiclib_music_personal/playlist/zz", "musiclib_music_personal/smart/aa"}));
+    Json::Value shared(Json::arrayValue);
+    ASSERT_EQ(request.handler.AddSharedPlaylistCategory(shared), 1);
+    EXPECT_EQ(Ids(shared),
+              (std::vector<std::string>{
+                  "musiclib_music_shared_refresh", "musiclib_music_shared_new",
+                  "musiclib_music_shared/playlist/5", "musiclib_music_shared/smart/aa shared"}));
+}
+
+TEST_F(Part_4_1, ButtonTextsFollowTheUserLanguage) {
+    AddUser("admin", kEverything, "ger");
+    InProcessHandler request("admin", kEverything);
+    Json::Value personal(Json::arrayValue);
+    ASSERT_EQ(request.handler.AddPersonalPlaylistCategory(personal), 1);
+    ASSERT_EQ(personal.size(), 2u);
+    const Json::Value german = [] {
+        HarmonaHandler probe;
+        return probe.LoadUITexts();
+    }();
+    EXPECT_EQ(personal[0]["text"].asString(), german["player"]["refresh_btn_title"].asString());
+    EXPECT_EQ(personal[1]["text"].asString(), german["playlist"]["newplaylist"].asString());
+    EXPECT_NE(personal[1]["text"].asString(), "New Playlist");
+}
+
+// The error envelope that Part 1.3's SetError writes into the children array.
+void ExpectErrorWithButtons(const Json::Value& children, int line,
+                            const std::vector<std::string>& buttonIds) {
+    ASSERT_TRUE(children.isObject());
+    EXPECT_FALSE(children["success"].asBool());
+    EXPECT_EQ(children["errinfo"]["sec"].asString(), "common");
+    EXPECT_EQ(children["errinfo"]["key"].asString(), "error_system");
+    EXPECT_EQ(children["errinfo"]["line"].asInt(), line);
+    EXPECT_EQ(Ids(children["items"]), buttonIds);
+}
+
+TEST_F(Part_4_1, UnlistablePersonalPlaylistsGiveErrorLine364AndKeepTheButtons) {
+    // The playlists path is a file, so it cannot be read as a directory.
+    WriteFile(PersonalPlaylistDir("admin"), "not a folder");
+    InProcessHandler request("admin", kEverything);
+    Json::Value personal(Json::arrayValue);
+    EXPECT_EQ(request.handler.AddPersonalPlaylistCategory(personal), 0);
+    ExpectErrorWithButtons(personal, 364,
+                           {"musiclib_music_personal_refresh", "musiclib_music_personal_new"});
+    EXPECT_EQ(LoggedErrors(),
+              std::vector<std::string>{"audio:642 Failed to enum user's playlist!"});
+}
+
+TEST_F(Part_4_1, UnlistableSharedPlaylistsGiveErrorLine399AndKeepTheButtons) {
+    WriteFile(kLibraryDb, std::string(4096, 'x'));  // not a database
+    InProcessHandler request("admin", kAllButNewShared);
+    Json::Value shared(Json::arrayValue);
+    EXPECT_EQ(request.handler.AddSharedPlaylistCategory(shared), 0);
+    ExpectErrorWithButtons(shared, 399, {"musiclib_music_shared_refresh"});
+    EXPECT_EQ(LoggedErrors(),
+              std::vector<std::string>{"audio:642 Failed to enum user's playlist!"});
+
+    InProcessHandler withNew("admin", kEverything);
+    Json::Value sharedWithNew(Json::arrayValue);
+    EXPECT_EQ(withNew.handler.AddSharedPlaylistCategory(sharedWithNew), 0);
+    ExpectErrorWithButtons(sharedWithNew, 399,
+                           {"musiclib_music_shared_refresh", "musiclib_music_shared_new"});
+}
+
+TEST_F(Part_4_1, ErrorEnvelopeSerializesAsTheBrowserSeesIt) {
+    WriteFile(PersonalPlaylistDir("admin"), "not a folder");
+    InProcessHandler request("admin", kEverything);
+    Json::Value personal(Json::arrayValue);
+    ASSERT_EQ(request.handler.AddPersonalPlaylistCategory(personal), 0);
+    Json::Value parsed;
+    ASSERT_TRUE(ParseJson(harmona::cgi::SerializeReply(personal), parsed));
+    EXPECT_EQ(parsed["errinfo"], personal["errinfo"]);
+    EXPECT_EQ(parsed["items"].size(), 2u);
+}
+
+}  // namespace

@@ -1,0 +1,165 @@
+// Part 4.2: playlist listing, built in the test process (see InProcess.h) over real playlist files
+// and a real library.db.
+#include <gtest/gtest.h>
+
+#include "Fixtures.h"
+#include "InProcess.h"
+#include "PlaylistFixtures.h"
+#include "Utf8.h"
+
+using namespace harmona::test;
+
+namespace {
+
+constexpr const char* kFailureLog = "audio:642 Failed to enum user's playlist!";
+constexpr const char* kPlaylistIcon = "3rdparty/Harmona/images/files_class/icon_playlist.png";
+
+class Part_4_2 : public ::testing::Test {
+  protected:
+    void SetUp() override { StandardFixture(); }
+    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
+    Json::Value children{Json::arrayValue};
+};
+
+TEST_F(Part_4_2, CategoryDifferingOnlyInLetterCaseIsUnknownLogsAndFails) {
+    WritePersonalPlaylistFile("admin", "mine.m3u");
+    MakeLibraryDb({}, {{1, "shared"}});
+    for (const char* category :
+         {"MUSIC_PERSONAL", "Music_Personal", "music_Shared", "", "personal"}) {
+        EXPECT_EQ(request.handler.ListPlaylists(children, category), 0) << category;
+        EXPECT_EQ(children, Json::Value(Json::arrayValue)) << category;
+        EXPECT_EQ(LoggedErrors(), std::vector<std::string>{kFailureLog}) << category;
+    }
+}
+
+TEST_F(Part_4_2, PersonalNodesCarryNameIdParentIconAndLeafFlagOnly) {
+    WritePersonalPlaylistFile("admin", "Road Trip & <Co>.m3u");
+    ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
+    ASSERT_EQ(children.size(), 1u);
+    const Json::Value& node = children[0];
+    EXPECT_EQ(node["id"].asString(), "musiclib_music_personal/playlist/Road Trip & <Co>");
+    EXPECT_EQ(node["pid"].asString(), "musiclib_music_personal");
+    EXPECT_EQ(node["text"].asString(), "Road Trip &amp; &lt;Co&gt;");
+    EXPECT_EQ(node["qtip"].asString(), "Road Trip &amp; &lt;Co&gt;");
+    EXPECT_EQ(node["icon"].asString(), kPlaylistIcon);
+    EXPECT_TRUE(node["leaf"].asBool());
+    for (const char* flag : {"allowDrag", "allowDrop", "draggable", "expanded"})
+        EXPECT_FALSE(node[flag].asBool()) << flag;
+    EXPECT_TRUE(LoggedErrors().empty());
+}
+
+TEST_F(Part_4_2, SharedNodesAreAddressedByNumberInTheLibrarysOrder) {
+    MakeLibraryDb({}, {{12, "beta"}, {4, "Alpha"}, {9, "alpha"}, {30, "Gamma"}});
+    ASSERT_EQ(request.handler.ListPlaylists(children, "music_shared"), 1);
+    EXPECT_EQ(Ids(children),
+              (std::vector<std::string>{
+                  "musiclib_music_shared/playlist/4", "musiclib_music_shared/playlist/9",
+                  "musiclib_music_shared/playlist/12", "musiclib_music_shared/playlist/30"}));
+    EXPECT_EQ(Texts(children), (std::vector<std::string>{"Alpha", "alpha", "beta", "Gamma"}));
+    EXPECT_EQ(children[0]["pid"].asString(), "musiclib_music_shared");
+    EXPECT_EQ(children[0]["icon"].asString(), kPlaylistIcon);
+}
+
+TEST_F(Part_4_2, SharedPlaylistWithIdZeroGivesDecimalZero) {
+    MakeLibraryDb({}, {{0, "zero"}, {4294967295, "largest"}});
+    ASSERT_EQ(request.handler.ListPlaylists(children, "music_shared"), 1);
+    EXPECT_EQ(Ids(children), (std::vector<std::string>{"musiclib_music_shared/playlist/4294967295",
+                                                       "musiclib_music_shared/playlist/0"}));
+}
+
+TEST_F(Part_4_2, TwoPersonalPlaylistsWithTheSameNameGiveTwoNodesWithTheSameId) {
+    // "a.m3u" and "a.M3U8" are two files that both name the playlist "a".
+    WritePersonalPlaylistFile("admin", "a.m3u");
+    WritePersonalPlaylistFile("admin", "a.M3U8");
+    WritePersonalPlaylistFile("admin", "b.m3u8");
+    ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
+    EXPECT_EQ(Ids(children), (std::vector<std::string>{"musiclib_music_personal/playlist/a",
+                                                       "musiclib_music_personal/playlist/a",
+                                                       "musiclib_music_personal/playlist/b"}));
+}
+
+TEST_F(Part_4_2, LongestPossibleNameIsWholeInIdAndText) {
+    // A record's name holds at most 254 bytes (platform.md section 7), so an id of this Part is at
+    // most 33 + 254 bytes and can never reach the 4095-byte cut; the longest file name gives the
+    // longest name, whole.
+    const std::string name(251, 'n');
+    WritePersonalPlaylistFile("admin", name + ".m3u");
+    ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
+    ASSERT_EQ(children.size(), 1u);
+    EXPECT_EQ(children[0]["id"].asString(), "musiclib_music_personal/playlist/" + name);
+    EXPECT_EQ(children[0]["text"].asString(), name);
+}
+
+TEST_F(Part_4_2, OverlongSharedNameIsCutOnACharacterBoundaryByThePlatform) {
+    std::string name;
+    for (int i = 0; i < 200; ++i)
+        name += "\xC3\xA9";  // é, 2 bytes each: 400 bytes
+    MakeLibraryDb({}, {{1, name}});
+    ASSERT_EQ(request.handler.ListPlaylists(children, "music_shared"), 1);
+    ASSERT_EQ(children.size(), 1u);
+    EXPECT_EQ(children[0]["text"].asString(), name.substr(0, 254));
+    EXPECT_EQ(children[0]["id"].asString(), "musiclib_music_shared/playlist/1");
+}
+
+TEST_F(Part_4_2, EmptyListsAreSuccessesWithNothingAppended) {
+    children.append("kept");
+    EXPECT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);  // no folder at all
+    MakeDirs(PersonalPlaylistDir("admin"));
+    WritePersonalPlaylistFile("admin", "notes.txt");
+    MakeDirs(PersonalPlaylistDir("admin") + "/folder.m3u");
+    EXPECT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
+    EXPECT_EQ(request.handler.ListPlaylists(children, "music_shared"), 1);  // no database file
+    MakeLibraryDb({GeneratedTrack(1)}, {});
+    EXPECT_EQ(request.handler.ListPlaylists(children, "music_shared"), 1);  // no playlist row
+    ASSERT_EQ(children.size(), 1u);
+    EXPECT_EQ(children[0].asString(), "kept");
+    EXPECT_TRUE(LoggedErrors().empty());
+}
+
+TEST_F(Part_4_2, NodesAreAppendedAfterWhatTheArrayHolds) {
+    children.append("first");
+    WritePersonalPlaylistFile("admin", "x.m3u");
+    ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
+    ASSERT_EQ(children.size(), 2u);
+    EXPECT_EQ(children[0].asString(), "first");
+    EXPECT_EQ(children[1]["text"].asString(), "x");
+}
+
+TEST_F(Part_4_2, LibraryThatIsNotADatabaseFailsWithTheLogLine) {
+    WriteFile(kLibraryDb, "SQLite format 2, or rather not at all\n" + std::string(2000, '\0'));
+    EXPECT_EQ(request.handler.ListPlaylists(children, "music_shared"), 0);
+    EXPECT_EQ(children, Json::Value(Json::arrayValue));
+    const std::vector<LogLine> lines = TakeLogLines(100);
+    ASSERT_EQ(lines.size(), 1u);
+    EXPECT_EQ(lines[0].message, kFailureLog);
+    EXPECT_EQ(lines[0].priority & 7, LOG_ERR);
+}
+
+TEST_F(Part_4_2, UnreadablePlaylistsFolderFailsWithTheLogLine) {
+    WriteFile(PersonalPlaylistDir("admin"), "a file where the folder should be");
+    EXPECT_EQ(request.handler.ListPlaylists(children, "music_personal"), 0);
+    EXPECT_EQ(LoggedErrors(), std::vector<std::string>{kFailureLog});
+}
+
+TEST_F(Part_4_2, DatabaseLockedByAWriterForASecondStillGivesTheList) {
+    MakeLibraryDb({}, {{1, "one"}, {2, "two"}});
+    DatabaseWriterLock writer(kLibraryDb, 1000);
+    ASSERT_TRUE(writer.Locked());
+    EXPECT_EQ(request.handler.ListPlaylists(children, "music_shared"), 1);
+    EXPECT_EQ(Texts(children), (std::vector<std::string>{"one", "two"}));
+}
+
+TEST_F(Part_4_2, FileNameThatIsNotUtf8GivesAValidUtf8Reply) {
+    WritePersonalPlaylistFile("admin", "bad\xFF\xFEname.m3u");
+    ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
+    ASSERT_EQ(children.size(), 1u);
+    const std::string reply = harmona::cgi::SerializeReply(children);
+    EXPECT_TRUE(harmona::cgi::IsValidUtf8(reply));
+    Json::Value parsed;
+    ASSERT_TRUE(ParseJson(reply, parsed)) << reply;
+    const std::string text = parsed[0]["text"].asString();
+    EXPECT_EQ(text, "bad\xEF\xBF\xBD\xEF\xBF\xBDname");  // each bad byte is U+FFFD
+    EXPECT_EQ(parsed[0]["id"].asString(), "musiclib_music_personal/playlist/" + text);
+}
+
+}  // namespace

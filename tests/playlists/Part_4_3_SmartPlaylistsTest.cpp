@@ -1,0 +1,145 @@
+// Part 4.3: smart playlists, built in the test process (see InProcess.h) over real smart playlist
+// files.
+#include <gtest/gtest.h>
+
+#include "Fixtures.h"
+#include "InProcess.h"
+#include "PlaylistFixtures.h"
+#include "SmartPlaylists.h"
+
+using namespace harmona::test;
+
+namespace {
+
+constexpr const char* kSmartIcon = "3rdparty/Harmona/images/files_class/icon_smartpls.png";
+
+class Part_4_3 : public ::testing::Test {
+  protected:
+    void SetUp() override { StandardFixture(); }
+    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
+    Json::Value children{Json::arrayValue};
+
+    std::vector<std::string> PersonalTexts(const std::vector<std::string>& enumerated) {
+        WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), enumerated);
+        Json::Value nodes(Json::arrayValue);
+        EXPECT_EQ(request.handler.ListSmartPlaylists(nodes, "music_personal"), 1);
+        return Texts(nodes);
+    }
+};
+
+TEST_F(Part_4_3, NamesBADAreListedAsAbd) {
+    EXPECT_EQ(PersonalTexts({"b", "A", "d"}), (std::vector<std::string>{"A", "b", "d"}));
+}
+
+TEST_F(Part_4_3, RockAndrockBothAppearInEnumerationOrder) {
+    EXPECT_EQ(PersonalTexts({"Rock", "pop", "rock"}),
+              (std::vector<std::string>{"pop", "Rock", "rock"}));
+    EXPECT_EQ(PersonalTexts({"rock", "pop", "Rock"}),
+              (std::vector<std::string>{"pop", "rock", "Rock"}));
+}
+
+TEST_F(Part_4_3, NoNameIsListedFewerTimesThanEnumerated) {
+    EXPECT_EQ(PersonalTexts({"Jazz", "jazz", "Jazz", "JAZZ", "blues", "jAzz"}),
+              (std::vector<std::string>{"blues", "Jazz", "jazz", "Jazz", "JAZZ", "jAzz"}));
+}
+
+TEST_F(Part_4_3, OrderFoldsAsciiLettersOnlyDigitsAndUnderscoreFirst) {
+    EXPECT_EQ(
+        PersonalTexts({"cherry", "_under", "Banana", "9lives", "apple", "Zed", "[x]"}),
+        (std::vector<std::string>{"9lives", "[x]", "_under", "apple", "Banana", "cherry", "Zed"}));
+}
+
+TEST_F(Part_4_3, NameOrderIsCaseInsensitiveStrictComparison) {
+    SmartPlaylistNameOrder before;
+    EXPECT_TRUE(before("apple", "Banana"));
+    EXPECT_FALSE(before("Banana", "apple"));
+    EXPECT_FALSE(before("Rock", "rock"));  // tied: neither goes before the other
+    EXPECT_FALSE(before("rock", "Rock"));
+    EXPECT_TRUE(before("_", "a"));
+}
+
+TEST_F(Part_4_3, PersonalNodesCarryIdParentIconAndLeafFlagOnly) {
+    WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"Best of <80s>"});
+    ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
+    ASSERT_EQ(children.size(), 1u);
+    const Json::Value& node = children[0];
+    EXPECT_EQ(node["id"].asString(), "musiclib_music_personal/smart/Best of <80s>");
+    EXPECT_EQ(node["pid"].asString(), "musiclib_music_personal");
+    EXPECT_EQ(node["text"].asString(), "Best of &lt;80s&gt;");
+    EXPECT_EQ(node["icon"].asString(), kSmartIcon);
+    EXPECT_TRUE(node["leaf"].asBool());
+    for (const char* flag : {"allowDrag", "allowDrop", "draggable", "expanded"})
+        EXPECT_FALSE(node[flag].asBool()) << flag;
+}
+
+TEST_F(Part_4_3, SharedCategoryReadsTheSharedFileAndAddressesByName) {
+    WriteSmartPlaylistFile(kSharedSmartPlaylistFile, {"party", "Ambient"});
+    WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"not shared"});
+    ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_shared"), 1);
+    EXPECT_EQ(Ids(children), (std::vector<std::string>{"musiclib_music_shared/smart/Ambient",
+                                                       "musiclib_music_shared/smart/party"}));
+    EXPECT_EQ(children[0]["pid"].asString(), "musiclib_music_shared");
+    EXPECT_EQ(children[0]["icon"].asString(), kSmartIcon);
+}
+
+TEST_F(Part_4_3, PersonalUserWithoutTheFileGetsButtonsAndOrdinaryPlaylistsOnlyAndNoError) {
+    WritePersonalPlaylistFile("admin", "one.m3u");
+    WriteSmartPlaylistFile(kSharedSmartPlaylistFile, {"shared smart"});  // not the user's
+    EXPECT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
+    EXPECT_EQ(children.size(), 0u);
+
+    Json::Value category(Json::arrayValue);
+    ASSERT_EQ(request.handler.AddPersonalPlaylistCategory(category), 1);
+    EXPECT_EQ(Ids(category), (std::vector<std::string>{"musiclib_music_personal_refresh",
+                                                       "musiclib_music_personal_new",
+                                                       "musiclib_music_personal/playlist/one"}));
+    EXPECT_TRUE(LoggedErrors().empty());
+}
+
+TEST_F(Part_4_3, NameWithSlashIsPutIntoTheIdUnescaped) {
+    WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"rock/80s/live"});
+    ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
+    ASSERT_EQ(children.size(), 1u);
+    EXPECT_EQ(children[0]["id"].asString(), "musiclib_music_personal/smart/rock/80s/live");
+    EXPECT_EQ(children[0]["text"].asString(), "rock/80s/live");
+}
+
+TEST_F(Part_4_3, IdLongerThan4095BytesIsCutTextKeepsTheWholeName) {
+    const std::string name(5000, 'L');
+    WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {name});
+    ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
+    ASSERT_EQ(children.size(), 1u);
+    const std::string id = children[0]["id"].asString();
+    EXPECT_EQ(id.size(), 4095u);
+    EXPECT_EQ(id, ("musiclib_music_personal/smart/" + name).substr(0, 4095));
+    EXPECT_EQ(children[0]["text"].asString(), name);
+}
+
+TEST_F(Part_4_3, UnknownCategoryGivesNothingResultOneAndNoLog) {
+    WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"a"});
+    WriteSmartPlaylistFile(kSharedSmartPlaylistFile, {"b"});
+    for (const char* category : {"MUSIC_PERSONAL", "music_Shared", "ipod", ""})
+        EXPECT_EQ(request.handler.ListSmartPlaylists(children, category), 1) << category;
+    EXPECT_EQ(children.size(), 0u);
+    EXPECT_TRUE(LoggedErrors().empty());
+}
+
+TEST_F(Part_4_3, EmptyOrUnreadableFilesGiveNoNodesAndSuccess) {
+    WriteFile(UserSmartPlaylistFile("admin"), "# no sections\nkey=value\n[]\n");
+    EXPECT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
+    MakeDirs(kSharedSmartPlaylistFile);  // a folder where the file should be
+    EXPECT_EQ(request.handler.ListSmartPlaylists(children, "music_shared"), 1);
+    EXPECT_EQ(children.size(), 0u);
+    EXPECT_TRUE(LoggedErrors().empty());
+}
+
+TEST_F(Part_4_3, SmartNodesAreAppendedAfterWhatTheArrayHolds) {
+    children.append("ordinary");
+    WriteSmartPlaylistFile(kSharedSmartPlaylistFile, {"s"});
+    ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_shared"), 1);
+    ASSERT_EQ(children.size(), 2u);
+    EXPECT_EQ(children[0].asString(), "ordinary");
+    EXPECT_EQ(children[1]["text"].asString(), "s");
+}
+
+}  // namespace

@@ -1,0 +1,88 @@
+// Parts 4.1 and 4.2 over scripted platform answers (ScriptedPlaylistPlatform.cpp): the failing
+// smart playlist listing, which the real Part 4.3 never reports, and a personal playlist name that
+// holds "/", which no file name can.
+#include <gtest/gtest.h>
+
+#include "Fixtures.h"
+#include "InProcess.h"
+#include "ScriptedPlaylistPlatform.h"
+
+using namespace harmona::test;
+
+namespace {
+
+class Part_4_1 : public ::testing::Test {
+  protected:
+    void SetUp() override {
+        StandardFixture();
+        Scripted() = ScriptedPlatform();
+    }
+    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
+    Json::Value children{Json::arrayValue};
+};
+
+void ExpectSystemError(const Json::Value& reply, int line, const std::vector<std::string>& ids) {
+    ASSERT_TRUE(reply.isObject());
+    EXPECT_FALSE(reply["success"].asBool());
+    EXPECT_EQ(reply["errinfo"]["sec"].asString(), "common");
+    EXPECT_EQ(reply["errinfo"]["key"].asString(), "error_system");
+    EXPECT_EQ(reply["errinfo"]["line"].asInt(), line);
+    EXPECT_EQ(Ids(reply["items"]), ids);
+}
+
+TEST_F(Part_4_1, FailedPersonalSmartListingGivesErrorLine369AfterTheOrdinaryPlaylists) {
+    Scripted().personal.records = {{1, "mine"}};
+    Scripted().smartResult = 0;
+    EXPECT_EQ(request.handler.AddPersonalPlaylistCategory(children), 0);
+    ExpectSystemError(children, 369,
+                      {"musiclib_music_personal_refresh", "musiclib_music_personal_new",
+                       "musiclib_music_personal/playlist/mine"});
+    EXPECT_EQ(Scripted().smartCategories, std::vector<std::string>{"music_personal"});
+    EXPECT_EQ(Scripted().personalPrefDir, "/usr/vanu/etc/preference/admin");
+}
+
+TEST_F(Part_4_1, FailedSharedSmartListingGivesErrorLine404AfterTheOrdinaryPlaylists) {
+    Scripted().shared.records = {{3, "ours"}};
+    Scripted().smartResult = 0;
+    EXPECT_EQ(request.handler.AddSharedPlaylistCategory(children), 0);
+    ExpectSystemError(children, 404,
+                      {"musiclib_music_shared_refresh", "musiclib_music_shared_new",
+                       "musiclib_music_shared/playlist/3"});
+    EXPECT_EQ(Scripted().smartCategories, std::vector<std::string>{"music_shared"});
+}
+
+TEST_F(Part_4_1, FailedOrdinaryListingSkipsTheSmartListing) {
+    Scripted().personal.result = -1;
+    Scripted().shared.result = -5;
+    EXPECT_EQ(request.handler.AddPersonalPlaylistCategory(children), 0);
+    EXPECT_EQ(children["errinfo"]["line"].asInt(), 364);
+    Json::Value shared(Json::arrayValue);
+    EXPECT_EQ(request.handler.AddSharedPlaylistCategory(shared), 0);
+    EXPECT_EQ(shared["errinfo"]["line"].asInt(), 399);
+    EXPECT_TRUE(Scripted().smartCategories.empty());
+}
+
+using Part_4_2 = Part_4_1;
+
+TEST_F(Part_4_2, PersonalNameWithSlashGivesAnIdOfMoreThanThreePartsUnescaped) {
+    Scripted().personal.records = {{1, "rock/80s/live"}};
+    ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
+    ASSERT_EQ(children.size(), 1u);
+    const std::string id = children[0]["id"].asString();
+    EXPECT_EQ(id, "musiclib_music_personal/playlist/rock/80s/live");
+    EXPECT_EQ(std::count(id.begin(), id.end(), '/'), 4);
+    EXPECT_EQ(children[0]["text"].asString(), "rock/80s/live");
+}
+
+TEST_F(Part_4_2, PositiveListingResultIsSuccessNegativeIsFailure) {
+    Scripted().shared = {2, {{0, "zero"}}};
+    EXPECT_EQ(request.handler.ListPlaylists(children, "music_shared"), 1);
+    EXPECT_EQ(Ids(children), std::vector<std::string>{"musiclib_music_shared/playlist/0"});
+    Scripted().shared.result = -1;
+    EXPECT_EQ(request.handler.ListPlaylists(children, "music_shared"), 0);
+    EXPECT_EQ(children.size(), 1u);
+    EXPECT_EQ(LoggedErrors(),
+              std::vector<std::string>{"audio:642 Failed to enum user's playlist!"});
+}
+
+}  // namespace

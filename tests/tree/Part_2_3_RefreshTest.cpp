@@ -1,0 +1,148 @@
+// Part 2.3: refresh action, through the real CGI; with Part 1.1's refresh dispatch and Part 1.3's
+// error envelope of a failing refresh.
+#include <gtest/gtest.h>
+
+#include "CgiRunner.h"
+#include "Fixtures.h"
+#include "HarmonaHandler.h"
+#include "IPodFixtures.h"
+#include "PlaylistFixtures.h"
+#include "Refresh.h"
+#include "TreeFixture.h"
+
+using namespace harmona::test;
+using Strings = std::vector<std::string>;
+
+namespace {
+
+CgiResult Refresh(const std::string& target) {
+    return Get(Query({{"action", "refresh"}, {"target", target}}));
+}
+
+TEST(Part_2_3, IPodWithNoIPodAttachedIsASuccessWithNullItems) {
+    TreeWorld world;
+    world.ipod = false;
+    TreeFixture fixture(world);
+    const CgiResult r = Refresh("ipod");
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_EQ(r.body, "{\"items\":null,\"success\":true}\n");
+}
+
+TEST(Part_2_3, IPodGivesThePlaylistNodesWithoutTheRefreshButton) {
+    TreeFixture fixture(TreeWorld{});
+    const CgiResult r = Refresh("ipod");
+    EXPECT_EQ(r.json["success"], true);
+    EXPECT_EQ(Ids(r.json["items"]), (Strings{"ipod_" + IPodKey(fixture.IPodIds()[0]),
+                                             "ipod_" + IPodKey(fixture.IPodIds()[1])}));
+    EXPECT_EQ(r.json["items"][0]["text"], "Gym");
+    EXPECT_EQ(r.json["items"][0]["pid"], "ipod_root");
+}
+
+TEST(Part_2_3, PersonalListsPlainPlaylistsThenSmartOnes) {
+    TreeFixture fixture(TreeWorld{});
+    const CgiResult r = Refresh("personal");
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_EQ(r.json["success"], true);
+    EXPECT_EQ(Ids(r.json["items"]),
+              (Strings{"musiclib_music_personal/playlist/Morning",
+                       "musiclib_music_personal/playlist/Road trip",
+                       "musiclib_music_personal/smart/blues", "musiclib_music_personal/smart/Jazz",
+                       "musiclib_music_personal/smart/rock"}));
+}
+
+TEST(Part_2_3, RefreshSeesAPlaylistAddedSinceTheTreeWasBuilt) {
+    TreeWorld world;
+    world.personalSmart = {};
+    TreeFixture fixture(world);
+    EXPECT_EQ(Refresh("personal").json["items"].size(), 2u);
+    WritePersonalPlaylistFile(world.user, "Added later.m3u8");
+    EXPECT_EQ(Ids(Refresh("personal").json["items"]),
+              (Strings{"musiclib_music_personal/playlist/Added later",
+                       "musiclib_music_personal/playlist/Morning",
+                       "musiclib_music_personal/playlist/Road trip"}));
+}
+
+TEST(Part_2_3, SharedListsPlaylistsByNumberThenSmartOnes) {
+    TreeFixture fixture(TreeWorld{});
+    const CgiResult r = Refresh("shared");
+    EXPECT_EQ(Ids(r.json["items"]),
+              (Strings{"musiclib_music_shared/playlist/3", "musiclib_music_shared/playlist/7",
+                       "musiclib_music_shared/smart/Top rated"}));
+    EXPECT_EQ(r.json["items"][0]["text"], "Chill");
+}
+
+TEST(Part_2_3, NoPlaylistsAtAllGivesASuccessWithNullItems) {
+    InstallTexts();
+    AddUser("admin", 8);
+    EXPECT_EQ(Refresh("personal").body, "{\"items\":null,\"success\":true}\n");
+    EXPECT_EQ(Refresh("shared").body, "{\"items\":null,\"success\":true}\n");
+}
+
+// Part 1.3: a failing refresh of personal playlists prints the error envelope and no "items".
+TEST(Part_2_3, FailingPersonalListingPrintsTheErrorEnvelopeWithoutItems) {
+    TreeWorld world;
+    world.personal = {};
+    world.personalSmart = {};
+    TreeFixture fixture(world);
+    WriteFile(PersonalPlaylistDir(world.user), "not a folder");
+    const CgiResult r = Refresh("personal");
+    EXPECT_EQ(r.exitStatus, 1);  // refresh returns 1 whatever the builder did (Part 1.1)
+    ASSERT_TRUE(r.jsonOk) << r.output;
+    EXPECT_FALSE(r.json.isMember("items"));
+    EXPECT_EQ(r.json["success"], false);
+    EXPECT_EQ(r.json["errinfo"]["sec"], "common");
+    EXPECT_EQ(r.json["errinfo"]["key"], "error_system");
+}
+
+TEST(Part_2_3, FailingSharedListingPrintsTheErrorEnvelope) {
+    TreeFixture fixture(TreeWorld{});
+    WriteFile(kLibraryDb, "SQLite format 2\n" + std::string(2000, 'z'));
+    const CgiResult r = Refresh("shared");
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_FALSE(r.json.isMember("items"));
+    EXPECT_EQ(r.json["errinfo"]["key"], "error_system");
+}
+
+// The smart playlist listing always succeeds (Part 4.3), so its failure is made here.
+TEST(Part_2_3, PlainPlaylistsListButSmartOnesFailGivesAnErrorWithoutItems) {
+    TreeFixture fixture(TreeWorld{});
+    setenv("REMOTE_USER", "admin", 1);
+    HarmonaHandler handler;
+    harmona::tree::RefreshListers listers = harmona::tree::DefaultRefreshListers();
+    listers.smartPlaylists = [](HarmonaHandler&, Json::Value&, const char*) { return 0; };
+    ::testing::internal::CaptureStdout();
+    harmona::tree::RefreshNodeWith(handler, "personal", listers);
+    const std::string output = ::testing::internal::GetCapturedStdout();
+    Json::Value reply;
+    ASSERT_TRUE(ParseJson(output.substr(output.find("\r\n\r\n") + 4), reply)) << output;
+    EXPECT_FALSE(reply.isMember("items"));
+    EXPECT_EQ(reply["success"], false);
+    EXPECT_EQ(reply["errinfo"]["key"], "error_system");
+    EXPECT_EQ(output.find("Road trip"), std::string::npos);  // nodes already listed are dropped
+}
+
+TEST(Part_2_3, CapitalisedEmptyAndAbsentTargetsGiveAnEmptyReply) {
+    TreeFixture fixture(TreeWorld{});
+    for (const char* query :
+         {"action=refresh&target=Personal", "action=refresh&target=", "action=refresh",
+          "action=refresh&target=IPOD", "action=refresh&target=music_personal"}) {
+        const CgiResult r = Get(query);
+        EXPECT_EQ(r.exitStatus, 1) << query;
+        EXPECT_EQ(r.body, "[]\n") << query;
+    }
+}
+
+// Part 1.1: "refresh" exits with 1 even when the builder reported an error.
+TEST(Part_2_3, MediaserverAndIPodTargetsExitWithOneWhateverHappened) {
+    InstallTexts();
+    AddUser("admin", 9);
+    const CgiResult media = Refresh("mediaserver");  // no daemon
+    EXPECT_EQ(media.exitStatus, 1);
+    EXPECT_EQ(media.body, "{\"items\":null,\"success\":true}\n");
+    WriteIPodMountpointFile("/tmp/no-ipod-here\n");
+    const CgiResult ipod = Refresh("ipod");
+    EXPECT_EQ(ipod.exitStatus, 1);
+    EXPECT_EQ(ipod.json["success"], true);
+}
+
+}  // namespace
