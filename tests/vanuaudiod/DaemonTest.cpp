@@ -349,3 +349,97 @@ TEST_F(Vanuaudiod, HostileNamesAreCleanedAndRepliesStayInsideTheClientsBuffer) {
     ASSERT_GE(reply["list"].size(), 10u);  // a page of Part 3.2's size always fits
     EXPECT_EQ(reply["list"][0]["friendly_name"].asString(), std::string(512, '"'));
 }
+
+// Through the real CGI: Part 3.2's client pages the real daemon's list into media server nodes.
+namespace {
+
+const Json::Value* FindNode(const Json::Value& nodes, const std::string& id) {
+    for (const Json::Value& node : nodes) {
+        if (node["id"].asString() == id)
+            return &node;
+    }
+    return nullptr;
+}
+
+CgiResult RefreshMediaServers() {
+    return Get(Query({{"action", "refresh"}, {"target", "mediaserver"}}));
+}
+
+}  // namespace
+
+TEST_F(Vanuaudiod, ServersOnTheNetworkAppearAsMediaServerNodesThroughTheCgi) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    Process minidlna = StartMiniDlna(peer_, "Kitchen MiniDLNA", 8200);
+    FakeMediaServers fake;
+    fake.Add("uuid:nameless", FakeMediaServers::DescriptionXml("uuid:nameless", "", "/cd"));
+    fake.Alive("uuid:nameless", 60);
+    // The scan: the CGI's refresh sends command 14 (the search), then pages with command 16.
+    const CgiResult first = RefreshMediaServers();
+    ASSERT_TRUE(first.jsonOk) << first.output;
+    EXPECT_EQ(first.json["success"], true);
+    WaitForList([](const Json::Value& l) { return l.size() == 2; }, 15000);
+
+    const CgiResult refresh = RefreshMediaServers();
+    ASSERT_TRUE(refresh.jsonOk) << refresh.output;
+    EXPECT_EQ(refresh.json["success"], true);
+    const Json::Value& items = refresh.json["items"];
+    ASSERT_EQ(items.size(), 2u) << refresh.body;
+    const Json::Value* kitchen =
+        FindNode(items, "mediaserver_http://10.77.0.2:8200/ctl/ContentDir");
+    ASSERT_NE(kitchen, nullptr) << refresh.body;
+    EXPECT_EQ((*kitchen)["text"], "Kitchen MiniDLNA");
+    EXPECT_EQ((*kitchen)["pid"], "mediaserver_root");
+    EXPECT_EQ((*kitchen)["leaf"], true);
+    const std::string namelessId =
+        "mediaserver_http://10.77.0.1:" + std::to_string(fake.Port()) + "/cd";
+    const Json::Value* nameless = FindNode(items, namelessId);
+    ASSERT_NE(nameless, nullptr) << refresh.body;
+    EXPECT_EQ((*nameless)["text"], kHostAddress);  // no friendly name: its ip
+
+    // The same servers under the root tree's media server node, after the scan button.
+    const CgiResult root = Get(Query({{"action", "gettreenode"}, {"node", "audiotree_root"}}));
+    ASSERT_TRUE(root.jsonOk) << root.output;
+    const Json::Value* mediaRoot = FindNode(root.json, "mediaserver_root");
+    ASSERT_NE(mediaRoot, nullptr) << root.body;
+    const Json::Value& children = (*mediaRoot)["children"];
+    ASSERT_EQ(children.size(), 3u) << root.body;
+    EXPECT_EQ(children[0]["id"], "mediaserver_refresh");
+    EXPECT_NE(FindNode(children, "mediaserver_http://10.77.0.2:8200/ctl/ContentDir"), nullptr);
+    EXPECT_NE(FindNode(children, namelessId), nullptr);
+}
+
+TEST_F(Vanuaudiod, AStoppedServerLeavesTheCgisListAfterItsByebye) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    Process minidlna = StartMiniDlna(peer_, "Garage MiniDLNA", 8202);
+    RefreshMediaServers();
+    WaitForList([](const Json::Value& l) { return l.size() == 1; }, 15000);
+    const CgiResult before = RefreshMediaServers();
+    ASSERT_EQ(before.json["items"].size(), 1u) << before.body;
+    minidlna.Stop(SIGTERM, 5000);
+    WaitForList([](const Json::Value& l) { return l.empty(); }, 5000);
+    const CgiResult after = RefreshMediaServers();
+    ASSERT_TRUE(after.jsonOk) << after.output;
+    EXPECT_EQ(after.json["success"], true);
+    EXPECT_EQ(after.json["items"].size(), 0u) << after.body;
+}
+
+TEST_F(Vanuaudiod, TwentyFiveServersArePagedIntoTwentyFiveNodesByTheCgi) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    for (int i = 0; i < 25; ++i) {
+        const std::string udn = "uuid:many-" + std::to_string(i);
+        fake.Add(udn, FakeMediaServers::DescriptionXml(udn, "Server " + std::to_string(100 + i),
+                                                       "/cd/" + std::to_string(i)));
+        fake.Alive(udn, 60);
+    }
+    WaitForList([](const Json::Value& l) { return l.size() == 25; }, 10000);
+    const CgiResult refresh = RefreshMediaServers();
+    ASSERT_TRUE(refresh.jsonOk) << refresh.output;
+    const Json::Value& items = refresh.json["items"];
+    ASSERT_EQ(items.size(), 25u) << refresh.body;
+    for (int i = 0; i < 25; ++i)
+        EXPECT_EQ(items[i]["text"], "Server " + std::to_string(100 + i));
+}
