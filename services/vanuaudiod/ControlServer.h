@@ -18,9 +18,9 @@ namespace vanuaudiod {
 
 struct ControlServerOptions {
     std::string socketPath;
-    mode_t socketMode = 0666;       // the web server's CGI user must be able to connect
-    int requestTimeoutMs = 2000;    // to send the whole record
-    std::size_t maxClients = 1024;  // more at once are closed at once
+    mode_t socketMode = 0666;      // the web server's CGI user must be able to connect
+    int requestTimeoutMs = 2000;   // to send the whole record
+    std::size_t maxClients = 512;  // more at once are closed at once (within RLIMIT_NOFILE)
 };
 
 class ControlServer {

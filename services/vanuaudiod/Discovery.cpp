@@ -20,6 +20,9 @@ constexpr const char kMediaServerPrefix[] = "urn:schemas-upnp-org:device:MediaSe
 // Queued description fetches beyond this are dropped (a flood of fake announcements must not
 // grow memory); the device is fetched on a later announcement.
 constexpr std::size_t kMaxQueuedFetches = 256;
+// Searches are sent at most this often: many browsers pressing the scan button at once (command
+// 14 each) must not flood the network; a request within the interval is served at its end.
+constexpr auto kSearchInterval = std::chrono::seconds(1);
 // The most devices kept at once, for the same reason.
 constexpr std::size_t kMaxKnownDevices = 1024;
 
@@ -152,9 +155,12 @@ void Discovery::Enqueue(FetchJob job) {
 
 void Discovery::SchedulerLoop() {
     std::unique_lock<std::mutex> lock(mutex_);
+    Clock::time_point lastSearch{};
     while (!stopping_) {
-        if (searchWanted_) {
+        const auto now = Clock::now();
+        if (searchWanted_ && now - lastSearch >= kSearchInterval) {
             searchWanted_ = false;
+            lastSearch = now;
             lock.unlock();
             // Blocks a few hundred milliseconds (libupnp repeats the datagram); the control
             // socket's loop is not on this thread, so it keeps answering meanwhile.
@@ -164,14 +170,16 @@ void Discovery::SchedulerLoop() {
             lock.lock();
             continue;
         }
-        // Wake at the next expiry, at the latest after a second.
+        // Wake at the next expiry or the next allowed search, at the latest after a second.
         lock.unlock();
         const int gone = servers_.Expire(Clock::now());
         if (gone > 0)
             syslog(LOG_INFO, "%d media server(s) expired", gone);
-        const auto next = std::min(servers_.NextExpiry(), Clock::now() + std::chrono::seconds(1));
+        auto next = std::min(servers_.NextExpiry(), Clock::now() + std::chrono::seconds(1));
         lock.lock();
-        if (!stopping_ && !searchWanted_)
+        if (searchWanted_)
+            next = std::min(next, lastSearch + kSearchInterval);
+        if (!stopping_)
             schedulerWake_.wait_until(lock, next);
     }
 }

@@ -7,7 +7,12 @@
 // --interface: the network interface for SSDP (default: libupnp's first suitable one; tests on a
 // private loopback use "lo"). --socket: the control socket (default /tmp/vanuaudiod.sock, the fixed
 // path of platform.md section 1; other paths only for benchmarks).
+//
+// The host needs a route for multicast (its default route, or 224.0.0.0/4 on the interface):
+// without one, libupnp's M-SEARCH fails with ENETUNREACH and servers are found only by their
+// own announcements.
 #include <signal.h>
+#include <sys/resource.h>
 #include <syslog.h>
 
 #include <cstdio>
@@ -54,6 +59,15 @@ void PrepareSignals() {
     signal(SIGPIPE, SIG_IGN);
 }
 
+// Room for many clients at once: the soft limit on descriptors up to the hard one.
+void RaiseDescriptorLimit() {
+    struct rlimit limit {};
+    if (getrlimit(RLIMIT_NOFILE, &limit) == 0 && limit.rlim_cur < limit.rlim_max) {
+        limit.rlim_cur = limit.rlim_max;
+        setrlimit(RLIMIT_NOFILE, &limit);
+    }
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
@@ -64,6 +78,7 @@ int main(int argc, char** argv) {
     }
     openlog("vanuaudiod", LOG_PID | (arguments.verbose ? LOG_PERROR : 0), LOG_DAEMON);
     PrepareSignals();
+    RaiseDescriptorLimit();
 
     vanuaudiod::ServerList servers;
     vanuaudiod::DiscoveryOptions discoveryOptions;

@@ -157,9 +157,13 @@ PeerNetwork::PeerNetwork() {
     ok_ = Shell("ip link add va type veth peer name vb netns " + peer) &&
           Shell("echo 0 > /proc/sys/net/ipv6/conf/va/accept_dad") &&
           Shell("ip addr add 10.77.0.1/24 dev va && ip link set va up") &&
+          // Multicast needs a route (a LAN host has its default route): without one, libupnp's
+          // M-SEARCH fails with ENETUNREACH.
+          Shell("ip route add 224.0.0.0/4 dev va") &&
           Shell("nsenter -t " + peer +
                 " -n sh -c 'echo 0 > /proc/sys/net/ipv6/conf/vb/accept_dad && ip link set lo up && "
-                "ip addr add 10.77.0.2/24 dev vb && ip link set vb up'");
+                "ip addr add 10.77.0.2/24 dev vb && ip link set vb up && ip route add 224.0.0.0/4 "
+                "dev vb'");
 }
 
 PeerNetwork::~PeerNetwork() {
@@ -265,6 +269,21 @@ FakeMediaServers::FakeMediaServers() {
     setsockopt(udpFd_, IPPROTO_IP, IP_MULTICAST_IF, &interfaceAddress, sizeof(interfaceAddress));
     const unsigned char loop = 1;
     setsockopt(udpFd_, IPPROTO_IP, IP_MULTICAST_LOOP, &loop, sizeof(loop));
+
+    ssdpFd_ = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    const int yes = 1;
+    setsockopt(ssdpFd_, SOL_SOCKET, SO_REUSEADDR, &yes, sizeof(yes));
+    sockaddr_in ssdp{};
+    ssdp.sin_family = AF_INET;
+    ssdp.sin_port = htons(1900);
+    EXPECT_EQ(bind(ssdpFd_, reinterpret_cast<sockaddr*>(&ssdp), sizeof(ssdp)), 0)
+        << std::strerror(errno);
+    ip_mreq membership{};
+    inet_pton(AF_INET, "239.255.255.250", &membership.imr_multiaddr);
+    membership.imr_interface = interfaceAddress;
+    EXPECT_EQ(setsockopt(ssdpFd_, IPPROTO_IP, IP_ADD_MEMBERSHIP, &membership, sizeof(membership)),
+              0)
+        << std::strerror(errno);
     thread_ = std::thread(&FakeMediaServers::Serve, this);
 }
 
@@ -273,6 +292,42 @@ FakeMediaServers::~FakeMediaServers() {
     thread_.join();
     close(listenFd_);
     close(udpFd_);
+    close(ssdpFd_);
+}
+
+void FakeMediaServers::AnswerSearches(const std::string& udn, int maxAgeSeconds) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    searchAnswers_[udn] = maxAgeSeconds;
+}
+
+void FakeMediaServers::AnswerSearch() {
+    static const std::string kType = "urn:schemas-upnp-org:device:MediaServer:1";
+    char buffer[2048];
+    sockaddr_in from{};
+    socklen_t fromLength = sizeof(from);
+    const ssize_t n = recvfrom(ssdpFd_, buffer, sizeof(buffer), MSG_DONTWAIT,
+                               reinterpret_cast<sockaddr*>(&from), &fromLength);
+    if (n <= 0)
+        return;
+    const std::string datagram(buffer, static_cast<std::size_t>(n));
+    if (datagram.rfind("M-SEARCH", 0) != 0 || (datagram.find(kType) == std::string::npos &&
+                                               datagram.find("ssdp:all") == std::string::npos))
+        return;
+    ++searchesSeen_;
+    std::map<std::string, int> answers;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        answers = searchAnswers_;
+    }
+    for (const auto& [udn, maxAge] : answers) {
+        const std::string reply =
+            "HTTP/1.1 200 OK\r\nCACHE-CONTROL: max-age=" + std::to_string(maxAge) +
+            "\r\nEXT:\r\nLOCATION: " + Location(udn) +
+            "\r\nSERVER: Linux/6 UPnP/1.0 fake/1\r\nST: " + kType + "\r\nUSN: " + udn +
+            "::" + kType + "\r\n\r\n";
+        sendto(udpFd_, reply.data(), reply.size(), 0, reinterpret_cast<sockaddr*>(&from),
+               fromLength);
+    }
 }
 
 std::string FakeMediaServers::DescriptionXml(const std::string& udn,
@@ -331,8 +386,12 @@ void FakeMediaServers::Notify(const std::string& udn, const char* nts, int maxAg
 
 void FakeMediaServers::Serve() {
     while (!stop_) {
-        pollfd entry{listenFd_, POLLIN, 0};
-        if (poll(&entry, 1, 50) != 1)
+        pollfd entries[2] = {{listenFd_, POLLIN, 0}, {ssdpFd_, POLLIN, 0}};
+        if (poll(entries, 2, 50) <= 0)
+            continue;
+        if (entries[1].revents & POLLIN)
+            AnswerSearch();
+        if (!(entries[0].revents & POLLIN))
             continue;
         const int client = accept4(listenFd_, nullptr, nullptr, SOCK_CLOEXEC);
         if (client < 0)

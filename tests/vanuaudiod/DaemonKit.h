@@ -55,7 +55,7 @@ Process Spawn(const std::vector<std::string>& argv, const std::string& logPath, 
 
 // The veth link between this test's namespace (va, 10.77.0.1/24) and a second namespace held by a
 // sleeping child (vb, 10.77.0.2/24). Both ends up, IPv6 duplicate address detection off (libupnp
-// binds the link-local address at once).
+// binds the link-local address at once), and a route for multicast on each side.
 class PeerNetwork {
   public:
     PeerNetwork();  // fails the test (ADD_FAILURE) when the link cannot be made
@@ -121,10 +121,20 @@ class FakeMediaServers {
     void Byebye(const std::string& udn);
     std::string Location(const std::string& udn) const;
     unsigned short Port() const { return port_; }
+    // Answers M-SEARCH requests (for the MediaServer:1 type or ssdp:all) for `udn` from now on,
+    // as a device does: a unicast HTTP/1.1 200 reply to the searcher with its location.
+    void AnswerSearches(const std::string& udn, int maxAgeSeconds);
+    // How many M-SEARCH datagrams for media servers have arrived so far.
+    int SearchesSeen() const { return searchesSeen_; }
 
   private:
     void Serve();
     void Notify(const std::string& udn, const char* nts, int maxAgeSeconds);
+    void AnswerSearch();
+
+    int ssdpFd_ = -1;  // bound to port 1900, member of the SSDP group on va
+    std::atomic<int> searchesSeen_{0};
+    std::map<std::string, int> searchAnswers_;  // udn -> max-age
 
     int listenFd_ = -1;
     int udpFd_ = -1;

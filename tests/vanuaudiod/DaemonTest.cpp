@@ -14,6 +14,7 @@
 
 #include "DaemonKit.h"
 #include "Fixtures.h"
+#include "HttpGet.h"
 
 using namespace harmona::test;
 
@@ -442,4 +443,44 @@ TEST_F(Vanuaudiod, TwentyFiveServersArePagedIntoTwentyFiveNodesByTheCgi) {
     ASSERT_EQ(items.size(), 25u) << refresh.body;
     for (int i = 0; i < 25; ++i)
         EXPECT_EQ(items[i]["text"], "Server " + std::to_string(100 + i));
+}
+
+TEST_F(Vanuaudiod, AServerAlreadyRunningIsFoundByTheSearchAtStart) {
+    // MiniDLNA starts first; its start-up announcements go out before the daemon listens, and its
+    // next ones are a minute away: only the daemon's own M-SEARCH can find it.
+    Process minidlna = StartMiniDlna(peer_, "Early MiniDLNA", 8203);
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(5);
+    while (!vanuaudiod::HttpGet("http://10.77.0.2:8203/rootDesc.xml", 500, 65536).ok &&
+           std::chrono::steady_clock::now() < deadline)
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    std::this_thread::sleep_for(std::chrono::milliseconds(300));
+    daemon_ = StartDaemon();
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 10000), reply));
+    ASSERT_EQ(reply["list"].size(), 1u) << ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(reply["list"][0]["friendly_name"], "Early MiniDLNA");
+}
+
+TEST_F(Vanuaudiod, CommandFourteenSendsANewSearch) {
+    FakeMediaServers fake;
+    fake.Add("uuid:quiet", FakeMediaServers::DescriptionXml("uuid:quiet", "Quiet", "/cd"));
+    daemon_ = StartDaemon();
+    // The search at start arrives while the device does not answer yet.
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(5);
+    while (fake.SearchesSeen() == 0 && std::chrono::steady_clock::now() < deadline)
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    ASSERT_GT(fake.SearchesSeen(), 0);
+    std::this_thread::sleep_for(std::chrono::milliseconds(500));  // its repeats too
+    const int before = fake.SearchesSeen();
+    fake.AnswerSearches("uuid:quiet", 60);
+    EXPECT_EQ(Reply(Call(16, "0 10"))["total"], 0);
+    // The scan button: command 14, answered at once, and the device answers the new search.
+    EXPECT_EQ(Call(14).reply, "{\"success\": true}");
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
+    ASSERT_EQ(reply["list"].size(), 1u);
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:quiet");
+    EXPECT_GT(fake.SearchesSeen(), before);
 }
