@@ -1,0 +1,165 @@
+// Benchmark of vanuaudiod's control socket: command 16 round trips per second from one sequential
+// client, and latency under 50 concurrent clients, with the real daemon holding 100 servers found
+// over SSDP in the sandbox's veth network. A trivial C CGI process run is the yardstick.
+#include <signal.h>
+
+#include <algorithm>
+#include <atomic>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <future>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "CgiRunner.h"
+#include "DaemonKit.h"
+#include "Sandbox.h"
+
+using namespace harmona::test;
+using SteadyClock = std::chrono::steady_clock;
+
+namespace {
+
+double Percentile(std::vector<double> samples, double p) {
+    if (samples.empty())
+        return 0;
+    std::sort(samples.begin(), samples.end());
+    const std::size_t index =
+        std::min(samples.size() - 1, static_cast<std::size_t>(p * samples.size()));
+    return samples[index];
+}
+
+struct Phase {
+    std::vector<double> ms;
+    int missed = 0;  // not answered within the 0.5 s budget
+    double seconds = 0;
+};
+
+// One client, sequential, for `seconds`.
+Phase Sequential(double seconds) {
+    Phase phase;
+    const auto start = SteadyClock::now();
+    const auto end = start + std::chrono::duration<double>(seconds);
+    int page = 0;
+    while (SteadyClock::now() < end) {
+        const Exchange exchange = Call(16, std::to_string((page++ % 10) * 10) + " 10");
+        if (!exchange.answered)
+            ++phase.missed;
+        phase.ms.push_back(exchange.ms);
+    }
+    phase.seconds = std::chrono::duration<double>(SteadyClock::now() - start).count();
+    return phase;
+}
+
+// `clients` clients released together, each making one exchange; `bursts` times.
+Phase Bursts(int clients, int bursts) {
+    Phase phase;
+    const auto start = SteadyClock::now();
+    for (int b = 0; b < bursts; ++b) {
+        std::promise<void> go;
+        std::shared_future<void> released = go.get_future().share();
+        std::vector<std::future<Exchange>> results;
+        for (int i = 0; i < clients; ++i) {
+            results.push_back(std::async(std::launch::async, [released, i] {
+                released.wait();
+                return Call(16, std::to_string((i % 10) * 10) + " 10");
+            }));
+        }
+        go.set_value();
+        for (auto& result : results) {
+            const Exchange exchange = result.get();
+            if (!exchange.answered)
+                ++phase.missed;
+            phase.ms.push_back(exchange.ms);
+        }
+    }
+    phase.seconds = std::chrono::duration<double>(SteadyClock::now() - start).count();
+    return phase;
+}
+
+// `clients` clients each looping for `seconds`.
+Phase Sustained(int clients, double seconds) {
+    Phase phase;
+    std::vector<std::future<Phase>> results;
+    const auto start = SteadyClock::now();
+    const auto end = start + std::chrono::duration<double>(seconds);
+    for (int i = 0; i < clients; ++i) {
+        results.push_back(std::async(std::launch::async, [end, i] {
+            Phase own;
+            int page = i;
+            while (SteadyClock::now() < end) {
+                const Exchange exchange = Call(16, std::to_string((page++ % 10) * 10) + " 10");
+                if (!exchange.answered)
+                    ++own.missed;
+                own.ms.push_back(exchange.ms);
+            }
+            return own;
+        }));
+    }
+    for (auto& result : results) {
+        const Phase own = result.get();
+        phase.ms.insert(phase.ms.end(), own.ms.begin(), own.ms.end());
+        phase.missed += own.missed;
+    }
+    phase.seconds = std::chrono::duration<double>(SteadyClock::now() - start).count();
+    return phase;
+}
+
+void Print(const char* name, const Phase& phase, double trivialMs) {
+    const double median = Percentile(phase.ms, 0.5);
+    std::printf("%-38s %8zu %10.0f %9.3f %9.3f %9.3f %7d %9.4f\n", name, phase.ms.size(),
+                phase.ms.size() / phase.seconds, median, Percentile(phase.ms, 0.99),
+                Percentile(phase.ms, 1.0), phase.missed, median / trivialMs);
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    const double seconds = argc > 1 ? std::max(0.5, std::atof(argv[1])) : 3.0;
+    EnterSandbox();
+    ResetSandbox();
+    PeerNetwork peer;
+    if (!peer.ok())
+        return 1;
+    Process daemon = StartDaemon();
+    FakeMediaServers fake;
+    for (int i = 0; i < 100; ++i) {
+        const std::string udn = "uuid:bench-" + std::to_string(1000 + i);
+        fake.Add(udn, FakeMediaServers::DescriptionXml(
+                          udn, "Media Server " + std::to_string(1000 + i),
+                          "/ContentDirectory/control/" + std::to_string(i)));
+        fake.Alive(udn, 1800);
+    }
+    WaitForList([](const Json::Value& list) { return list.size() == 100; }, 15000);
+    Json::Value check;
+    const Exchange first = Call(16, "0 10");
+    if (!ParseJson(first.reply, check) || check["total"].asInt() != 100 ||
+        check["list"].size() != 10) {
+        std::fprintf(stderr, "daemon did not list the 100 servers: %s\n", first.reply.c_str());
+        return 1;
+    }
+    std::printf("page of 10 servers: %zu bytes\n", first.reply.size());
+
+    // The yardstick: a trivial C CGI's process run, measured in the same run.
+    std::vector<double> trivial;
+    CgiRequest request;
+    request.program = HARMONA_TRIVIAL_CGI;
+    for (int i = 0; i < 200; ++i)
+        trivial.push_back(RunCgi(request).wallMs);
+    TakeLogLines();
+    const double trivialMs = Percentile(trivial, 0.5);
+    std::printf("trivial C CGI process run: median %.3f ms\n\n", trivialMs);
+
+    std::printf("%-38s %8s %10s %9s %9s %9s %7s %9s\n", "phase", "requests", "per s", "median ms",
+                "p99 ms", "max ms", "missed", "x trivial");
+    Print("1 client, sequential", Sequential(seconds), trivialMs);
+    Print("50 clients released together x 40", Bursts(50, 40), trivialMs);
+    Print("50 clients looping", Sustained(50, seconds), trivialMs);
+    std::printf(
+        "\n(\"missed\": not answered within Part 6.1's 0.5 s budget; \"x trivial\": median "
+        "over the trivial CGI's median)\n");
+    daemon.Stop(SIGTERM, 5000);
+    return 0;
+}

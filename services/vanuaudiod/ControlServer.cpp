@@ -1,0 +1,272 @@
+#include "ControlServer.h"
+
+#include <fcntl.h>
+#include <signal.h>
+#include <sys/epoll.h>
+#include <sys/eventfd.h>
+#include <sys/signalfd.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <syslog.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+
+namespace vanuaudiod {
+namespace {
+
+using SteadyClock = std::chrono::steady_clock;
+
+bool FillAddress(const std::string& path, sockaddr_un& address) {
+    std::memset(&address, 0, sizeof(address));
+    address.sun_family = AF_UNIX;
+    if (path.empty() || path.size() >= sizeof(address.sun_path))
+        return false;
+    std::memcpy(address.sun_path, path.c_str(), path.size() + 1);
+    return true;
+}
+
+// Whether a daemon answers on `path` now (a stale file refuses the connection).
+bool SomeoneListens(const sockaddr_un& address) {
+    const int probe = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    if (probe < 0)
+        return false;
+    const bool live =
+        connect(probe, reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0;
+    close(probe);
+    return live;
+}
+
+}  // namespace
+
+ControlServer::ControlServer(ServerList& servers, std::function<void()> startSearch,
+                             ControlServerOptions options)
+    : servers_(servers), startSearch_(std::move(startSearch)), options_(std::move(options)) {}
+
+ControlServer::~ControlServer() {
+    for (auto& [fd, client] : clients_)
+        close(fd);
+    clients_.clear();
+    if (listenFd_ >= 0) {
+        close(listenFd_);
+        RemoveSocketFile();
+    }
+    for (int fd : {epollFd_, signalFd_, stopFd_}) {
+        if (fd >= 0)
+            close(fd);
+    }
+}
+
+bool ControlServer::Open(std::string& error) {
+    sockaddr_un address;
+    if (!FillAddress(options_.socketPath, address)) {
+        error = "socket path too long or empty";
+        return false;
+    }
+    struct stat existing {};
+    if (lstat(options_.socketPath.c_str(), &existing) == 0) {
+        if (!S_ISSOCK(existing.st_mode)) {
+            error = options_.socketPath + " exists and is not a socket; not replacing it";
+            return false;
+        }
+        if (SomeoneListens(address)) {
+            error = "another daemon is listening on " + options_.socketPath;
+            return false;
+        }
+        // Stale (its daemon died): safe to replace.
+        if (unlink(options_.socketPath.c_str()) != 0 && errno != ENOENT) {
+            error = "cannot remove stale " + options_.socketPath + ": " + std::strerror(errno);
+            return false;
+        }
+    }
+    listenFd_ = socket(AF_UNIX, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0);
+    if (listenFd_ < 0) {
+        error = std::string("socket: ") + std::strerror(errno);
+        return false;
+    }
+    // Bind with a closed umask and open up afterwards with chmod, so the mode is exactly ours.
+    const mode_t previous = umask(0177);
+    const int bound = bind(listenFd_, reinterpret_cast<sockaddr*>(&address), sizeof(address));
+    umask(previous);
+    if (bound != 0) {
+        error = "bind " + options_.socketPath + ": " + std::strerror(errno);
+        close(listenFd_);
+        listenFd_ = -1;
+        return false;
+    }
+    struct stat own {};
+    if (stat(options_.socketPath.c_str(), &own) == 0) {
+        socketDev_ = own.st_dev;
+        socketIno_ = own.st_ino;
+    }
+    if (chmod(options_.socketPath.c_str(), options_.socketMode) != 0 ||
+        listen(listenFd_, SOMAXCONN) != 0) {
+        error = std::string("chmod/listen: ") + std::strerror(errno);
+        return false;
+    }
+    sigset_t stopSignals;
+    sigemptyset(&stopSignals);
+    sigaddset(&stopSignals, SIGTERM);
+    sigaddset(&stopSignals, SIGINT);
+    signalFd_ = signalfd(-1, &stopSignals, SFD_NONBLOCK | SFD_CLOEXEC);
+    stopFd_ = eventfd(0, EFD_NONBLOCK | EFD_CLOEXEC);
+    epollFd_ = epoll_create1(EPOLL_CLOEXEC);
+    if (signalFd_ < 0 || stopFd_ < 0 || epollFd_ < 0) {
+        error = std::string("signalfd/eventfd/epoll: ") + std::strerror(errno);
+        return false;
+    }
+    for (int fd : {listenFd_, signalFd_, stopFd_}) {
+        epoll_event event{};
+        event.events = EPOLLIN;
+        event.data.fd = fd;
+        if (epoll_ctl(epollFd_, EPOLL_CTL_ADD, fd, &event) != 0) {
+            error = std::string("epoll_ctl: ") + std::strerror(errno);
+            return false;
+        }
+    }
+    return true;
+}
+
+void ControlServer::RequestStop() {
+    const uint64_t one = 1;
+    if (stopFd_ >= 0)
+        (void)!write(stopFd_, &one, sizeof(one));
+}
+
+void ControlServer::Run() {
+    epoll_event events[64];
+    for (;;) {
+        const int ready = epoll_wait(epollFd_, events, 64, NextTimeoutMs());
+        if (ready < 0 && errno != EINTR) {
+            syslog(LOG_ERR, "epoll_wait: %m");
+            return;
+        }
+        for (int i = 0; i < ready; ++i) {
+            const int fd = events[i].data.fd;
+            if (fd == signalFd_ || fd == stopFd_)
+                return;
+            if (fd == listenFd_)
+                Accept();
+            else
+                Readable(fd);
+        }
+        ExpireClients();
+    }
+}
+
+void ControlServer::Accept() {
+    for (;;) {
+        const int fd = accept4(listenFd_, nullptr, nullptr, SOCK_NONBLOCK | SOCK_CLOEXEC);
+        if (fd < 0) {
+            if (errno == EINTR || errno == ECONNABORTED)
+                continue;
+            if (errno != EAGAIN && errno != EWOULDBLOCK)
+                syslog(LOG_ERR, "accept: %m");
+            return;
+        }
+        if (clients_.size() >= options_.maxClients) {
+            close(fd);  // overloaded: the client sees a closed connection, not a hang
+            continue;
+        }
+        epoll_event event{};
+        event.events = EPOLLIN | EPOLLRDHUP;
+        event.data.fd = fd;
+        if (epoll_ctl(epollFd_, EPOLL_CTL_ADD, fd, &event) != 0) {
+            close(fd);
+            continue;
+        }
+        Client& client = clients_[fd];
+        client.received = 0;
+        client.deadline = SteadyClock::now() + std::chrono::milliseconds(options_.requestTimeoutMs);
+    }
+}
+
+void ControlServer::Readable(int fd) {
+    auto found = clients_.find(fd);
+    if (found == clients_.end())
+        return;
+    Client& client = found->second;
+    while (client.received < kRequestSize) {
+        const ssize_t n =
+            recv(fd, client.record + client.received, kRequestSize - client.received, 0);
+        if (n > 0) {
+            client.received += static_cast<std::size_t>(n);
+            continue;
+        }
+        if (n < 0 && errno == EINTR)
+            continue;
+        if (n < 0 && (errno == EAGAIN || errno == EWOULDBLOCK))
+            return;  // more later, within the deadline
+        // End of stream (or error) before a whole record: a short request.
+        Finish(fd, ErrorReply("short request"));
+        return;
+    }
+    // A whole record. Bytes beyond it mean the client does not speak our protocol.
+    char extra;
+    const ssize_t more = recv(fd, &extra, 1, MSG_PEEK | MSG_DONTWAIT);
+    if (more > 0) {
+        Finish(fd, ErrorReply("oversized request"));
+        return;
+    }
+    Request request;
+    if (!ParseRequest(client.record, kRequestSize, request)) {
+        Finish(fd, ErrorReply("bad request"));
+        return;
+    }
+    bool startSearch = false;
+    const ServerSnapshot snapshot = servers_.Snapshot();
+    const std::string reply = Answer(request, *snapshot, startSearch);
+    Finish(fd, reply);
+    if (startSearch)
+        startSearch_();
+}
+
+void ControlServer::Finish(int fd, const std::string& reply) {
+    // One write, as Part 6.1's client reads once. The reply is at most 40959 bytes and the
+    // connection is fresh, so a UNIX socket's send buffer takes it whole; a peer that already
+    // left just loses it.
+    const ssize_t written = send(fd, reply.data(), reply.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
+    if (written >= 0 && static_cast<std::size_t>(written) != reply.size())
+        syslog(LOG_ERR, "reply cut: %zd of %zu bytes", written, reply.size());
+    Drop(fd);
+}
+
+void ControlServer::Drop(int fd) {
+    epoll_ctl(epollFd_, EPOLL_CTL_DEL, fd, nullptr);
+    close(fd);
+    clients_.erase(fd);
+}
+
+void ControlServer::ExpireClients() {
+    const auto now = SteadyClock::now();
+    std::vector<int> late;
+    for (const auto& [fd, client] : clients_) {
+        if (client.deadline <= now)
+            late.push_back(fd);
+    }
+    for (int fd : late)
+        Finish(fd, ErrorReply("request timed out"));
+}
+
+int ControlServer::NextTimeoutMs() const {
+    if (clients_.empty())
+        return -1;
+    auto earliest = SteadyClock::time_point::max();
+    for (const auto& [fd, client] : clients_)
+        earliest = std::min(earliest, client.deadline);
+    const auto left =
+        std::chrono::duration_cast<std::chrono::milliseconds>(earliest - SteadyClock::now());
+    return left.count() > 0 ? static_cast<int>(left.count()) + 1 : 0;
+}
+
+void ControlServer::RemoveSocketFile() {
+    // Only our own socket file: another daemon may have replaced it meanwhile.
+    struct stat current {};
+    if (stat(options_.socketPath.c_str(), &current) == 0 && current.st_dev == socketDev_ &&
+        current.st_ino == socketIno_)
+        unlink(options_.socketPath.c_str());
+}
+
+}  // namespace vanuaudiod

@@ -1,0 +1,69 @@
+// The control socket (spec Part 6.1, platform.md section 10): one event loop on one thread that
+// accepts clients, gathers each one's 8196-byte record with a time limit, answers it with one
+// write and closes. Every socket is non-blocking, so no client can hold up another, and the
+// answers come from the server list's snapshot, so discovery work never delays them.
+#pragma once
+
+#include <sys/types.h>
+
+#include <chrono>
+#include <functional>
+#include <string>
+#include <unordered_map>
+
+#include "Protocol.h"
+#include "ServerList.h"
+
+namespace vanuaudiod {
+
+struct ControlServerOptions {
+    std::string socketPath;
+    mode_t socketMode = 0666;      // the web server's CGI user must be able to connect
+    int requestTimeoutMs = 2000;   // to send the whole record
+    std::size_t maxClients = 512;  // more at once are closed at once (within RLIMIT_NOFILE)
+};
+
+class ControlServer {
+  public:
+    ControlServer(ServerList& servers, std::function<void()> startSearch,
+                  ControlServerOptions options);
+    ~ControlServer();
+    ControlServer(const ControlServer&) = delete;
+    ControlServer& operator=(const ControlServer&) = delete;
+
+    // Creates the socket (replacing a stale one, refusing to take over a live daemon's or a file
+    // that is not a socket) and the event loop's descriptors. False with `error` set.
+    bool Open(std::string& error);
+
+    // Runs until SIGTERM or SIGINT arrives (the caller blocks them in every thread first) or
+    // RequestStop() is called.
+    void Run();
+    void RequestStop();
+
+  private:
+    struct Client {
+        unsigned char record[kRequestSize];
+        std::size_t received = 0;
+        std::chrono::steady_clock::time_point deadline;
+    };
+    void Accept();
+    void Readable(int fd);
+    void Finish(int fd, const std::string& reply);
+    void Drop(int fd);
+    void ExpireClients();
+    int NextTimeoutMs() const;
+    void RemoveSocketFile();
+
+    ServerList& servers_;
+    std::function<void()> startSearch_;
+    ControlServerOptions options_;
+    int listenFd_ = -1;
+    int epollFd_ = -1;
+    int signalFd_ = -1;
+    int stopFd_ = -1;  // eventfd for RequestStop
+    dev_t socketDev_ = 0;
+    ino_t socketIno_ = 0;
+    std::unordered_map<int, Client> clients_;
+};
+
+}  // namespace vanuaudiod

@@ -1,0 +1,119 @@
+#include "Description.h"
+
+#include <upnp/upnp.h>
+#include <upnp/upnptools.h>
+#include <pugixml.hpp>
+
+#include <cstdlib>
+#include <cstring>
+
+#include "HttpGet.h"
+#include "Protocol.h"
+
+namespace vanuaudiod {
+namespace {
+
+constexpr const char kMediaServerType[] = "urn:schemas-upnp-org:device:MediaServer:";
+constexpr const char kContentDirectoryType[] = "urn:schemas-upnp-org:service:ContentDirectory:";
+
+bool StartsWith(const std::string& text, const char* prefix) {
+    return text.compare(0, std::strlen(prefix), prefix) == 0;
+}
+
+// Element text with surrounding white space removed (descriptions are often pretty-printed).
+std::string Text(const pugi::xml_node& node, const char* child) {
+    std::string value = node.child(child).text().get();
+    const std::size_t first = value.find_first_not_of(" \t\r\n");
+    if (first == std::string::npos)
+        return "";
+    const std::size_t last = value.find_last_not_of(" \t\r\n");
+    return value.substr(first, last - first + 1);
+}
+
+// Depth-first over the device and its deviceList: the first MediaServer, preferring `udn`.
+void FindMediaServer(const pugi::xml_node& device, const std::string& udn, pugi::xml_node& first,
+                     pugi::xml_node& exact, int depth) {
+    if (!device || depth > 8 || exact)
+        return;
+    if (StartsWith(Text(device, "deviceType"), kMediaServerType)) {
+        if (!first)
+            first = device;
+        if (!udn.empty() && Text(device, "UDN") == udn)
+            exact = device;
+    }
+    for (pugi::xml_node child : device.child("deviceList").children("device"))
+        FindMediaServer(child, udn, first, exact, depth + 1);
+}
+
+bool UsableUrl(const std::string& url) {
+    if (url.empty() || url.size() > kMaxControlUrlBytes)
+        return false;
+    for (const char c : url) {
+        const auto byte = static_cast<unsigned char>(c);
+        if (byte <= 0x20 || byte >= 0x7F || c == '"' || c == '\\')
+            return false;
+    }
+    UrlParts parts;
+    return SplitHttpUrl(url, parts);
+}
+
+}  // namespace
+
+std::string ResolveUrl(const std::string& base, const std::string& relative) {
+    if (relative.empty())
+        return "";
+    char* absolute = nullptr;
+    if (UpnpResolveURL2(base.c_str(), relative.c_str(), &absolute) != UPNP_E_SUCCESS ||
+        absolute == nullptr) {
+        std::free(absolute);
+        return "";
+    }
+    std::string resolved = absolute;
+    std::free(absolute);
+    return UsableUrl(resolved) ? resolved : "";
+}
+
+std::string HostOfUrl(const std::string& url) {
+    UrlParts parts;
+    if (!SplitHttpUrl(url, parts))
+        return "";
+    return parts.host;
+}
+
+bool ParseDeviceDescription(const std::string& xml, const std::string& location,
+                            const std::string& udn, MediaServer& out) {
+    pugi::xml_document document;
+    // No entity expansion beyond the predefined ones, no DOCTYPE processing: pugixml never loads
+    // external entities.
+    const pugi::xml_parse_result parsed =
+        document.load_buffer(xml.data(), xml.size(), pugi::parse_default & ~pugi::parse_doctype);
+    if (!parsed)
+        return false;
+    const pugi::xml_node root = document.child("root");
+    pugi::xml_node first;
+    pugi::xml_node exact;
+    FindMediaServer(root.child("device"), udn, first, exact, 0);
+    const pugi::xml_node device = exact ? exact : first;
+    if (!device)
+        return false;
+    const std::string urlBase = Text(root, "URLBase");
+    const std::string base = urlBase.empty() ? location : urlBase;
+    std::string controlUrl;
+    for (pugi::xml_node service : device.child("serviceList").children("service")) {
+        if (StartsWith(Text(service, "serviceType"), kContentDirectoryType)) {
+            controlUrl = ResolveUrl(base, Text(service, "controlURL"));
+            break;
+        }
+    }
+    if (controlUrl.empty())
+        return false;
+    const std::string ip = HostOfUrl(location);
+    if (ip.empty() || ip.size() > kMaxIpBytes)
+        return false;
+    out.friendlyName = CleanText(Text(device, "friendlyName"), kMaxFriendlyNameBytes);
+    out.controlUrl = controlUrl;
+    out.ip = CleanText(ip, kMaxIpBytes);
+    return true;
+}
+
+}  // namespace vanuaudiod

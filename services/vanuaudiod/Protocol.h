@@ -1,0 +1,67 @@
+// The daemon's side of spec Part 6.1 (request record) and Part 3.2 (commands 14 and 16 and their
+// JSON replies), platform.md section 10. Pure functions: no sockets, no discovery state.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+
+#include "ServerList.h"
+
+namespace vanuaudiod {
+
+// Part 6.1's record: a native-order int32 command and 8192 bytes of NUL-terminated argument text.
+inline constexpr std::size_t kCommandSize = 4;
+inline constexpr std::size_t kArgumentSize = 8192;
+inline constexpr std::size_t kRequestSize = kCommandSize + kArgumentSize;  // 8196
+
+// Part 3.2's client reads the reply of command 16 once into 40960 bytes that must end with a NUL.
+inline constexpr std::size_t kMaxReplySize = 40960 - 1;
+
+inline constexpr int32_t kCommandPrepareMediaServerList = 14;
+inline constexpr int32_t kCommandGetMediaServerList = 16;
+
+// Bounds on what one list element may carry, so that a page of Part 3.2's ten servers always fits
+// in kMaxReplySize (each field's JSON form is at most twice its byte length, see JsonString).
+inline constexpr std::size_t kMaxFriendlyNameBytes = 512;
+inline constexpr std::size_t kMaxControlUrlBytes = 1024;
+inline constexpr std::size_t kMaxUdnBytes = 256;
+inline constexpr std::size_t kMaxIpBytes = 64;
+
+struct Request {
+    int32_t command = 0;
+    std::string arguments;  // the text up to its NUL
+};
+
+// Reads a whole record. False when the argument area has no NUL (a record that cannot be trusted).
+bool ParseRequest(const unsigned char* record, std::size_t size, Request& out);
+
+// "offset count" exactly as the client prints it ("%d %d"): two decimal integers, each optionally
+// with a leading '-', one space between, nothing else. Negative values are refused.
+bool ParsePageArguments(const std::string& text, int& offset, int& count);
+
+// The replies.
+std::string SuccessReply();                 // {"success": true}
+std::string ErrorReply(const char* error);  // {"success": false, "error": "..."}
+std::string UnsupportedReply();             // error "unsupported"
+// The page [offset, offset + count) of `servers`: {"success": true, "list": [...], "total": N}.
+// The list stops early when the next element would make the reply longer than `maxBytes`; "total"
+// is always the whole list's size, so a client that sees fewer elements than it asked for (and
+// than remain) continues at offset + the number it got.
+std::string ListReply(const std::vector<MediaServer>& servers, int offset, int count,
+                      std::size_t maxBytes = kMaxReplySize);
+
+// Answers one request (the command table of platform.md section 10); `startSearch` is set for
+// command 14.
+std::string Answer(const Request& request, const std::vector<MediaServer>& servers,
+                   bool& startSearch);
+
+// A JSON string literal of `text` (quotes included): '"' and '\\' escaped, control characters
+// as \u00XX. Invalid UTF-8 must have been repaired before (see CleanText).
+std::string JsonString(const std::string& text);
+
+// `text` made safe to list: invalid UTF-8 sequences and control characters become spaces, then
+// cut to at most `maxBytes` on a character boundary.
+std::string CleanText(const std::string& text, std::size_t maxBytes);
+
+}  // namespace vanuaudiod

@@ -1,0 +1,427 @@
+#include "DaemonKit.h"
+
+#include <arpa/inet.h>
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <netinet/in.h>
+#include <poll.h>
+#include <sched.h>
+#include <signal.h>
+#include <sys/prctl.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+
+#include "Fixtures.h"
+
+#ifndef HARMONA_VANUAUDIOD_PATH
+#error "HARMONA_VANUAUDIOD_PATH must name the built daemon"
+#endif
+
+namespace harmona::test {
+namespace {
+
+using SteadyClock = std::chrono::steady_clock;
+
+int ElapsedMs(SteadyClock::time_point since) {
+    return static_cast<int>(
+        std::chrono::duration_cast<std::chrono::milliseconds>(SteadyClock::now() - since).count());
+}
+
+bool Shell(const std::string& command) {
+    const int status = std::system(command.c_str());
+    if (status != 0)
+        ADD_FAILURE() << "command failed (" << status << "): " << command;
+    return status == 0;
+}
+
+// In a forked child of a threaded test: only async-signal-safe calls until exec (everything is
+// prepared before the fork).
+[[noreturn]] void ExecChild(char* const* args, const char* logPath, const char* netnsPath) {
+    prctl(PR_SET_PDEATHSIG, SIGKILL);
+    if (netnsPath != nullptr) {
+        const int ns = open(netnsPath, O_RDONLY | O_CLOEXEC);
+        if (ns < 0 || setns(ns, CLONE_NEWNET) != 0)
+            _exit(126);
+    }
+    const int log = open(logPath, O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0644);
+    if (log >= 0) {
+        dup2(log, 1);
+        dup2(log, 2);
+    }
+    const int null = open("/dev/null", O_RDONLY);
+    if (null >= 0)
+        dup2(null, 0);
+    sigset_t none;
+    sigemptyset(&none);
+    sigprocmask(SIG_SETMASK, &none, nullptr);
+    execvp(args[0], args);
+    _exit(127);
+}
+
+}  // namespace
+
+Process::~Process() {
+    if (pid_ > 0)
+        Stop(SIGKILL, 2000);
+}
+
+Process& Process::operator=(Process&& other) noexcept {
+    if (this != &other) {
+        if (pid_ > 0)
+            Stop(SIGKILL, 2000);
+        pid_ = other.pid_;
+        other.pid_ = -1;
+    }
+    return *this;
+}
+
+bool Process::WaitExit(int timeoutMs, int& status) {
+    if (pid_ <= 0)
+        return false;
+    const auto start = SteadyClock::now();
+    for (;;) {
+        const pid_t done = waitpid(pid_, &status, WNOHANG);
+        if (done == pid_ || (done < 0 && errno == ECHILD)) {
+            pid_ = -1;
+            return true;
+        }
+        if (ElapsedMs(start) >= timeoutMs)
+            return false;
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    }
+}
+
+int Process::Stop(int signal, int timeoutMs) {
+    if (pid_ <= 0)
+        return -1;
+    kill(pid_, signal);
+    int status = -1;
+    if (WaitExit(timeoutMs, status))
+        return status;
+    kill(pid_, SIGKILL);
+    WaitExit(5000, status);
+    return status;
+}
+
+Process Spawn(const std::vector<std::string>& argv, const std::string& logPath, pid_t netnsOf) {
+    std::vector<char*> args;
+    for (const std::string& arg : argv)
+        args.push_back(const_cast<char*>(arg.c_str()));
+    args.push_back(nullptr);
+    const std::string netnsPath = "/proc/" + std::to_string(netnsOf) + "/ns/net";
+    const pid_t pid = fork();
+    if (pid == 0)
+        ExecChild(args.data(), logPath.c_str(), netnsOf > 0 ? netnsPath.c_str() : nullptr);
+    EXPECT_GT(pid, 0) << "fork";
+    return Process(pid);
+}
+
+PeerNetwork::PeerNetwork() {
+    // The holder: a child in a new network namespace that lives until we close our pipe end.
+    int ready[2];
+    int hold[2];
+    if (pipe2(ready, O_CLOEXEC) != 0 || pipe2(hold, O_CLOEXEC) != 0) {
+        ADD_FAILURE() << "pipe";
+        return;
+    }
+    const pid_t pid = fork();
+    if (pid == 0) {
+        prctl(PR_SET_PDEATHSIG, SIGKILL);
+        close(hold[1]);  // else our own copy would keep the pipe open forever
+        close(ready[0]);
+        const char status = unshare(CLONE_NEWNET) == 0 ? 'y' : 'n';
+        (void)!write(ready[1], &status, 1);
+        char byte;
+        (void)!read(hold[0], &byte, 1);  // returns when the test closes its end
+        _exit(0);
+    }
+    close(ready[1]);
+    close(hold[0]);
+    holder_ = Process(pid);
+    holdFd_ = hold[1];
+    char status = 'n';
+    pollfd entry{ready[0], POLLIN, 0};
+    if (poll(&entry, 1, 5000) != 1 || read(ready[0], &status, 1) != 1 || status != 'y') {
+        close(ready[0]);
+        ADD_FAILURE() << "could not make the peer's network namespace";
+        return;
+    }
+    close(ready[0]);
+    const std::string peer = std::to_string(pid);
+    ok_ = Shell("ip link add va type veth peer name vb netns " + peer) &&
+          Shell("echo 0 > /proc/sys/net/ipv6/conf/va/accept_dad") &&
+          Shell("ip addr add 10.77.0.1/24 dev va && ip link set va up") &&
+          // Multicast needs a route (a LAN host has its default route): without one, libupnp's
+          // M-SEARCH fails with ENETUNREACH.
+          Shell("ip route add 224.0.0.0/4 dev va") &&
+          Shell("nsenter -t " + peer +
+                " -n sh -c 'echo 0 > /proc/sys/net/ipv6/conf/vb/accept_dad && ip link set lo up && "
+                "ip addr add 10.77.0.2/24 dev vb && ip link set vb up && ip route add 224.0.0.0/4 "
+                "dev vb'");
+}
+
+PeerNetwork::~PeerNetwork() {
+    if (holdFd_ >= 0)
+        close(holdFd_);
+    int status = 0;
+    if (!holder_.WaitExit(2000, status))
+        holder_.Stop(SIGKILL, 2000);
+    // The namespace goes with its last process, and the veth pair with it.
+}
+
+Process PeerNetwork::SpawnOnPeer(const std::vector<std::string>& argv, const std::string& logPath) {
+    return Spawn(argv, logPath, holder_.pid());
+}
+
+std::string DaemonProgram() {
+    return HARMONA_VANUAUDIOD_PATH;
+}
+
+Process StartDaemon(const char* interfaceName) {
+    Process daemon =
+        Spawn({DaemonProgram(), "--interface", interfaceName, "--verbose"}, "/tmp/vanuaudiod.log");
+    const auto start = SteadyClock::now();
+    while (ElapsedMs(start) < 5000) {
+        if (Call(3).answered)
+            return daemon;
+        int status = 0;
+        if (daemon.WaitExit(0, status)) {
+            ADD_FAILURE() << "vanuaudiod exited (" << status
+                          << "): " << ReadFile("/tmp/vanuaudiod.log");
+            return daemon;
+        }
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    }
+    ADD_FAILURE() << "vanuaudiod did not answer within 5 s: " << ReadFile("/tmp/vanuaudiod.log");
+    return daemon;
+}
+
+Exchange Call(int32_t command, const std::string& arguments, int budgetMs, const char* socketPath) {
+    Exchange result;
+    const auto start = SteadyClock::now();
+    const int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    if (fd < 0)
+        return result;
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    std::snprintf(address.sun_path, sizeof(address.sun_path), "%s", socketPath);
+    if (connect(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)) != 0) {
+        close(fd);
+        return result;
+    }
+    result.connected = true;
+    std::vector<unsigned char> record(8196, 0);
+    std::memcpy(record.data(), &command, 4);
+    std::snprintf(reinterpret_cast<char*>(record.data() + 4), 8192, "%s", arguments.c_str());
+    pollfd entry{fd, POLLOUT, 0};
+    if (poll(&entry, 1, budgetMs) == 1 &&
+        write(fd, record.data(), record.size()) == static_cast<ssize_t>(record.size())) {
+        entry = {fd, POLLIN, 0};
+        const int left = budgetMs - ElapsedMs(start);
+        if (left > 0 && poll(&entry, 1, left) == 1) {
+            std::vector<char> reply(40960, 0);
+            const ssize_t n = read(fd, reply.data(), reply.size());
+            if (n > 0) {
+                result.answered = true;
+                result.reply.assign(reply.data(), static_cast<std::size_t>(n));
+            }
+        }
+    }
+    result.ms = std::chrono::duration<double, std::milli>(SteadyClock::now() - start).count();
+    close(fd);
+    return result;
+}
+
+Process StartMiniDlna(PeerNetwork& peer, const std::string& friendlyName, int port) {
+    const std::string root = "/tmp/minidlna-" + std::to_string(port);
+    MakeDirs(root + "/media");
+    MakeDirs(root + "/db");
+    WriteFile(root + "/media/silence.txt", "not audio\n");
+    WriteFile(root + "/minidlna.conf",
+              "media_dir=A," + root + "/media\ndb_dir=" + root + "/db\nlog_dir=" + root +
+                  "\nport=" + std::to_string(port) + "\nnetwork_interface=" + kPeerInterface +
+                  "\nfriendly_name=" + friendlyName + "\ninotify=no\nnotify_interval=60\n");
+    return peer.SpawnOnPeer({"minidlnad", "-d", "-f", root + "/minidlna.conf", "-P", root + "/pid"},
+                            root + "/out.log");
+}
+
+FakeMediaServers::FakeMediaServers() {
+    listenFd_ = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    inet_pton(AF_INET, kHostAddress, &address.sin_addr);
+    EXPECT_EQ(bind(listenFd_, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0)
+        << std::strerror(errno);
+    socklen_t length = sizeof(address);
+    getsockname(listenFd_, reinterpret_cast<sockaddr*>(&address), &length);
+    port_ = ntohs(address.sin_port);
+    listen(listenFd_, 64);
+
+    udpFd_ = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    in_addr interfaceAddress{};
+    inet_pton(AF_INET, kHostAddress, &interfaceAddress);
+    setsockopt(udpFd_, IPPROTO_IP, IP_MULTICAST_IF, &interfaceAddress, sizeof(interfaceAddress));
+    const unsigned char loop = 1;
+    setsockopt(udpFd_, IPPROTO_IP, IP_MULTICAST_LOOP, &loop, sizeof(loop));
+
+    ssdpFd_ = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    const int yes = 1;
+    setsockopt(ssdpFd_, SOL_SOCKET, SO_REUSEADDR, &yes, sizeof(yes));
+    sockaddr_in ssdp{};
+    ssdp.sin_family = AF_INET;
+    ssdp.sin_port = htons(1900);
+    EXPECT_EQ(bind(ssdpFd_, reinterpret_cast<sockaddr*>(&ssdp), sizeof(ssdp)), 0)
+        << std::strerror(errno);
+    ip_mreq membership{};
+    inet_pton(AF_INET, "239.255.255.250", &membership.imr_multiaddr);
+    membership.imr_interface = interfaceAddress;
+    EXPECT_EQ(setsockopt(ssdpFd_, IPPROTO_IP, IP_ADD_MEMBERSHIP, &membership, sizeof(membership)),
+              0)
+        << std::strerror(errno);
+    thread_ = std::thread(&FakeMediaServers::Serve, this);
+}
+
+FakeMediaServers::~FakeMediaServers() {
+    stop_ = true;
+    thread_.join();
+    close(listenFd_);
+    close(udpFd_);
+    close(ssdpFd_);
+}
+
+void FakeMediaServers::AnswerSearches(const std::string& udn, int maxAgeSeconds) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    searchAnswers_[udn] = maxAgeSeconds;
+}
+
+void FakeMediaServers::AnswerSearch() {
+    static const std::string kType = "urn:schemas-upnp-org:device:MediaServer:1";
+    char buffer[2048];
+    sockaddr_in from{};
+    socklen_t fromLength = sizeof(from);
+    const ssize_t n = recvfrom(ssdpFd_, buffer, sizeof(buffer), MSG_DONTWAIT,
+                               reinterpret_cast<sockaddr*>(&from), &fromLength);
+    if (n <= 0)
+        return;
+    const std::string datagram(buffer, static_cast<std::size_t>(n));
+    if (datagram.rfind("M-SEARCH", 0) != 0 || (datagram.find(kType) == std::string::npos &&
+                                               datagram.find("ssdp:all") == std::string::npos))
+        return;
+    ++searchesSeen_;
+    std::map<std::string, int> answers;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        answers = searchAnswers_;
+    }
+    for (const auto& [udn, maxAge] : answers) {
+        const std::string reply =
+            "HTTP/1.1 200 OK\r\nCACHE-CONTROL: max-age=" + std::to_string(maxAge) +
+            "\r\nEXT:\r\nLOCATION: " + Location(udn) +
+            "\r\nSERVER: Linux/6 UPnP/1.0 fake/1\r\nST: " + kType + "\r\nUSN: " + udn +
+            "::" + kType + "\r\n\r\n";
+        sendto(udpFd_, reply.data(), reply.size(), 0, reinterpret_cast<sockaddr*>(&from),
+               fromLength);
+    }
+}
+
+std::string FakeMediaServers::DescriptionXml(const std::string& udn,
+                                             const std::string& friendlyName,
+                                             const std::string& controlPath) {
+    return "<?xml version=\"1.0\"?>\r\n<root xmlns=\"urn:schemas-upnp-org:device-1-0\">"
+           "<specVersion><major>1</major><minor>0</minor></specVersion><device>"
+           "<deviceType>urn:schemas-upnp-org:device:MediaServer:1</deviceType><friendlyName>" +
+           friendlyName + "</friendlyName><UDN>" + udn +
+           "</UDN><serviceList><service>"
+           "<serviceType>urn:schemas-upnp-org:service:ContentDirectory:1</serviceType>"
+           "<serviceId>urn:upnp-org:serviceId:ContentDirectory</serviceId><controlURL>" +
+           controlPath + "</controlURL></service></serviceList></device></root>";
+}
+
+std::string FakeMediaServers::Add(const std::string& udn, const std::string& descriptionXml) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    const std::string path = "/" + std::to_string(paths_.size()) + ".xml";
+    paths_[udn] = path;
+    descriptions_[path] = descriptionXml;
+    return path;
+}
+
+std::string FakeMediaServers::Location(const std::string& udn) const {
+    std::lock_guard<std::mutex> lock(mutex_);
+    const auto found = paths_.find(udn);
+    return "http://" + std::string(kHostAddress) + ":" + std::to_string(port_) +
+           (found == paths_.end() ? "/none.xml" : found->second);
+}
+
+void FakeMediaServers::Alive(const std::string& udn, int maxAgeSeconds) {
+    Notify(udn, "ssdp:alive", maxAgeSeconds);
+}
+
+void FakeMediaServers::Byebye(const std::string& udn) {
+    Notify(udn, "ssdp:byebye", 0);
+}
+
+void FakeMediaServers::Notify(const std::string& udn, const char* nts, int maxAgeSeconds) {
+    static const std::string kType = "urn:schemas-upnp-org:device:MediaServer:1";
+    std::string message = "NOTIFY * HTTP/1.1\r\nHOST: 239.255.255.250:1900\r\n";
+    if (std::strcmp(nts, "ssdp:alive") == 0) {
+        message += "CACHE-CONTROL: max-age=" + std::to_string(maxAgeSeconds) +
+                   "\r\nLOCATION: " + Location(udn) + "\r\nSERVER: Linux/6 UPnP/1.0 fake/1\r\n";
+    }
+    message += "NT: " + kType + "\r\nNTS: " + nts + "\r\nUSN: " + udn + "::" + kType + "\r\n\r\n";
+    sockaddr_in group{};
+    group.sin_family = AF_INET;
+    group.sin_port = htons(1900);
+    inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
+    EXPECT_EQ(sendto(udpFd_, message.data(), message.size(), 0, reinterpret_cast<sockaddr*>(&group),
+                     sizeof(group)),
+              static_cast<ssize_t>(message.size()))
+        << std::strerror(errno);
+}
+
+void FakeMediaServers::Serve() {
+    while (!stop_) {
+        pollfd entries[2] = {{listenFd_, POLLIN, 0}, {ssdpFd_, POLLIN, 0}};
+        if (poll(entries, 2, 50) <= 0)
+            continue;
+        if (entries[1].revents & POLLIN)
+            AnswerSearch();
+        if (!(entries[0].revents & POLLIN))
+            continue;
+        const int client = accept4(listenFd_, nullptr, nullptr, SOCK_CLOEXEC);
+        if (client < 0)
+            continue;
+        std::string request;
+        char buffer[2048];
+        pollfd in{client, POLLIN, 0};
+        while (request.find("\r\n\r\n") == std::string::npos && poll(&in, 1, 1000) == 1) {
+            const ssize_t n = recv(client, buffer, sizeof(buffer), 0);
+            if (n <= 0)
+                break;
+            request.append(buffer, static_cast<std::size_t>(n));
+        }
+        std::string path;
+        const std::size_t space = request.find(' ');
+        if (space != std::string::npos)
+            path = request.substr(space + 1, request.find(' ', space + 1) - space - 1);
+        std::string reply;
+        {
+            std::lock_guard<std::mutex> lock(mutex_);
+            const auto found = descriptions_.find(path);
+            if (found == descriptions_.end())
+                reply = "HTTP/1.1 404 Not Found\r\nContent-Length: 0\r\n\r\n";
+            else
+                reply = "HTTP/1.1 200 OK\r\nContent-Type: text/xml\r\nContent-Length: " +
+                        std::to_string(found->second.size()) + "\r\n\r\n" + found->second;
+        }
+        (void)!send(client, reply.data(), reply.size(), MSG_NOSIGNAL);
+        close(client);
+    }
+}
+
+}  // namespace harmona::test

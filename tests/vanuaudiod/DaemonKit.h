@@ -1,0 +1,165 @@
+// Test kit for the audio daemon: processes started by the test, a second network namespace
+// linked to the test's own by a veth pair (a second "host" on a real Ethernet-like link, so that
+// SSDP multicast and byebye travel as on a LAN), the real built vanuaudiod, a client speaking
+// Part 6.1's record exactly as the CGI does, and a scriptable fake media server (SSDP announcer
+// and description server) for the cases no real server can be made to produce.
+#pragma once
+
+#include <sys/types.h>
+
+#include <atomic>
+#include <chrono>
+#include <cstdint>
+#include <map>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "CgiRunner.h"
+
+namespace harmona::test {
+
+// The test's host on the link, and the peer's.
+inline constexpr const char* kHostAddress = "10.77.0.1";
+inline constexpr const char* kHostInterface = "va";
+inline constexpr const char* kPeerAddress = "10.77.0.2";
+inline constexpr const char* kPeerInterface = "vb";
+
+// A child process; killed (SIGKILL) and reaped when destroyed unless stopped before.
+class Process {
+  public:
+    Process() = default;
+    explicit Process(pid_t pid) : pid_(pid) {}
+    ~Process();
+    Process(Process&& other) noexcept : pid_(other.pid_) { other.pid_ = -1; }
+    Process& operator=(Process&& other) noexcept;
+    Process(const Process&) = delete;
+    Process& operator=(const Process&) = delete;
+
+    pid_t pid() const { return pid_; }
+    bool started() const { return pid_ > 0; }
+    // Sends `signal` and waits up to `timeoutMs` for the exit; SIGKILL after that. Returns the
+    // wait status (or -1).
+    int Stop(int signal, int timeoutMs);
+    // Waits up to `timeoutMs` for an exit by itself; true with the wait status when it exited.
+    bool WaitExit(int timeoutMs, int& status);
+
+  private:
+    pid_t pid_ = -1;
+};
+
+// Starts argv[0] with `argv`, stdout and stderr into `logPath`, in this network namespace, or in
+// the one of process `netnsOf` when it is > 0.
+Process Spawn(const std::vector<std::string>& argv, const std::string& logPath, pid_t netnsOf = 0);
+
+// The veth link between this test's namespace (va, 10.77.0.1/24) and a second namespace held by a
+// sleeping child (vb, 10.77.0.2/24). Both ends up, IPv6 duplicate address detection off (libupnp
+// binds the link-local address at once), and a route for multicast on each side.
+class PeerNetwork {
+  public:
+    PeerNetwork();  // fails the test (ADD_FAILURE) when the link cannot be made
+    ~PeerNetwork();
+    PeerNetwork(const PeerNetwork&) = delete;
+    PeerNetwork& operator=(const PeerNetwork&) = delete;
+    bool ok() const { return ok_; }
+    // Runs a program on the peer host.
+    Process SpawnOnPeer(const std::vector<std::string>& argv, const std::string& logPath);
+
+  private:
+    Process holder_;
+    int holdFd_ = -1;  // the holder exits when this closes
+    bool ok_ = false;
+};
+
+// Path of the built daemon.
+std::string DaemonProgram();
+
+// Starts the built vanuaudiod on interface `interfaceName` and waits (up to 5 s) until it answers
+// on /tmp/vanuaudiod.sock. Its output goes to /tmp/vanuaudiod.log.
+Process StartDaemon(const char* interfaceName = kHostInterface);
+
+// One exchange as Part 6.1's client makes it: connect to the daemon's socket, wait for
+// writability, write the 8196-byte record, wait for a reply within what is left of `budgetMs`
+// (0.5 s by default), read once into 40960 bytes.
+struct Exchange {
+    bool connected = false;
+    bool answered = false;  // a reply of at least one byte within the budget
+    std::string reply;
+    double ms = 0;
+};
+Exchange Call(int32_t command, const std::string& arguments = "", int budgetMs = 500,
+              const char* socketPath = "/tmp/vanuaudiod.sock");
+
+// Polls command 16 ("0 100") until `accept` holds for the parsed list or `timeoutMs` passes;
+// returns the last reply's text.
+template <typename Predicate>
+std::string WaitForList(Predicate accept, int timeoutMs);
+
+// Starts MiniDLNA in the foreground on the peer host with an empty media folder and its database
+// under /tmp/minidlna-<port>, HTTP on `port`, announcing every 60 s (so a max-age of 130 s: a
+// disappearance within seconds can only be its byebye).
+Process StartMiniDlna(PeerNetwork& peer, const std::string& friendlyName, int port);
+
+// A media server played by the test: its descriptions are served over HTTP on this host
+// (10.77.0.1, an ephemeral port) and its SSDP NOTIFY datagrams are sent to the multicast group
+// on va (looped back to this host's listeners), for as many devices as the test adds.
+class FakeMediaServers {
+  public:
+    FakeMediaServers();
+    ~FakeMediaServers();
+    FakeMediaServers(const FakeMediaServers&) = delete;
+    FakeMediaServers& operator=(const FakeMediaServers&) = delete;
+
+    // Adds device `udn` whose description (served at /<index>.xml) is `descriptionXml`.
+    std::string Add(const std::string& udn, const std::string& descriptionXml);
+    // A standard MediaServer:1 description with a ContentDirectory at `controlPath`.
+    static std::string DescriptionXml(const std::string& udn, const std::string& friendlyName,
+                                      const std::string& controlPath);
+    // Sends ssdp:alive (NT = the MediaServer:1 type) / ssdp:byebye for `udn`.
+    void Alive(const std::string& udn, int maxAgeSeconds);
+    void Byebye(const std::string& udn);
+    std::string Location(const std::string& udn) const;
+    unsigned short Port() const { return port_; }
+    // Answers M-SEARCH requests (for the MediaServer:1 type or ssdp:all) for `udn` from now on,
+    // as a device does: a unicast HTTP/1.1 200 reply to the searcher with its location.
+    void AnswerSearches(const std::string& udn, int maxAgeSeconds);
+    // How many M-SEARCH datagrams for media servers have arrived so far.
+    int SearchesSeen() const { return searchesSeen_; }
+
+  private:
+    void Serve();
+    void Notify(const std::string& udn, const char* nts, int maxAgeSeconds);
+    void AnswerSearch();
+
+    int ssdpFd_ = -1;  // bound to port 1900, member of the SSDP group on va
+    std::atomic<int> searchesSeen_{0};
+    std::map<std::string, int> searchAnswers_;  // udn -> max-age
+
+    int listenFd_ = -1;
+    int udpFd_ = -1;
+    unsigned short port_ = 0;
+    std::atomic<bool> stop_{false};
+    mutable std::mutex mutex_;
+    std::map<std::string, std::string> paths_;         // udn -> path
+    std::map<std::string, std::string> descriptions_;  // path -> xml
+    std::thread thread_;
+};
+
+template <typename Predicate>
+std::string WaitForList(Predicate accept, int timeoutMs) {
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(timeoutMs);
+    std::string last;
+    for (;;) {
+        const Exchange page = Call(16, "0 100");
+        last = page.reply;
+        Json::Value parsed;
+        if (page.answered && ParseJson(page.reply, parsed) && accept(parsed["list"]))
+            return last;
+        if (std::chrono::steady_clock::now() >= deadline)
+            return last;
+        std::this_thread::sleep_for(std::chrono::milliseconds(100));
+    }
+}
+
+}  // namespace harmona::test

@@ -1,0 +1,486 @@
+// The real vanuaudiod (platform.md section 10, spec Parts 3.2 and 6.1) in the test's private
+// network: its control socket, its robustness against bad clients, its concurrency, and the
+// discovery of real (MiniDLNA) and scripted media servers over a veth link.
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstring>
+#include <future>
+
+#include "DaemonKit.h"
+#include "Fixtures.h"
+#include "HttpGet.h"
+
+using namespace harmona::test;
+
+namespace {
+
+constexpr const char* kSocket = "/tmp/vanuaudiod.sock";
+
+Json::Value Reply(const Exchange& exchange) {
+    Json::Value value;
+    EXPECT_TRUE(exchange.answered);
+    EXPECT_TRUE(ParseJson(exchange.reply, value)) << exchange.reply;
+    return value;
+}
+
+// A raw client for the malformed cases: connects and sends `bytes`, optionally closing its
+// sending side; returns the descriptor.
+int SendRaw(const std::string& bytes, bool closeSending) {
+    const int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    std::strcpy(address.sun_path, kSocket);
+    EXPECT_EQ(connect(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
+    EXPECT_EQ(send(fd, bytes.data(), bytes.size(), MSG_NOSIGNAL),
+              static_cast<ssize_t>(bytes.size()));
+    if (closeSending)
+        shutdown(fd, SHUT_WR);
+    return fd;
+}
+
+// Reads the reply (one read) within `timeoutMs`; "" when none.
+std::string ReadReply(int fd, int timeoutMs) {
+    struct timeval limit {
+        timeoutMs / 1000, (timeoutMs % 1000) * 1000
+    };
+    setsockopt(fd, SOL_SOCKET, SO_RCVTIMEO, &limit, sizeof(limit));
+    char buffer[40960];
+    const ssize_t n = recv(fd, buffer, sizeof(buffer), 0);
+    close(fd);
+    return n > 0 ? std::string(buffer, static_cast<std::size_t>(n)) : "";
+}
+
+std::string Record(int32_t command, const std::string& arguments) {
+    std::string record(8196, '\0');
+    std::memcpy(&record[0], &command, 4);
+    std::memcpy(&record[4], arguments.data(), arguments.size());
+    return record;
+}
+
+bool HasServer(const Json::Value& list, const std::string& name) {
+    for (const Json::Value& server : list) {
+        if (server["friendly_name"].asString() == name)
+            return true;
+    }
+    return false;
+}
+
+class Vanuaudiod : public ::testing::Test {
+  protected:
+    void SetUp() override { ASSERT_TRUE(peer_.ok()); }
+    // The daemon of the test ends the way a service manager ends it: SIGTERM, then a clean exit
+    // with nothing from the sanitizers (in the sanitizer build) in its output.
+    void TearDown() override {
+        if (!daemon_.started())
+            return;
+        const int status = daemon_.Stop(SIGTERM, 5000);
+        EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << "status " << status;
+        const std::string log = ReadFile("/tmp/vanuaudiod.log");
+        EXPECT_EQ(log.find("Sanitizer"), std::string::npos) << log;
+        EXPECT_EQ(log.find("runtime error"), std::string::npos) << log;
+    }
+    PeerNetwork peer_;
+    Process daemon_;
+};
+
+}  // namespace
+
+TEST_F(Vanuaudiod, SocketIsOpenToTheCgiUserAndAStaleOneIsReplaced) {
+    // A stale socket file: bound by a process that is gone.
+    {
+        const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
+        sockaddr_un address{};
+        address.sun_family = AF_UNIX;
+        std::strcpy(address.sun_path, kSocket);
+        ASSERT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
+        close(fd);
+    }
+    daemon_ = StartDaemon();
+    struct stat info {};
+    ASSERT_EQ(stat(kSocket, &info), 0);
+    EXPECT_TRUE(S_ISSOCK(info.st_mode));
+    EXPECT_EQ(info.st_mode & 0777, 0666u);
+    EXPECT_TRUE(Call(16, "0 10").answered);
+}
+
+TEST_F(Vanuaudiod, ASecondDaemonDoesNotTakeOverALiveSocket) {
+    daemon_ = StartDaemon();
+    Process second = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/second.log");
+    int status = 0;
+    ASSERT_TRUE(second.WaitExit(5000, status));
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 1) << status;
+    EXPECT_NE(ReadFile("/tmp/second.log").find("another daemon"), std::string::npos);
+    EXPECT_TRUE(Call(16, "0 10").answered);
+}
+
+TEST_F(Vanuaudiod, AFileThatIsNotASocketIsLeftAlone) {
+    WriteFile(kSocket, "precious");
+    Process daemon = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/d.log");
+    int status = 0;
+    ASSERT_TRUE(daemon.WaitExit(5000, status));
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 1);
+    EXPECT_EQ(ReadFile(kSocket), "precious");
+}
+
+TEST_F(Vanuaudiod, SigtermAndSigintStopItCleanlyAndRemoveTheSocket) {
+    for (int signal : {SIGTERM, SIGINT}) {
+        daemon_ = StartDaemon();
+        const int status = daemon_.Stop(signal, 5000);
+        EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << signal << " " << status;
+        EXPECT_FALSE(Exists(kSocket)) << signal;
+        EXPECT_EQ(ReadFile("/tmp/vanuaudiod.log").find("Sanitizer"), std::string::npos);
+    }
+}
+
+TEST_F(Vanuaudiod, CommandFourteenIsAnsweredAtOnceAndTheListStaysAnswerableDuringTheSearch) {
+    daemon_ = StartDaemon();
+    const Exchange prepare = Call(14);
+    EXPECT_EQ(prepare.reply, "{\"success\": true}");
+    // The search runs now (MX 2 s); pages are answered meanwhile, each within the budget.
+    for (int i = 0; i < 20; ++i) {
+        const Json::Value page = Reply(Call(16, "0 10"));
+        EXPECT_EQ(page["success"], true);
+        EXPECT_TRUE(page["list"].isArray());
+        EXPECT_TRUE(page["total"].isInt());
+    }
+}
+
+TEST_F(Vanuaudiod, OtherCommandCodesAreUnsupported) {
+    daemon_ = StartDaemon();
+    for (int32_t code : {1, 15, 17, 19, 27, 35, 38, 99, -7}) {
+        const Json::Value reply = Reply(Call(code, "1 2"));
+        EXPECT_EQ(reply["success"], false) << code;
+        EXPECT_EQ(reply["error"], "unsupported") << code;
+    }
+}
+
+TEST_F(Vanuaudiod, GarbageAndHalfRecordsDoNotUpsetLaterClients) {
+    daemon_ = StartDaemon();
+    // Garbage, then the client stops sending: a short request.
+    Json::Value reply;
+    ASSERT_TRUE(ParseJson(ReadReply(SendRaw("\xff\xfe garbage \x01\x02", true), 2000), reply));
+    EXPECT_EQ(reply["success"], false);
+    // Half a record, held open: the others are served meanwhile.
+    const int half = SendRaw(Record(16, "0 10").substr(0, 4000), false);
+    for (int i = 0; i < 5; ++i)
+        EXPECT_EQ(Reply(Call(16, "0 10"))["success"], true);
+    // The half record gets an error after the daemon's time limit and is closed.
+    ASSERT_TRUE(ParseJson(ReadReply(half, 4000), reply));
+    EXPECT_EQ(reply["success"], false);
+    EXPECT_EQ(reply["error"], "request timed out");
+    // A record with more bytes after it.
+    ASSERT_TRUE(ParseJson(ReadReply(SendRaw(Record(16, "0 10") + "trailing", false), 2000), reply));
+    EXPECT_EQ(reply["error"], "oversized request");
+    // A record whose argument text has no terminator.
+    std::string unterminated = Record(16, "");
+    std::memset(&unterminated[4], '7', 8192);
+    ASSERT_TRUE(ParseJson(ReadReply(SendRaw(unterminated, false), 2000), reply));
+    EXPECT_EQ(reply["error"], "bad request");
+    // Page arguments that are not two integers.
+    EXPECT_EQ(Reply(Call(16, "zero ten"))["success"], false);
+    // And the daemon is as before.
+    const Json::Value page = Reply(Call(16, "0 10"));
+    EXPECT_EQ(page["success"], true);
+    EXPECT_EQ(waitpid(daemon_.pid(), nullptr, WNOHANG), 0);
+}
+
+TEST_F(Vanuaudiod, FiftyClientsAtOnceAreAllAnsweredWithinHalfASecond) {
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    for (int i = 0; i < 12; ++i) {
+        const std::string udn = "uuid:fifty-" + std::to_string(i);
+        fake.Add(udn, FakeMediaServers::DescriptionXml(udn, "Server " + std::to_string(i), "/cd"));
+        fake.Alive(udn, 60);
+    }
+    WaitForList([](const Json::Value& list) { return list.size() == 12; }, 10000);
+    std::promise<void> go;
+    std::shared_future<void> start = go.get_future().share();
+    std::vector<std::future<Exchange>> clients;
+    for (int i = 0; i < 50; ++i) {
+        clients.push_back(std::async(std::launch::async, [start, i] {
+            start.wait();
+            return Call(16, i % 2 == 0 ? "0 10" : "10 10");
+        }));
+    }
+    go.set_value();
+    for (int i = 0; i < 50; ++i) {
+        const Exchange exchange = clients[i].get();
+        ASSERT_TRUE(exchange.answered) << "client " << i << " after " << exchange.ms << " ms";
+        const Json::Value page = Reply(exchange);
+        EXPECT_EQ(page["total"], 12);
+        EXPECT_EQ(page["list"].size(), i % 2 == 0 ? 10u : 2u);
+    }
+}
+
+TEST_F(Vanuaudiod, FindsARealMiniDlnaWithItsContentDirectory) {
+    daemon_ = StartDaemon();
+    Process minidlna = StartMiniDlna(peer_, "Shelf MiniDLNA", 8200);
+    EXPECT_TRUE(Call(14).answered);
+    const std::string text = WaitForList(
+        [](const Json::Value& list) { return HasServer(list, "Shelf MiniDLNA"); }, 15000);
+    Json::Value reply;
+    ASSERT_TRUE(ParseJson(text, reply)) << text;
+    ASSERT_EQ(reply["list"].size(), 1u) << text << ReadFile("/tmp/vanuaudiod.log");
+    const Json::Value& server = reply["list"][0];
+    EXPECT_EQ(server["control_url"], "http://10.77.0.2:8200/ctl/ContentDir");
+    EXPECT_EQ(server["ip"], kPeerAddress);
+    EXPECT_EQ(server["udn"].asString().rfind("uuid:", 0), 0u);
+    EXPECT_EQ(reply["total"], 1);
+}
+
+TEST_F(Vanuaudiod, AStoppedServerDisappearsAfterItsByebye) {
+    daemon_ = StartDaemon();
+    Process minidlna = StartMiniDlna(peer_, "Leaving MiniDLNA", 8201);
+    Call(14);
+    ASSERT_TRUE(HasServer(
+        [] {
+            Json::Value r;
+            ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 15000), r);
+            return r["list"];
+        }(),
+        "Leaving MiniDLNA"));
+    // MiniDLNA announces a max-age of 130 s: gone within seconds means its byebye was heard.
+    minidlna.Stop(SIGTERM, 5000);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.empty(); }, 5000), reply));
+    EXPECT_EQ(reply["list"].size(), 0u);
+    EXPECT_EQ(reply["total"], 0);
+}
+
+TEST_F(Vanuaudiod, AServerThatStopsAnnouncingExpiresAfterItsMaxAge) {
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    fake.Add("uuid:short", FakeMediaServers::DescriptionXml("uuid:short", "Short Lived", "/cd"));
+    fake.Add("uuid:long", FakeMediaServers::DescriptionXml("uuid:long", "Long Lived", "/cd"));
+    fake.Alive("uuid:short", 2);
+    fake.Alive("uuid:long", 300);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 2; }, 5000), reply));
+    ASSERT_EQ(reply["list"].size(), 2u);
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 6000), reply));
+    ASSERT_EQ(reply["list"].size(), 1u);
+    EXPECT_EQ(reply["list"][0]["friendly_name"], "Long Lived");
+}
+
+TEST_F(Vanuaudiod, ServersAreListedInAStableOrderAndPaged) {
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    // Announced in a scrambled order; two share a name.
+    const std::vector<std::pair<std::string, std::string>> devices = {
+        {"uuid:c", "Charlie"}, {"uuid:a2", "Alpha"}, {"uuid:b", "Bravo"}, {"uuid:a1", "Alpha"}};
+    for (const auto& [udn, name] : devices) {
+        fake.Add(udn, FakeMediaServers::DescriptionXml(udn, name, "/cd/" + udn));
+        fake.Alive(udn, 60);
+    }
+    WaitForList([](const Json::Value& l) { return l.size() == 4; }, 5000);
+    const Json::Value first = Reply(Call(16, "0 3"));
+    const Json::Value second = Reply(Call(16, "3 3"));
+    ASSERT_EQ(first["list"].size(), 3u);
+    ASSERT_EQ(second["list"].size(), 1u);
+    EXPECT_EQ(first["total"], 4);
+    EXPECT_EQ(first["list"][0]["udn"], "uuid:a1");
+    EXPECT_EQ(first["list"][1]["udn"], "uuid:a2");
+    EXPECT_EQ(first["list"][2]["udn"], "uuid:b");
+    EXPECT_EQ(second["list"][0]["udn"], "uuid:c");
+    EXPECT_EQ(first["list"][0]["control_url"],
+              "http://10.77.0.1:" + std::to_string(fake.Port()) + "/cd/uuid:a1");
+}
+
+TEST_F(Vanuaudiod, ByebyeOfOneServerLeavesTheOthers) {
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    for (const char* udn : {"uuid:stay", "uuid:go"}) {
+        fake.Add(udn, FakeMediaServers::DescriptionXml(udn, udn + 5, "/cd"));
+        fake.Alive(udn, 300);
+    }
+    WaitForList([](const Json::Value& l) { return l.size() == 2; }, 5000);
+    fake.Byebye("uuid:go");
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 3000), reply));
+    ASSERT_EQ(reply["list"].size(), 1u);
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:stay");
+}
+
+TEST_F(Vanuaudiod, DevicesWithoutAUsableDescriptionAreNotListed) {
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    fake.Add("uuid:broken", "<root><device><deviceType>nonsense");
+    fake.Add("uuid:nocd", FakeMediaServers::DescriptionXml("uuid:nocd", "No CD", ""));
+    fake.Add("uuid:good", FakeMediaServers::DescriptionXml("uuid:good", "Good", "/cd"));
+    fake.Alive("uuid:broken", 60);
+    fake.Alive("uuid:nocd", 60);
+    fake.Alive("uuid:missing", 60);  // its location answers 404
+    fake.Alive("uuid:good", 60);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
+    // Give the broken ones the same time to (not) show up.
+    std::this_thread::sleep_for(std::chrono::milliseconds(500));
+    reply = Reply(Call(16, "0 10"));
+    ASSERT_EQ(reply["list"].size(), 1u);
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:good");
+}
+
+TEST_F(Vanuaudiod, HostileNamesAreCleanedAndRepliesStayInsideTheClientsBuffer) {
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    // Long names of quotes (twice as long once escaped) and invalid UTF-8.
+    for (int i = 0; i < 15; ++i) {
+        const std::string udn = "uuid:big-" + std::to_string(10 + i);
+        fake.Add(udn, FakeMediaServers::DescriptionXml(
+                          udn, std::string(3000, '"') + "\xff" + std::to_string(i), "/cd"));
+        fake.Alive(udn, 60);
+    }
+    WaitForList([](const Json::Value& l) { return l.size() == 15; }, 8000);
+    const Exchange page = Call(16, "0 15");
+    ASSERT_TRUE(page.answered);
+    EXPECT_LT(page.reply.size(), 40960u);
+    const Json::Value reply = Reply(page);
+    EXPECT_EQ(reply["total"], 15);
+    ASSERT_GE(reply["list"].size(), 10u);  // a page of Part 3.2's size always fits
+    EXPECT_EQ(reply["list"][0]["friendly_name"].asString(), std::string(512, '"'));
+}
+
+// Through the real CGI: Part 3.2's client pages the real daemon's list into media server nodes.
+namespace {
+
+const Json::Value* FindNode(const Json::Value& nodes, const std::string& id) {
+    for (const Json::Value& node : nodes) {
+        if (node["id"].asString() == id)
+            return &node;
+    }
+    return nullptr;
+}
+
+CgiResult RefreshMediaServers() {
+    return Get(Query({{"action", "refresh"}, {"target", "mediaserver"}}));
+}
+
+}  // namespace
+
+TEST_F(Vanuaudiod, ServersOnTheNetworkAppearAsMediaServerNodesThroughTheCgi) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    Process minidlna = StartMiniDlna(peer_, "Kitchen MiniDLNA", 8200);
+    FakeMediaServers fake;
+    fake.Add("uuid:nameless", FakeMediaServers::DescriptionXml("uuid:nameless", "", "/cd"));
+    fake.Alive("uuid:nameless", 60);
+    // The scan: the CGI's refresh sends command 14 (the search), then pages with command 16.
+    const CgiResult first = RefreshMediaServers();
+    ASSERT_TRUE(first.jsonOk) << first.output;
+    EXPECT_EQ(first.json["success"], true);
+    WaitForList([](const Json::Value& l) { return l.size() == 2; }, 15000);
+
+    const CgiResult refresh = RefreshMediaServers();
+    ASSERT_TRUE(refresh.jsonOk) << refresh.output;
+    EXPECT_EQ(refresh.json["success"], true);
+    const Json::Value& items = refresh.json["items"];
+    ASSERT_EQ(items.size(), 2u) << refresh.body;
+    const Json::Value* kitchen =
+        FindNode(items, "mediaserver_http://10.77.0.2:8200/ctl/ContentDir");
+    ASSERT_NE(kitchen, nullptr) << refresh.body;
+    EXPECT_EQ((*kitchen)["text"], "Kitchen MiniDLNA");
+    EXPECT_EQ((*kitchen)["pid"], "mediaserver_root");
+    EXPECT_EQ((*kitchen)["leaf"], true);
+    const std::string namelessId =
+        "mediaserver_http://10.77.0.1:" + std::to_string(fake.Port()) + "/cd";
+    const Json::Value* nameless = FindNode(items, namelessId);
+    ASSERT_NE(nameless, nullptr) << refresh.body;
+    EXPECT_EQ((*nameless)["text"], kHostAddress);  // no friendly name: its ip
+
+    // The same servers under the root tree's media server node, after the scan button.
+    const CgiResult root = Get(Query({{"action", "gettreenode"}, {"node", "audiotree_root"}}));
+    ASSERT_TRUE(root.jsonOk) << root.output;
+    const Json::Value* mediaRoot = FindNode(root.json, "mediaserver_root");
+    ASSERT_NE(mediaRoot, nullptr) << root.body;
+    const Json::Value& children = (*mediaRoot)["children"];
+    ASSERT_EQ(children.size(), 3u) << root.body;
+    EXPECT_EQ(children[0]["id"], "mediaserver_refresh");
+    EXPECT_NE(FindNode(children, "mediaserver_http://10.77.0.2:8200/ctl/ContentDir"), nullptr);
+    EXPECT_NE(FindNode(children, namelessId), nullptr);
+}
+
+TEST_F(Vanuaudiod, AStoppedServerLeavesTheCgisListAfterItsByebye) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    Process minidlna = StartMiniDlna(peer_, "Garage MiniDLNA", 8202);
+    RefreshMediaServers();
+    WaitForList([](const Json::Value& l) { return l.size() == 1; }, 15000);
+    const CgiResult before = RefreshMediaServers();
+    ASSERT_EQ(before.json["items"].size(), 1u) << before.body;
+    minidlna.Stop(SIGTERM, 5000);
+    WaitForList([](const Json::Value& l) { return l.empty(); }, 5000);
+    const CgiResult after = RefreshMediaServers();
+    ASSERT_TRUE(after.jsonOk) << after.output;
+    EXPECT_EQ(after.json["success"], true);
+    EXPECT_EQ(after.json["items"].size(), 0u) << after.body;
+}
+
+TEST_F(Vanuaudiod, TwentyFiveServersArePagedIntoTwentyFiveNodesByTheCgi) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    for (int i = 0; i < 25; ++i) {
+        const std::string udn = "uuid:many-" + std::to_string(i);
+        fake.Add(udn, FakeMediaServers::DescriptionXml(udn, "Server " + std::to_string(100 + i),
+                                                       "/cd/" + std::to_string(i)));
+        fake.Alive(udn, 60);
+    }
+    WaitForList([](const Json::Value& l) { return l.size() == 25; }, 10000);
+    const CgiResult refresh = RefreshMediaServers();
+    ASSERT_TRUE(refresh.jsonOk) << refresh.output;
+    const Json::Value& items = refresh.json["items"];
+    ASSERT_EQ(items.size(), 25u) << refresh.body;
+    for (int i = 0; i < 25; ++i)
+        EXPECT_EQ(items[i]["text"], "Server " + std::to_string(100 + i));
+}
+
+TEST_F(Vanuaudiod, AServerAlreadyRunningIsFoundByTheSearchAtStart) {
+    // MiniDLNA starts first; its start-up announcements go out before the daemon listens, and its
+    // next ones are a minute away: only the daemon's own M-SEARCH can find it.
+    Process minidlna = StartMiniDlna(peer_, "Early MiniDLNA", 8203);
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(5);
+    while (!vanuaudiod::HttpGet("http://10.77.0.2:8203/rootDesc.xml", 500, 65536).ok &&
+           std::chrono::steady_clock::now() < deadline)
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    std::this_thread::sleep_for(std::chrono::milliseconds(300));
+    daemon_ = StartDaemon();
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 10000), reply));
+    ASSERT_EQ(reply["list"].size(), 1u) << ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(reply["list"][0]["friendly_name"], "Early MiniDLNA");
+}
+
+TEST_F(Vanuaudiod, CommandFourteenSendsANewSearch) {
+    FakeMediaServers fake;
+    fake.Add("uuid:quiet", FakeMediaServers::DescriptionXml("uuid:quiet", "Quiet", "/cd"));
+    daemon_ = StartDaemon();
+    // The search at start arrives while the device does not answer yet.
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(5);
+    while (fake.SearchesSeen() == 0 && std::chrono::steady_clock::now() < deadline)
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    ASSERT_GT(fake.SearchesSeen(), 0);
+    std::this_thread::sleep_for(std::chrono::milliseconds(500));  // its repeats too
+    const int before = fake.SearchesSeen();
+    fake.AnswerSearches("uuid:quiet", 60);
+    EXPECT_EQ(Reply(Call(16, "0 10"))["total"], 0);
+    // The scan button: command 14, answered at once, and the device answers the new search.
+    EXPECT_EQ(Call(14).reply, "{\"success\": true}");
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
+    ASSERT_EQ(reply["list"].size(), 1u);
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:quiet");
+    EXPECT_GT(fake.SearchesSeen(), before);
+}
