@@ -20,8 +20,8 @@ ip addr add 192.0.2.1/24 dev hm0; ip addr add 192.0.2.2/24 dev hm1
 ip link set hm0 up; ip link set hm1 up; ip route add 239.0.0.0/8 dev hm0
 mount --make-rprivate /
 for d in /volume1 /var/packages /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
-# MiniDLNA skips MP3 files under 8 KiB ("File too small"): 0.6 s at 44.1 kHz is about 10 KB.
-sox -q -n -r 44100 -c 1 /tmp/template.mp3 synth 0.6 sine 440
+# MiniDLNA skips MP3 files under 8 KiB ("File too small"): 1.2 s at 44.1 kHz is about 10 KB.
+sox -q -n -r 44100 -c 1 /tmp/template.mp3 synth 1.2 sine 440
 
 seconds() { date +%s.%N; }
 rate() { python3 -c "print('%.0f' % ($1 / ($3 - $2)))"; }
