@@ -80,7 +80,28 @@ measure() {  # label url object start count
     printf '%-34s median %6.3f s  (returned %s of %s, %s bytes)\n' "$1" \
         "$(printf '%s\n' "${times[@]}" | median)" "$(returned)" "$(total)" "$(stat -c %s /tmp/reply.xml)"
 }
+# The whole list as a client gets it: RequestedCount 0, then again from the next index while fewer
+# than TotalMatches have arrived (as the browse library does; MiniDLNA cuts replies at 2 MiB).
+fetch_all() {  # url object -> seconds requests
+    local got=0 requests=0 sum=0 t
+    while :; do
+        t=$(soap "$1" "$2" "$got" 0); requests=$((requests + 1))
+        sum=$(python3 -c "print($sum + $t)")
+        got=$((got + $(returned)))
+        [[ "$(returned)" == 0 || "$got" -ge "$(total)" ]] && break
+    done
+    echo "$sum $requests $got"
+}
+measure_all() {  # label url object
+    local runs=() line
+    for _ in $(seq 1 "$repeats"); do line=$(fetch_all "$2" "$3"); runs+=("$line"); done
+    printf '%-34s median %6.3f s  (%s requests, %s objects)\n' "$1" \
+        "$(printf '%s\n' "${runs[@]}" | awk '{print $1}' | median)" \
+        "$(echo "${runs[0]}" | awk '{print $2}')" "$(echo "${runs[0]}" | awk '{print $3}')"
+}
 measure "harmona-mediad whole list" "$ours" music_all 0 0
-measure "MiniDLNA whole list" "$theirs" '1$4' 0 0
+measure "MiniDLNA whole list (one reply)" "$theirs" '1$4' 0 0
+measure_all "harmona-mediad all, paged" "$ours" music_all
+measure_all "MiniDLNA all, paged" "$theirs" '1$4'
 measure "harmona-mediad page of 50" "$ours" music_all 50000 50
 measure "MiniDLNA page of 50" "$theirs" '1$4' 50000 50
