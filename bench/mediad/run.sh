@@ -1,0 +1,107 @@
+#!/usr/bin/env bash
+# Benchmark of issue 8: harmona-index over 10,000 tiny files (first run and unchanged re-run), and
+# Browse of a container of BROWSE_TRACKS (default 100,000) tracks, whole and a page of 50, against
+# MiniDLNA serving the same files in the same run. Runs in a private mount and network namespace.
+#   bench/mediad/run.sh [BUILD_DIR]      (as root; needs sox, minidlna, python3, curl)
+set -euo pipefail
+here=$(cd "$(dirname "$0")" && pwd)
+build=$(cd "${1:-$here/../../build}" && pwd)
+if [[ "${HARMONA_BENCH_INSIDE:-}" != 1 ]]; then
+    exec env HARMONA_BENCH_INSIDE=1 unshare -m -n "$0" "$build"
+fi
+index_files=${INDEX_FILES:-10000}
+browse_tracks=${BROWSE_TRACKS:-100000}
+repeats=${REPEATS:-5}
+
+ip link set lo up
+ip link add hm0 type veth peer name hm1
+for i in hm0 hm1; do echo 1 > /proc/sys/net/ipv6/conf/$i/disable_ipv6; done
+ip addr add 192.0.2.1/24 dev hm0; ip addr add 192.0.2.2/24 dev hm1
+ip link set hm0 up; ip link set hm1 up; ip route add 239.0.0.0/8 dev hm0
+mount --make-rprivate /
+for d in /volume1 /var/packages /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
+# MiniDLNA skips MP3 files under 8 KiB ("File too small"): 1.2 s at 44.1 kHz is about 10 KB.
+sox -q -n -r 44100 -c 1 /tmp/template.mp3 synth 1.2 sine 440
+
+seconds() { date +%s.%N; }
+rate() { python3 -c "print('%.0f' % ($1 / ($3 - $2)))"; }
+
+echo "== harmona-index, $index_files tiny files"
+python3 "$here/make_share.py" /tmp/template.mp3 /volume1/music "$index_files" 100
+t0=$(seconds); "$build/harmona-index"; t1=$(seconds)
+"$build/harmona-index"; t2=$(seconds)
+echo "first run:     $(rate "$index_files" "$t0" "$t1") files/s ($(python3 -c "print('%.2f' % ($t1-$t0))") s)"
+echo "unchanged run: $(rate "$index_files" "$t1" "$t2") files/s ($(python3 -c "print('%.2f' % ($t2-$t1))") s)"
+
+echo "== Browse of a container of $browse_tracks tracks"
+rm -rf /volume1/music /var/packages/Harmona
+python3 "$here/make_share.py" /tmp/template.mp3 /volume1/music "$browse_tracks" 1000
+t0=$(seconds); "$build/harmona-index" >/dev/null; t1=$(seconds)
+echo "harmona-index of $browse_tracks files: $(python3 -c "print('%.1f' % ($t1-$t0))") s"
+"$build/harmona-mediad" --interface hm0 & mediad=$!
+mkdir -p /tmp/minidlna
+cat > /tmp/minidlna.conf <<CONF
+media_dir=A,/volume1/music
+db_dir=/tmp/minidlna
+log_dir=/tmp/minidlna
+network_interface=hm0
+port=8200
+inotify=no
+friendly_name=bench
+CONF
+t0=$(seconds)
+minidlnad -f /tmp/minidlna.conf -P /tmp/minidlna.pid -S -R >/tmp/minidlna/stdout.log 2>&1 & minidlna=$!
+trap 'kill $mediad $minidlna 2>/dev/null || true' EXIT
+
+soap() {  # url object start count
+    printf '<?xml version="1.0"?><s:Envelope xmlns:s="http://schemas.xmlsoap.org/soap/envelope/" s:encodingStyle="http://schemas.xmlsoap.org/soap/encoding/"><s:Body><u:Browse xmlns:u="urn:schemas-upnp-org:service:ContentDirectory:1"><ObjectID>%s</ObjectID><BrowseFlag>BrowseDirectChildren</BrowseFlag><Filter>*</Filter><StartingIndex>%s</StartingIndex><RequestedCount>%s</RequestedCount><SortCriteria></SortCriteria></u:Browse></s:Body></s:Envelope>' "$2" "$3" "$4" |
+    curl -s -m 120 -o /tmp/reply.xml -w '%{time_total}' -H 'Content-Type: text/xml; charset="utf-8"' \
+        -H 'SOAPACTION: "urn:schemas-upnp-org:service:ContentDirectory:1#Browse"' --data-binary @- "$1"
+}
+total() { grep -o 'TotalMatches>[0-9]*' /tmp/reply.xml | grep -o '[0-9]*$' || echo 0; }
+returned() { grep -o 'NumberReturned>[0-9]*' /tmp/reply.xml | grep -o '[0-9]*$' || echo 0; }
+
+ours=http://127.0.0.1:50003/ContentDirectory/control
+theirs=http://192.0.2.1:8200/ctl/ContentDir
+# MiniDLNA's "All Music" is 1$4; wait for its scan (up to 15 minutes).
+set +e
+for _ in $(seq 1 900); do
+    soap "$theirs" '1$4' 0 1 >/dev/null 2>&1 || true
+    [[ "$(total)" == "$browse_tracks" ]] && break
+    sleep 1
+done
+t1=$(seconds)
+echo "MiniDLNA scan of $browse_tracks files: $(python3 -c "print('%.1f' % ($t1-$t0))") s (TotalMatches $(total))"
+
+median() { sort -n | awk '{a[NR]=$1} END {print a[int((NR+1)/2)]}'; }
+measure() {  # label url object start count
+    local times=() t
+    for _ in $(seq 1 "$repeats"); do t=$(soap "$2" "$3" "$4" "$5"); times+=("$t"); done
+    printf '%-34s median %6.3f s  (returned %s of %s, %s bytes)\n' "$1" \
+        "$(printf '%s\n' "${times[@]}" | median)" "$(returned)" "$(total)" "$(stat -c %s /tmp/reply.xml)"
+}
+# The whole list as a client gets it: RequestedCount 0, then again from the next index while fewer
+# than TotalMatches have arrived (as the browse library does; MiniDLNA cuts replies at 2 MiB).
+fetch_all() {  # url object -> seconds requests
+    local got=0 requests=0 sum=0 t
+    while :; do
+        t=$(soap "$1" "$2" "$got" 0); requests=$((requests + 1))
+        sum=$(python3 -c "print($sum + $t)")
+        got=$((got + $(returned)))
+        [[ "$(returned)" == 0 || "$got" -ge "$(total)" ]] && break
+    done
+    echo "$sum $requests $got"
+}
+measure_all() {  # label url object
+    local runs=() line
+    for _ in $(seq 1 "$repeats"); do line=$(fetch_all "$2" "$3"); runs+=("$line"); done
+    printf '%-34s median %6.3f s  (%s requests, %s objects)\n' "$1" \
+        "$(printf '%s\n' "${runs[@]}" | awk '{print $1}' | median)" \
+        "$(echo "${runs[0]}" | awk '{print $2}')" "$(echo "${runs[0]}" | awk '{print $3}')"
+}
+measure "harmona-mediad whole list" "$ours" music_all 0 0
+measure "MiniDLNA whole list (one reply)" "$theirs" '1$4' 0 0
+measure_all "harmona-mediad all, paged" "$ours" music_all
+measure_all "MiniDLNA all, paged" "$theirs" '1$4'
+measure "harmona-mediad page of 50" "$ours" music_all 50000 50
+measure "MiniDLNA page of 50" "$theirs" '1$4' 50000 50
