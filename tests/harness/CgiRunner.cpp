@@ -5,6 +5,7 @@
 #include <fcntl.h>
 #include <poll.h>
 #include <signal.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -60,7 +61,7 @@ std::vector<std::string> BuildEnvironment(const CgiRequest& r) {
     return env;
 }
 
-void SplitReply(CgiResult& result) {
+void SplitReply(CgiResult& result, bool parseJson) {
     const std::string& out = result.output;
     std::size_t end = out.find("\r\n\r\n");
     std::size_t skip = 4;
@@ -88,7 +89,8 @@ void SplitReply(CgiResult& result) {
         result.headers.emplace_back(line.substr(0, colon), value);
     }
     result.body = out.substr(end + skip);
-    result.jsonOk = ParseJson(result.body, result.json);
+    if (parseJson)
+        result.jsonOk = ParseJson(result.body, result.json);
 }
 
 }  // namespace
@@ -158,6 +160,7 @@ CgiResult RunCgi(const CgiRequest& request) {
     SetNonBlocking(err[0]);
 
     std::size_t written = 0;
+    int heldStdin = -1;
     int inFd = in[1];
     if (request.body.empty()) {
         close(inFd);
@@ -198,7 +201,10 @@ CgiResult RunCgi(const CgiRequest& request) {
             if (w < 0 && errno != EAGAIN)
                 written = request.body.size();  // reader gone
             if (written >= request.body.size()) {
-                close(inFd);
+                if (!request.keepStdinOpen)
+                    close(inFd);
+                else
+                    heldStdin = inFd;
                 inFd = -1;
             }
         }
@@ -215,20 +221,23 @@ CgiResult RunCgi(const CgiRequest& request) {
     }
     if (inFd >= 0)
         close(inFd);
+    if (heldStdin >= 0)
+        close(heldStdin);
     int status = 0;
+    struct rusage usage {};
     if (result.timedOut) {
         kill(pid, SIGKILL);
-        waitpid(pid, &status, 0);
+        wait4(pid, &status, 0, &usage);
     } else {
         // Both pipes closed; the process is ending. Wait for it within what is left of the limit.
         for (;;) {
-            const pid_t w = waitpid(pid, &status, WNOHANG);
+            const pid_t w = wait4(pid, &status, WNOHANG, &usage);
             if (w == pid)
                 break;
             if (Clock::now() >= deadline) {
                 result.timedOut = true;
                 kill(pid, SIGKILL);
-                waitpid(pid, &status, 0);
+                wait4(pid, &status, 0, &usage);
                 break;
             }
             usleep(1000);
@@ -236,6 +245,7 @@ CgiResult RunCgi(const CgiRequest& request) {
     }
     close(out[0]);
     close(err[0]);
+    result.peakRssKb = usage.ru_maxrss;
     result.wallMs = std::chrono::duration<double, std::milli>(Clock::now() - start).count();
     if (!result.timedOut && WIFEXITED(status)) {
         result.exited = true;
@@ -244,7 +254,7 @@ CgiResult RunCgi(const CgiRequest& request) {
         result.signal = WTERMSIG(status);
     }
     result.log = TakeLogLines();
-    SplitReply(result);
+    SplitReply(result, request.parseJson);
     // A sanitizer report from the program fails the test that ran it, whatever it asserts.
     if (result.errors.find("Sanitizer") != std::string::npos ||
         result.errors.find("runtime error:") != std::string::npos)

@@ -26,6 +26,10 @@ struct CgiRequest {
     bool hasRemoteUser = true;
     std::string acceptLanguage;
     std::map<std::string, std::string> extraEnv;
+    // Leave standard input open after the body, as a web server waiting for a slow client does.
+    bool keepStdinOpen = false;
+    // Parse the reply body as JSON into CgiResult::json (off for replies of hundreds of MiB).
+    bool parseJson = true;
     int timeoutMs = 30000;
     std::string program;  // empty: the built audiotree.cgi
 };
@@ -36,6 +40,9 @@ struct CgiResult {
     int signal = 0;         // the signal that ended it, if any
     bool timedOut = false;  // killed because it outlived the request's time limit
     double wallMs = 0;
+    // Peak resident memory (ru_maxrss, KiB). Linux counts the forked child's pages from before its
+    // exec too, so this is an upper bound: the test process's own size at most is added.
+    long peakRssKb = 0;
     std::string output;                                        // everything on standard output
     std::string errors;                                        // everything on standard error
     std::vector<std::pair<std::string, std::string>> headers;  // CGI header lines, in order

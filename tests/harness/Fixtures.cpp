@@ -1,8 +1,11 @@
 #include "Fixtures.h"
 
 #include <dirent.h>
+#include <ftw.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <fstream>
@@ -36,6 +39,21 @@ void WriteFile(const std::string& path, const std::string& content, unsigned mod
         out << content;
     }
     chmod(path.c_str(), mode);
+}
+
+void WriteLargeFile(const std::string& path, const std::string& head, char fill, std::size_t count,
+                    const std::string& tail) {
+    WriteFile(path, head);
+    std::ofstream out(path, std::ios::binary | std::ios::app);
+    const std::string piece(1 << 20, fill);
+    for (std::size_t left = count; left > 0;) {
+        const std::size_t n = std::min(left, piece.size());
+        out.write(piece.data(), static_cast<std::streamsize>(n));
+        left -= n;
+    }
+    out << tail;
+    if (!out)
+        throw std::runtime_error("cannot write " + path);
 }
 
 std::string ReadFile(const std::string& path) {
@@ -80,6 +98,49 @@ void WriteUsersConf(const std::map<std::string, UserEntry>& users) {
 
 void AddUser(const std::string& name, int permission, const std::string& language) {
     WriteUsersConf({{name, {std::to_string(permission), language}}});
+}
+
+namespace {
+
+FileSnapshot* currentSnapshot = nullptr;
+
+int RecordEntry(const char* path, const struct stat* st, int type, struct FTW*) {
+    std::string entry = std::to_string(type) + " " + std::to_string(st->st_mode) + " " +
+                        std::to_string(st->st_size) + " " + std::to_string(st->st_mtim.tv_sec) +
+                        "." + std::to_string(st->st_mtim.tv_nsec);
+    if (type == FTW_SL) {
+        char target[4096];
+        const ssize_t n = readlink(path, target, sizeof(target));
+        if (n > 0)
+            entry += " -> " + std::string(target, static_cast<std::size_t>(n));
+    }
+    (*currentSnapshot)[path] = entry;
+    return 0;
+}
+
+}  // namespace
+
+FileSnapshot Snapshot() {
+    FileSnapshot snapshot;
+    currentSnapshot = &snapshot;
+    for (const char* root : {"/var/packages", "/usr/vanu", "/tmp", "/run", "/volume1"})
+        nftw(root, RecordEntry, 32, FTW_PHYS | FTW_MOUNT);
+    currentSnapshot = nullptr;
+    return snapshot;
+}
+
+std::vector<std::string> ChangedPaths(const FileSnapshot& before, const FileSnapshot& after) {
+    std::vector<std::string> changed;
+    for (const auto& [path, entry] : before) {
+        const auto it = after.find(path);
+        if (it == after.end() || it->second != entry)
+            changed.push_back(path);
+    }
+    for (const auto& [path, entry] : after) {
+        if (before.count(path) == 0)
+            changed.push_back(path);
+    }
+    return changed;
 }
 
 void StandardFixture() {

@@ -4,8 +4,8 @@
 #include <cstdio>
 #include <stdexcept>
 
-#include "gpod/Database.h"
 #include "Fixtures.h"
+#include "gpod/Database.h"
 
 namespace harmona::test {
 

@@ -5,8 +5,8 @@
 #include <future>
 #include <stdexcept>
 
-#include "sqlite/Database.h"
 #include "Fixtures.h"
+#include "sqlite/Database.h"
 
 namespace harmona::test {
 namespace {

@@ -1,0 +1,241 @@
+#include "Indexer.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <syslog.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <ctime>
+#include <unordered_map>
+#include <vector>
+
+#include "LibrarySchema.h"
+#include "MediaFiles.h"
+#include "TagReader.h"
+#include "sqlite/Database.h"
+
+namespace harmona::index {
+namespace {
+
+using sqlite::Database;
+using sqlite::Statement;
+
+constexpr int kMaxFolderDepth = 64;
+constexpr int kBusyTimeoutMs = 10000;
+
+struct FoundFile {
+    std::string path;
+    int64_t mtime = 0;
+};
+
+struct KnownRow {
+    int64_t mtime = 0;
+    bool seen = false;
+};
+
+void MakeParentDirs(const std::string& file) {
+    for (std::size_t i = 1; i < file.size(); ++i) {
+        if (file[i] == '/')
+            mkdir(file.substr(0, i).c_str(), 0755);
+    }
+}
+
+// Depth-first walk that never follows a symbolic link and skips hidden names (".", "..",
+// ".Trash", the "@eaDir"-style system folders start with "@" and are skipped too).
+void WalkFolder(int dirFd, const std::string& path, int depth, std::vector<FoundFile>& found) {
+    DIR* dir = fdopendir(dirFd);
+    if (dir == nullptr) {
+        close(dirFd);
+        return;
+    }
+    while (const dirent* entry = readdir(dir)) {
+        const char* name = entry->d_name;
+        if (name[0] == '.' || name[0] == '@')
+            continue;
+        struct stat st {};
+        if (fstatat(dirfd(dir), name, &st, AT_SYMLINK_NOFOLLOW) != 0)
+            continue;
+        const std::string child = path + "/" + name;
+        if (S_ISDIR(st.st_mode) && depth < kMaxFolderDepth) {
+            const int childFd =
+                openat(dirfd(dir), name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+            if (childFd >= 0)
+                WalkFolder(childFd, child, depth + 1, found);
+        } else if (S_ISREG(st.st_mode) && medialib::IsIndexableAudioFile(child)) {
+            found.push_back({child, static_cast<int64_t>(st.st_mtime)});
+        }
+    }
+    closedir(dir);
+}
+
+std::unordered_map<std::string, KnownRow> LoadKnownRows(Database& db) {
+    std::unordered_map<std::string, KnownRow> known;
+    Statement stmt = db.Prepare("SELECT path, mtime FROM track");
+    while (stmt && stmt.Step() == SQLITE_ROW)
+        known[std::string(stmt.ColumnText(0))] = KnownRow{stmt.ColumnInt64(1), false};
+    return known;
+}
+
+void BindOptionalText(Statement& stmt, int index, const std::string& text) {
+    if (text.empty())
+        stmt.BindNull(index);
+    else
+        stmt.Bind(index, text);
+}
+
+void BindOptionalNumber(Statement& stmt, int index, int64_t value) {
+    if (value <= 0)
+        stmt.BindNull(index);
+    else
+        stmt.Bind(index, value);
+}
+
+// Reads the batch's tags (outside any transaction: the slow part), then writes the batch in one.
+bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFile*>& batch,
+                IndexReport& report) {
+    std::vector<TrackTags> tags;
+    tags.reserve(batch.size());
+    for (const FoundFile* file : batch) {
+        tags.push_back(ReadTrackTags(file->path));
+        ++report.tagReads;
+        if (tags.back().broken) {
+            ++report.brokenTags;
+            syslog(LOG_WARNING, "unreadable tags, indexed by file name: %s", file->path.c_str());
+        }
+    }
+    const int64_t now = static_cast<int64_t>(std::time(nullptr));
+    if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
+        return false;
+    for (std::size_t i = 0; i < batch.size(); ++i) {
+        const TrackTags& t = tags[i];
+        upsert.Reset();
+        upsert.Bind(1, batch[i]->path);
+        upsert.Bind(2, t.title);
+        BindOptionalText(upsert, 3, t.artist);
+        BindOptionalText(upsert, 4, t.album);
+        BindOptionalText(upsert, 5, t.albumArtist);
+        BindOptionalText(upsert, 6, t.genre);
+        BindOptionalNumber(upsert, 7, t.year);
+        BindOptionalNumber(upsert, 8, t.trackNo);
+        BindOptionalNumber(upsert, 9, t.discNo);
+        BindOptionalNumber(upsert, 10, t.durationMs);
+        upsert.Bind(11, batch[i]->mtime);
+        upsert.Bind(12, now);
+        if (upsert.Step() != SQLITE_DONE) {
+            (db.Execute("ROLLBACK") == SQLITE_OK);
+            return false;
+        }
+    }
+    return (db.Execute("COMMIT") == SQLITE_OK);
+}
+
+bool RemoveRows(Database& db, const std::vector<std::string>& gone) {
+    Statement remove = db.Prepare("DELETE FROM track WHERE path = ?1");
+    if (!remove)
+        return false;
+    for (std::size_t start = 0; start < gone.size(); start += kIndexBatchSize) {
+        if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
+            return false;
+        for (std::size_t i = start; i < gone.size() && i < start + kIndexBatchSize; ++i) {
+            remove.Reset();
+            remove.Bind(1, gone[i]);
+            if (remove.Step() != SQLITE_DONE) {
+                (db.Execute("ROLLBACK") == SQLITE_OK);
+                return false;
+            }
+        }
+        if (!(db.Execute("COMMIT") == SQLITE_OK))
+            return false;
+    }
+    return true;
+}
+
+IndexReport Fail(IndexReport report, const std::string& why) {
+    report.ok = false;
+    report.error = why;
+    return report;
+}
+
+}  // namespace
+
+IndexReport IndexShare(const std::string& share, const std::string& dbPath) {
+    IndexReport report;
+    const int shareFd = open(share.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    if (shareFd < 0)
+        return Fail(report, "the audio share " + share + " is not a readable folder");
+
+    MakeParentDirs(dbPath);
+    Database db =
+        Database::Open(dbPath.c_str(), SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, kBusyTimeoutMs);
+    if (!db) {
+        close(shareFd);
+        return Fail(report, "cannot open " + dbPath + ": " + db.Error());
+    }
+    if (!medialib::EnsureLibrarySchema(db)) {
+        close(shareFd);
+        return Fail(report, "cannot create the schema of " + dbPath + ": " + db.Error());
+    }
+
+    std::vector<FoundFile> found;
+    WalkFolder(shareFd, share, 0, found);
+    report.filesSeen = found.size();
+
+    std::unordered_map<std::string, KnownRow> known = LoadKnownRows(db);
+    std::vector<const FoundFile*> toRead;
+    for (const FoundFile& file : found) {
+        auto row = known.find(file.path);
+        if (row == known.end()) {
+            toRead.push_back(&file);
+            ++report.added;
+            continue;
+        }
+        row->second.seen = true;
+        if (row->second.mtime != file.mtime) {
+            toRead.push_back(&file);
+            ++report.updated;
+        }
+    }
+
+    // A re-read keeps the row's id and its "added" (the first time the file was seen).
+    Statement upsert = db.Prepare(
+        "INSERT INTO track (path, title, artist, album, album_artist, genre, year, track_no, "
+        "disc_no, duration_ms, mtime, added) VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, "
+        "?11, ?12) ON CONFLICT(path) DO UPDATE SET title = excluded.title, artist = "
+        "excluded.artist, album = excluded.album, album_artist = excluded.album_artist, genre = "
+        "excluded.genre, year = excluded.year, track_no = excluded.track_no, disc_no = "
+        "excluded.disc_no, duration_ms = excluded.duration_ms, mtime = excluded.mtime");
+    if (!upsert)
+        return Fail(report, "cannot prepare the track update: " + db.Error());
+    for (std::size_t start = 0; start < toRead.size(); start += kIndexBatchSize) {
+        const std::size_t end = std::min(toRead.size(), start + kIndexBatchSize);
+        const std::vector<const FoundFile*> batch(toRead.begin() + start, toRead.begin() + end);
+        if (!WriteBatch(db, upsert, batch, report))
+            return Fail(report, "cannot write tracks: " + db.Error());
+    }
+
+    std::vector<std::string> gone;
+    for (const auto& [path, row] : known) {
+        if (!row.seen)
+            gone.push_back(path);
+    }
+    report.removed = gone.size();
+    if (!RemoveRows(db, gone))
+        return Fail(report, "cannot remove tracks: " + db.Error());
+    report.ok = true;
+    return report;
+}
+
+std::string FormatReport(const IndexReport& report) {
+    char line[256];
+    std::snprintf(line, sizeof(line),
+                  "files=%zu added=%zu updated=%zu removed=%zu tagreads=%zu broken=%zu",
+                  report.filesSeen, report.added, report.updated, report.removed, report.tagReads,
+                  report.brokenTags);
+    return line;
+}
+
+}  // namespace harmona::index

@@ -1,0 +1,25 @@
+// harmona-index: one scan of the audio share into library.db (issue 8). Run it at start-up and
+// whenever the share changed; it prints one summary line and exits 0, or 1 on failure.
+#include <syslog.h>
+
+#include <cstdio>
+
+#include "Indexer.h"
+#include "MediaFiles.h"
+#include "PlatformPaths.h"
+
+int main() {
+    openlog("harmona-index", LOG_PID, LOG_DAEMON);
+    const std::string share = harmona::medialib::AudioSharePath();
+    const harmona::index::IndexReport report =
+        harmona::index::IndexShare(share, harmona::paths::kLibraryDb);
+    if (!report.ok) {
+        syslog(LOG_ERR, "indexing %s failed: %s", share.c_str(), report.error.c_str());
+        std::fprintf(stderr, "harmona-index: %s\n", report.error.c_str());
+        return 1;
+    }
+    const std::string summary = harmona::index::FormatReport(report);
+    syslog(LOG_INFO, "indexed %s: %s", share.c_str(), summary.c_str());
+    std::printf("%s\n", summary.c_str());
+    return 0;
+}

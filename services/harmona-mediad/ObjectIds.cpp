@@ -1,0 +1,158 @@
+#include "ObjectIds.h"
+
+#include <cctype>
+#include <cstdlib>
+
+namespace harmona::mediad {
+namespace {
+
+constexpr const char* kCategories[] = {kAllMusicId, kFoldersId, kAlbumsId,      kAlbumArtistsId,
+                                       kGenresId,   kRandomId,  kLatestAlbumsId};
+
+bool StartsWith(const std::string& text, const char* prefix, std::string* rest) {
+    const std::string p(prefix);
+    if (text.compare(0, p.size(), p) != 0)
+        return false;
+    *rest = text.substr(p.size());
+    return true;
+}
+
+int HexValue(char c) {
+    if (c >= '0' && c <= '9')
+        return c - '0';
+    if (c >= 'A' && c <= 'F')
+        return c - 'A' + 10;
+    if (c >= 'a' && c <= 'f')
+        return c - 'a' + 10;
+    return -1;
+}
+
+// A relative folder path: non-empty parts, none "." or "..".
+bool ParseFolder(const std::string& escaped, std::string* folder) {
+    folder->clear();
+    std::size_t start = 0;
+    while (start <= escaped.size()) {
+        std::size_t end = escaped.find('/', start);
+        if (end == std::string::npos)
+            end = escaped.size();
+        std::string part;
+        if (!UnescapeIdPart(escaped.substr(start, end - start), &part) || part.empty() ||
+            part == "." || part == ".." || part.find('/') != std::string::npos)
+            return false;
+        if (!folder->empty())
+            *folder += '/';
+        *folder += part;
+        start = end + 1;
+    }
+    return !folder->empty();
+}
+
+}  // namespace
+
+std::string EscapeIdPart(const std::string& text) {
+    static const char kHex[] = "0123456789ABCDEF";
+    std::string out;
+    out.reserve(text.size());
+    for (const char c : text) {
+        const unsigned char byte = static_cast<unsigned char>(c);
+        if (std::isalnum(byte) || c == '.' || c == '_' || c == '~' || c == '-') {
+            out += c;
+        } else {
+            out += '%';
+            out += kHex[byte >> 4];
+            out += kHex[byte & 15];
+        }
+    }
+    return out;
+}
+
+bool UnescapeIdPart(const std::string& text, std::string* out) {
+    out->clear();
+    for (std::size_t i = 0; i < text.size(); ++i) {
+        if (text[i] != '%') {
+            out->push_back(text[i]);
+            continue;
+        }
+        if (i + 2 >= text.size())
+            return false;
+        const int high = HexValue(text[i + 1]);
+        const int low = HexValue(text[i + 2]);
+        if (high < 0 || low < 0)
+            return false;
+        out->push_back(static_cast<char>(high * 16 + low));
+        i += 2;
+    }
+    return true;
+}
+
+std::string FolderId(const std::string& relativePath) {
+    std::string id = "folder:";
+    std::size_t start = 0;
+    while (start <= relativePath.size()) {
+        std::size_t end = relativePath.find('/', start);
+        if (end == std::string::npos)
+            end = relativePath.size();
+        if (start > 0)
+            id += '/';
+        id += EscapeIdPart(relativePath.substr(start, end - start));
+        start = end + 1;
+    }
+    return id;
+}
+
+std::string AlbumId(const std::string& albumArtist, const std::string& album) {
+    return "album:" + EscapeIdPart(albumArtist) + "/" + EscapeIdPart(album);
+}
+
+std::string ArtistId(const std::string& albumArtist) {
+    return "artist:" + EscapeIdPart(albumArtist);
+}
+
+std::string GenreId(const std::string& genre) {
+    return "genre:" + EscapeIdPart(genre);
+}
+
+std::string TrackId(int64_t id) {
+    return "track:" + std::to_string(id);
+}
+
+ObjectRef ParseObjectId(const std::string& id) {
+    ObjectRef ref;
+    std::string rest;
+    if (id == kRootId) {
+        ref.kind = ObjectKind::Root;
+        return ref;
+    }
+    for (const char* category : kCategories) {
+        if (id == category) {
+            ref.kind = ObjectKind::Category;
+            ref.category = id;
+            return ref;
+        }
+    }
+    if (StartsWith(id, "folder:", &rest)) {
+        if (ParseFolder(rest, &ref.folder))
+            ref.kind = ObjectKind::Folder;
+    } else if (StartsWith(id, "album:", &rest)) {
+        const std::size_t slash = rest.find('/');
+        if (slash != std::string::npos && UnescapeIdPart(rest.substr(0, slash), &ref.albumArtist) &&
+            UnescapeIdPart(rest.substr(slash + 1), &ref.name) && !ref.name.empty())
+            ref.kind = ObjectKind::Album;
+    } else if (StartsWith(id, "artist:", &rest)) {
+        if (UnescapeIdPart(rest, &ref.albumArtist) && !ref.albumArtist.empty())
+            ref.kind = ObjectKind::Artist;
+    } else if (StartsWith(id, "genre:", &rest)) {
+        if (UnescapeIdPart(rest, &ref.name) && !ref.name.empty())
+            ref.kind = ObjectKind::Genre;
+    } else if (StartsWith(id, "track:", &rest)) {
+        const bool digits = !rest.empty() && rest.size() <= 18 &&
+                            rest.find_first_not_of("0123456789") == std::string::npos;
+        if (digits) {
+            ref.trackId = std::strtoll(rest.c_str(), nullptr, 10);
+            ref.kind = ObjectKind::Track;
+        }
+    }
+    return ref;
+}
+
+}  // namespace harmona::mediad

@@ -1,0 +1,46 @@
+// The media server's object ids. The root "0" and the seven categories of spec Part 3.1 are fixed;
+// the ids below them are stable across restarts and re-indexing (built from names and paths, not
+// from row order) and safe: only ASCII letters, digits and "._~-:/%" ever appear, every other byte
+// of a name is percent-encoded.
+#pragma once
+
+#include <cstdint>
+#include <string>
+
+namespace harmona::mediad {
+
+inline constexpr const char* kRootId = "0";
+inline constexpr const char* kAllMusicId = "music_all";
+inline constexpr const char* kFoldersId = "music_file";
+inline constexpr const char* kAlbumsId = "music_album";
+inline constexpr const char* kAlbumArtistsId = "music_aa";
+inline constexpr const char* kGenresId = "music_genre";
+inline constexpr const char* kRandomId = "random";
+inline constexpr const char* kLatestAlbumsId = "music_latestalbum";
+
+enum class ObjectKind { Invalid, Root, Category, Folder, Album, Artist, Genre, Track };
+
+struct ObjectRef {
+    ObjectKind kind = ObjectKind::Invalid;
+    std::string category;     // Category: its id
+    std::string folder;       // Folder: path relative to the share, no leading or trailing "/"
+    std::string albumArtist;  // Album: the album artist ("" when none); Artist: the name
+    std::string name;         // Album: the album; Genre: the genre
+    int64_t trackId = 0;      // Track
+};
+
+// Percent-encodes every byte outside [A-Za-z0-9._~-].
+std::string EscapeIdPart(const std::string& text);
+// The reverse; false on a malformed "%" sequence.
+bool UnescapeIdPart(const std::string& text, std::string* out);
+
+std::string FolderId(const std::string& relativePath);  // "folder:" + path, each part escaped
+std::string AlbumId(const std::string& albumArtist, const std::string& album);
+std::string ArtistId(const std::string& albumArtist);
+std::string GenreId(const std::string& genre);
+std::string TrackId(int64_t id);
+
+// Parses any id the server hands out; kind Invalid for anything else.
+ObjectRef ParseObjectId(const std::string& id);
+
+}  // namespace harmona::mediad

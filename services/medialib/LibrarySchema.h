@@ -1,0 +1,16 @@
+// The schema of library.db (platform.md section 6, PRAGMA user_version = 1): the music library
+// index and the shared playlists, plus the indexes the media server's queries use.
+#pragma once
+
+#include "sqlite/Database.h"
+
+namespace harmona::medialib {
+
+inline constexpr int kLibrarySchemaVersion = 1;
+
+// Creates whatever of the schema is missing (tables, indexes, user_version) in one transaction;
+// rows already there, the playlist tables' included, are never touched. False on failure, or when
+// the file carries a user_version other than 0 or 1.
+bool EnsureLibrarySchema(sqlite::Database& db);
+
+}  // namespace harmona::medialib

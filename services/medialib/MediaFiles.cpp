@@ -1,0 +1,61 @@
+#include "MediaFiles.h"
+
+#include <cctype>
+
+#include "AudioDaemon.h"
+#include "PlatformPaths.h"
+#include "VanuSystem.h"
+
+namespace harmona::medialib {
+namespace {
+
+struct MimeEntry {
+    const char* extension;
+    const char* mime;
+};
+constexpr MimeEntry kMimeTypes[] = {
+    {"mp3", "audio/mpeg"},  {"mp1", "audio/mpeg"},          {"mp2", "audio/mpeg"},
+    {"mpa", "audio/mpeg"},  {"m4a", "audio/mp4"},           {"m4b", "audio/mp4"},
+    {"m4p", "audio/mp4"},   {"aac", "audio/aac"},           {"ogg", "audio/ogg"},
+    {"flac", "audio/flac"}, {"wav", "audio/wav"},           {"aif", "audio/aiff"},
+    {"aiff", "audio/aiff"}, {"wma", "audio/x-ms-wma"},      {"ac3", "audio/ac3"},
+    {"ape", "audio/x-ape"}, {"ra", "audio/x-pn-realaudio"}, {"ram", "audio/x-pn-realaudio"},
+};
+
+}  // namespace
+
+std::string AudioSharePath() {
+    char buffer[4096];
+    std::string share = VANUAudioConfGet("audio_share_path", buffer, sizeof(buffer)) > 0
+                            ? std::string(buffer)
+                            : std::string(paths::kDefaultAudioShare);
+    while (share.size() > 1 && share.back() == '/')
+        share.pop_back();
+    return share;
+}
+
+bool IsIndexableAudioFile(const std::string& path) {
+    return IsSupportedAudioFile(1, path.c_str()) == 1;
+}
+
+std::string LowerExtension(const std::string& path) {
+    const std::size_t slash = path.rfind('/');
+    const std::size_t dot = path.rfind('.');
+    if (dot == std::string::npos || (slash != std::string::npos && dot < slash))
+        return {};
+    std::string extension = path.substr(dot + 1);
+    for (char& c : extension)
+        c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+    return extension;
+}
+
+const char* MimeTypeOfPath(const std::string& path) {
+    const std::string extension = LowerExtension(path);
+    for (const MimeEntry& entry : kMimeTypes) {
+        if (extension == entry.extension)
+            return entry.mime;
+    }
+    return "application/octet-stream";
+}
+
+}  // namespace harmona::medialib

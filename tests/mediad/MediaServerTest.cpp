@@ -1,0 +1,318 @@
+// Issue 8 item 2: harmona-mediad over the indexed generated share, browsed with an independent
+// client (hand-written SOAP over libcurl) and with the project's own browse library, and through
+// the real CGI.
+#include <arpa/inet.h>
+#include <gtest/gtest.h>
+#include <netinet/in.h>
+#include <poll.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <set>
+#include <string>
+
+#include "CgiRunner.h"
+#include "DMABrowse.h"
+#include "DMAParser.h"
+#include "Fixtures.h"
+#include "MediadTestKit.h"
+
+namespace harmona::test::mediad {
+namespace {
+
+const char* const kCategories[] = {"music_all",   "music_file", "music_album",      "music_aa",
+                                   "music_genre", "random",     "music_latestalbum"};
+
+std::vector<std::string> Titles(const BrowseReply& reply) {
+    std::vector<std::string> titles;
+    for (const DidlEntry& entry : reply.entries)
+        titles.push_back(entry.title);
+    return titles;
+}
+
+const DidlEntry* FindTitle(const BrowseReply& reply, const std::string& title) {
+    for (const DidlEntry& entry : reply.entries) {
+        if (entry.title == title)
+            return &entry;
+    }
+    return nullptr;
+}
+
+class Issue8_MediaServer : public ::testing::Test {
+  protected:
+    void SetUp() override {
+        MakeStandardShare();
+        const IndexRun run = RunIndexer();
+        ASSERT_EQ(run.exitStatus, 0) << run.output;
+        ASSERT_TRUE(server_.Start()) << "harmona-mediad did not come up";
+    }
+    ServerProcess server_;
+};
+
+TEST_F(Issue8_MediaServer, RootHoldsTheSevenCategoriesInOrder) {
+    const BrowseReply root = SoapBrowse("0");
+    ASSERT_EQ(root.httpStatus, 200) << root.raw;
+    ASSERT_EQ(root.entries.size(), 7u) << root.raw;
+    for (std::size_t i = 0; i < 7; ++i) {
+        EXPECT_EQ(root.entries[i].id, kCategories[i]);
+        EXPECT_EQ(root.entries[i].parentId, "0");
+        EXPECT_TRUE(root.entries[i].container);
+    }
+    EXPECT_EQ(root.numberReturned, 7);
+    EXPECT_EQ(root.totalMatches, 7);
+    EXPECT_EQ(root.entries[0].childCount, 5);  // all music
+}
+
+TEST_F(Issue8_MediaServer, AllMusicHoldsEveryTrackWithTagsAndAServedResource) {
+    const BrowseReply all = SoapBrowse("music_all");
+    ASSERT_EQ(all.entries.size(), 5u) << all.raw;
+    EXPECT_EQ(all.totalMatches, 5);
+    const DidlEntry* first = FindTitle(all, "First <Song> & \"more\"");
+    ASSERT_NE(first, nullptr) << all.raw;  // escaped on the wire, whole after parsing
+    EXPECT_FALSE(first->container);
+    EXPECT_EQ(first->parentId, "music_all");
+    EXPECT_EQ(first->upnpClass, "object.item.audioItem.musicTrack");
+    EXPECT_EQ(first->artist, "Band A");
+    EXPECT_EQ(first->album, "Alpha & Omega");
+    EXPECT_EQ(first->protocolInfo, "http-get:*:audio/flac:*");
+    EXPECT_EQ(first->res.rfind("http://192.0.2.1:50003/media/", 0), 0u) << first->res;
+    EXPECT_EQ(first->id.rfind("track:", 0), 0u);
+}
+
+TEST_F(Issue8_MediaServer, FoldersAreNestedAsOnTheShare) {
+    const BrowseReply top = SoapBrowse("music_file");
+    EXPECT_EQ(Titles(top), (std::vector<std::string>{"Jazz", "Rock", "Zulu"})) << top.raw;
+    const DidlEntry* jazz = FindTitle(top, "Jazz");
+    ASSERT_NE(jazz, nullptr);
+    EXPECT_TRUE(jazz->container);
+    EXPECT_EQ(jazz->childCount, 1);  // Blue
+    const BrowseReply jazzChildren = SoapBrowse(jazz->id);
+    ASSERT_EQ(jazzChildren.entries.size(), 1u) << jazzChildren.raw;  // notes.txt is no audio
+    const BrowseReply blue = SoapBrowse(jazzChildren.entries[0].id);
+    EXPECT_EQ(Titles(blue), (std::vector<std::string>{"Late", "Fourth"})) << blue.raw;
+    EXPECT_EQ(blue.entries[0].parentId, jazzChildren.entries[0].id);
+    const BrowseReply late = SoapBrowse(blue.entries[0].id);
+    EXPECT_EQ(Titles(late), (std::vector<std::string>{"Third"}));
+    // A folder's metadata names its parent folder.
+    const BrowseReply meta = SoapBrowse(blue.entries[0].id, "BrowseMetadata");
+    ASSERT_EQ(meta.entries.size(), 1u);
+    EXPECT_EQ(meta.entries[0].parentId, jazzChildren.entries[0].id);
+    EXPECT_EQ(meta.entries[0].title, "Late");
+}
+
+TEST_F(Issue8_MediaServer, AlbumsArtistsGenresRandomAndLatestAlbums) {
+    const BrowseReply albums = SoapBrowse("music_album");
+    EXPECT_EQ(Titles(albums), (std::vector<std::string>{"Alpha & Omega", "Blue"})) << albums.raw;
+    const BrowseReply alpha = SoapBrowse(albums.entries[0].id);
+    EXPECT_EQ(Titles(alpha), (std::vector<std::string>{"First <Song> & \"more\"", "Second"}));
+    EXPECT_EQ(albums.entries[0].childCount, 2);
+    EXPECT_EQ(albums.entries[0].artist, "Band A");
+
+    const BrowseReply artists = SoapBrowse("music_aa");
+    EXPECT_EQ(Titles(artists), (std::vector<std::string>{"Band A", "Trio"})) << artists.raw;
+    const BrowseReply trioAlbums = SoapBrowse(artists.entries[1].id);
+    EXPECT_EQ(Titles(trioAlbums), (std::vector<std::string>{"Blue"}));
+    EXPECT_EQ(trioAlbums.entries[0].id, albums.entries[1].id);  // the same album, the same id
+    EXPECT_EQ(trioAlbums.entries[0].parentId, artists.entries[1].id);
+    EXPECT_EQ(Titles(SoapBrowse(trioAlbums.entries[0].id)),
+              (std::vector<std::string>{"Third", "Fourth"}));  // track number order
+
+    const BrowseReply genres = SoapBrowse("music_genre");
+    EXPECT_EQ(Titles(genres), (std::vector<std::string>{"Jazz", "Pop", "Rock"})) << genres.raw;
+    EXPECT_EQ(Titles(SoapBrowse(genres.entries[1].id)), (std::vector<std::string>{"Zulu"}));
+
+    const BrowseReply random = SoapBrowse("random");
+    EXPECT_EQ(random.totalMatches, 5);
+    std::set<std::string> randomTitles;
+    for (const DidlEntry& entry : random.entries)
+        randomTitles.insert(entry.title);
+    EXPECT_EQ(randomTitles.size(), 5u);
+
+    const BrowseReply latest = SoapBrowse("music_latestalbum");
+    EXPECT_EQ(latest.totalMatches, 2);
+    std::vector<std::string> latestTitles = Titles(latest);
+    std::sort(latestTitles.begin(), latestTitles.end());
+    EXPECT_EQ(latestTitles, (std::vector<std::string>{"Alpha & Omega", "Blue"}));
+}
+
+TEST_F(Issue8_MediaServer, PagingGivesTheRequestedSliceAndTheTotal) {
+    const BrowseReply all = SoapBrowse("music_all");
+    ASSERT_EQ(all.entries.size(), 5u);
+    const BrowseReply page = SoapBrowse("music_all", "BrowseDirectChildren", 1, 2);
+    EXPECT_EQ(page.numberReturned, 2);
+    EXPECT_EQ(page.totalMatches, 5);
+    ASSERT_EQ(page.entries.size(), 2u);
+    EXPECT_EQ(page.entries[0].id, all.entries[1].id);
+    EXPECT_EQ(page.entries[1].id, all.entries[2].id);
+    const BrowseReply past = SoapBrowse("music_all", "BrowseDirectChildren", 9, 2);
+    EXPECT_EQ(past.numberReturned, 0);
+    EXPECT_EQ(past.totalMatches, 5);
+    const BrowseReply tail = SoapBrowse("music_file", "BrowseDirectChildren", 2, 10);
+    EXPECT_EQ(Titles(tail), (std::vector<std::string>{"Zulu"}));
+    EXPECT_EQ(tail.totalMatches, 3);
+}
+
+TEST_F(Issue8_MediaServer, SortCriteriaOnTitleBothWays) {
+    const std::vector<std::string> ascending = {"First <Song> & \"more\"", "Fourth", "Second",
+                                                "Third", "Zulu"};
+    EXPECT_EQ(Titles(SoapBrowse("music_all", "BrowseDirectChildren", 0, 0, "+dc:title")),
+              ascending);
+    std::vector<std::string> descending(ascending.rbegin(), ascending.rend());
+    EXPECT_EQ(Titles(SoapBrowse("music_all", "BrowseDirectChildren", 0, 0, "-dc:title")),
+              descending);
+    EXPECT_EQ(Titles(SoapBrowse("music_file", "BrowseDirectChildren", 0, 0, "-dc:title")),
+              (std::vector<std::string>{"Zulu", "Rock", "Jazz"}));
+    EXPECT_EQ(SoapBrowse("music_all", "BrowseDirectChildren", 0, 0, "+upnp:artist").upnpError, 709);
+    EXPECT_EQ(SoapSimpleAction("GetSortCapabilities", "SortCaps"), "dc:title");
+    EXPECT_EQ(SoapSimpleAction("GetSearchCapabilities", "SearchCaps"), "");
+    EXPECT_NE(SoapSimpleAction("GetSystemUpdateID", "Id"), "<failed>");
+}
+
+TEST_F(Issue8_MediaServer, MetadataOfAnItemAndOfACategory) {
+    const BrowseReply all = SoapBrowse("music_all");
+    ASSERT_FALSE(all.entries.empty());
+    const BrowseReply item = SoapBrowse(all.entries[0].id, "BrowseMetadata");
+    ASSERT_EQ(item.entries.size(), 1u) << item.raw;
+    EXPECT_EQ(item.entries[0].title, all.entries[0].title);
+    EXPECT_EQ(item.totalMatches, 1);
+    const BrowseReply category = SoapBrowse("music_genre", "BrowseMetadata");
+    ASSERT_EQ(category.entries.size(), 1u);
+    EXPECT_EQ(category.entries[0].parentId, "0");
+    EXPECT_EQ(category.entries[0].childCount, 3);
+}
+
+TEST_F(Issue8_MediaServer, UnknownObjectIdsGetError701) {
+    for (const char* id : {"nope", "album:%ZZ/x", "genre:Polka", "track:999999", "folder:..",
+                           "folder:Nowhere", "music_all/../x"}) {
+        SCOPED_TRACE(id);
+        const BrowseReply reply = SoapBrowse(id);
+        EXPECT_EQ(reply.httpStatus, 500);
+        EXPECT_EQ(reply.upnpError, 701) << reply.raw;
+    }
+    EXPECT_EQ(SoapBrowse("track:999999", "BrowseMetadata").upnpError, 701);
+}
+
+TEST_F(Issue8_MediaServer, RangeGetOfAResourceServesTheIndexedFile) {
+    const BrowseReply all = SoapBrowse("music_all");
+    const DidlEntry* fourth = FindTitle(all, "Fourth");
+    ASSERT_NE(fourth, nullptr);
+    const std::string file = ReadFile(std::string(kShare) + "/Jazz/Blue/04 Fourth.wav");
+    ASSERT_GT(file.size(), 100u);
+    const HttpReply part = HttpGet(fourth->res, "10-49");
+    EXPECT_EQ(part.status, 206);
+    EXPECT_EQ(part.contentType, "audio/wav");
+    EXPECT_EQ(part.body, file.substr(10, 40));
+    const HttpReply whole = HttpGet(fourth->res);
+    EXPECT_EQ(whole.status, 200);
+    EXPECT_EQ(whole.body, file);
+    // Only files of the index, by id: no path of the request is ever opened.
+    const std::string base = fourth->res.substr(0, fourth->res.rfind('/') + 1);
+    EXPECT_EQ(HttpGet(base + "999999.wav").status, 404);
+    // libupnp answers 500 where it has no file to give (no web root is set): refused either way.
+    const HttpReply traversal = HttpGet(base + "..%2F..%2Fetc%2Fpasswd");
+    EXPECT_GE(traversal.status, 400);
+    EXPECT_EQ(traversal.body.find("root:"), std::string::npos);
+    const HttpReply byPath = HttpGet("http://192.0.2.1:50003/volume1/music/loose.ogg");
+    EXPECT_GE(byPath.status, 400);
+    EXPECT_EQ(byPath.body.find("OggS"), std::string::npos);
+}
+
+TEST_F(Issue8_MediaServer, TheProjectsBrowseLibraryListsEveryCategory) {
+    for (const char* category : kCategories) {
+        SCOPED_TRACE(category);
+        DMABrowse browse(BrowseDirectChildren, kControlUrl);
+        browse.objectId = category;
+        ASSERT_EQ(browse.Prepare(), 0);
+        DMAParser parser;
+        ASSERT_EQ(parser.Parse(&browse), 0) << parser.Error();
+        const BrowseReply independent = SoapBrowse(category);
+        ASSERT_NE(parser.GetResult(), nullptr);
+        ASSERT_EQ(parser.GetResult()->size(), independent.entries.size());
+        if (std::string(category) == "random")
+            continue;  // a new draw each time
+        for (std::size_t i = 0; i < independent.entries.size(); ++i) {
+            EXPECT_EQ((*parser.GetResult())[i]->getValueByKey("id"), independent.entries[i].id);
+            EXPECT_EQ((*parser.GetResult())[i]->getValueByKey("title"),
+                      independent.entries[i].title);
+        }
+    }
+}
+
+TEST_F(Issue8_MediaServer, PidFileWhileRunningAndGoneAfterStop) {
+    ASSERT_TRUE(Exists(kPidFile));
+    EXPECT_EQ(std::atol(ReadFile(kPidFile).c_str()), server_.pid());
+    EXPECT_EQ(server_.Stop(), 0);
+    EXPECT_FALSE(Exists(kPidFile));
+}
+
+TEST_F(Issue8_MediaServer, TheDeviceAnswersAnSsdpSearchOnTheNetwork) {
+    const int s = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    ASSERT_GE(s, 0);
+    sockaddr_in local{};
+    local.sin_family = AF_INET;
+    inet_pton(AF_INET, "192.0.2.2", &local.sin_addr);
+    ASSERT_EQ(bind(s, reinterpret_cast<sockaddr*>(&local), sizeof(local)), 0);
+    in_addr interfaceAddress{};
+    inet_pton(AF_INET, "192.0.2.2", &interfaceAddress);
+    setsockopt(s, IPPROTO_IP, IP_MULTICAST_IF, &interfaceAddress, sizeof(interfaceAddress));
+    const std::string search =
+        "M-SEARCH * HTTP/1.1\r\nHOST: 239.255.255.250:1900\r\nMAN: \"ssdp:discover\"\r\nMX: 1\r\n"
+        "ST: urn:schemas-upnp-org:device:MediaServer:1\r\n\r\n";
+    sockaddr_in group{};
+    group.sin_family = AF_INET;
+    group.sin_port = htons(1900);
+    inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
+    ASSERT_GT(sendto(s, search.data(), search.size(), 0, reinterpret_cast<sockaddr*>(&group),
+                     sizeof(group)),
+              0);
+    std::string answer;
+    pollfd pfd{s, POLLIN, 0};
+    while (answer.find("LOCATION") == std::string::npos && poll(&pfd, 1, 5000) > 0) {
+        char buffer[2048];
+        const ssize_t got = recv(s, buffer, sizeof(buffer), 0);
+        if (got <= 0)
+            break;
+        answer.assign(buffer, static_cast<std::size_t>(got));
+    }
+    close(s);
+    EXPECT_NE(answer.find("LOCATION: http://192.0.2.1:50003/"), std::string::npos) << answer;
+    EXPECT_NE(answer.find("urn:schemas-upnp-org:device:MediaServer:1"), std::string::npos);
+}
+
+TEST_F(Issue8_MediaServer, TheRealCgiListsTheAlbumsOfTheShare) {
+    StandardFixture();
+    const CgiResult r = Get(Query({{"action", "gettreenode"}, {"node", "musiclib_music_album"}}));
+    ASSERT_TRUE(r.jsonOk) << r.body;
+    ASSERT_EQ(r.json.size(), 2u) << r.body;
+    EXPECT_EQ(r.json[0]["text"].asString(), "Alpha &amp; Omega");
+    EXPECT_EQ(r.json[1]["text"].asString(), "Blue");
+    EXPECT_EQ(r.json[0]["pid"].asString(), "musiclib_music_album");
+    // One level further: the album's tracks, by the node id the tree made.
+    const CgiResult tracks =
+        Get(Query({{"action", "gettreenode"}, {"node", r.json[1]["id"].asString()}}));
+    ASSERT_TRUE(tracks.jsonOk) << tracks.body;
+    ASSERT_EQ(tracks.json.size(), 2u) << tracks.body;
+    EXPECT_EQ(tracks.json[0]["text"].asString(), "Third");
+}
+
+TEST_F(Issue8_MediaServer, TheRootTreeShowsTheLibraryExactlyWhileTheServerRuns) {
+    StandardFixture();
+    const auto ids = [] {
+        const CgiResult r = Get(Query({{"action", "gettreenode"}, {"node", "audiotree_root"}}));
+        std::vector<std::string> found;
+        for (const auto& node : r.json)
+            found.push_back(node["id"].asString());
+        return found;
+    };
+    const std::vector<std::string> running = ids();
+    ASSERT_FALSE(running.empty());
+    EXPECT_EQ(running[0], "musiclib_root");
+    ASSERT_EQ(server_.Stop(), 0);
+    const std::vector<std::string> stopped = ids();
+    EXPECT_TRUE(std::find(stopped.begin(), stopped.end(), "musiclib_root") == stopped.end());
+    EXPECT_FALSE(stopped.empty());
+}
+
+}  // namespace
+}  // namespace harmona::test::mediad

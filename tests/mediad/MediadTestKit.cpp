@@ -1,0 +1,298 @@
+#include "MediadTestKit.h"
+
+#include <curl/curl.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <taglib/fileref.h>
+#include <taglib/tag.h>
+#include <taglib/tpropertymap.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <pugixml.hpp>
+#include <sstream>
+#include <thread>
+
+#include "Fixtures.h"
+
+namespace harmona::test::mediad {
+namespace {
+
+std::string Quoted(const std::string& text) {
+    return "'" + text + "'";  // the kit's own names never hold a single quote
+}
+
+void Run(const std::string& command) {
+    if (std::system(command.c_str()) != 0)
+        std::fprintf(stderr, "mediad test kit: command failed: %s\n", command.c_str());
+}
+
+size_t Collect(char* data, size_t size, size_t count, void* out) {
+    static_cast<std::string*>(out)->append(data, size * count);
+    return size * count;
+}
+
+std::string LocalName(const char* name) {
+    const char* colon = std::strrchr(name, ':');
+    return colon != nullptr ? colon + 1 : name;
+}
+
+pugi::xml_node FindLocal(pugi::xml_node node, const char* localName) {
+    for (pugi::xml_node child : node.children()) {
+        if (LocalName(child.name()) == localName)
+            return child;
+        if (pugi::xml_node found = FindLocal(child, localName))
+            return found;
+    }
+    return {};
+}
+
+std::string Escape(const std::string& text) {
+    std::string out;
+    for (char c : text) {
+        if (c == '&')
+            out += "&amp;";
+        else if (c == '<')
+            out += "&lt;";
+        else if (c == '>')
+            out += "&gt;";
+        else
+            out += c;
+    }
+    return out;
+}
+
+std::string Post(const std::string& action, const std::string& arguments, long* status) {
+    const std::string body =
+        "<?xml version=\"1.0\" encoding=\"utf-8\"?>\n"
+        "<s:Envelope xmlns:s=\"http://schemas.xmlsoap.org/soap/envelope/\" "
+        "s:encodingStyle=\"http://schemas.xmlsoap.org/soap/encoding/\"><s:Body><u:" +
+        action + " xmlns:u=\"urn:schemas-upnp-org:service:ContentDirectory:1\">" + arguments +
+        "</u:" + action + "></s:Body></s:Envelope>";
+    std::string reply;
+    CURL* curl = curl_easy_init();
+    curl_slist* headers = nullptr;
+    headers = curl_slist_append(headers, "Content-Type: text/xml; charset=\"utf-8\"");
+    const std::string soapAction =
+        "SOAPACTION: \"urn:schemas-upnp-org:service:ContentDirectory:1#" + action + "\"";
+    headers = curl_slist_append(headers, soapAction.c_str());
+    curl_easy_setopt(curl, CURLOPT_URL, kControlUrl);
+    curl_easy_setopt(curl, CURLOPT_HTTPHEADER, headers);
+    curl_easy_setopt(curl, CURLOPT_POSTFIELDS, body.c_str());
+    curl_easy_setopt(curl, CURLOPT_WRITEFUNCTION, Collect);
+    curl_easy_setopt(curl, CURLOPT_WRITEDATA, &reply);
+    curl_easy_setopt(curl, CURLOPT_TIMEOUT, 30L);
+    *status = 0;
+    if (curl_easy_perform(curl) == CURLE_OK)
+        curl_easy_getinfo(curl, CURLINFO_RESPONSE_CODE, status);
+    curl_slist_free_all(headers);
+    curl_easy_cleanup(curl);
+    return reply;
+}
+
+long NumberOf(pugi::xml_node node) {
+    return node ? std::atol(node.text().get()) : -1;
+}
+
+}  // namespace
+
+void WriteTags(const std::string& path, const Tags& tags) {
+    TagLib::FileRef file(path.c_str());
+    if (file.isNull() || file.tag() == nullptr) {
+        std::fprintf(stderr, "mediad test kit: TagLib cannot open %s\n", path.c_str());
+        return;
+    }
+    TagLib::Tag* tag = file.tag();
+    tag->setTitle(TagLib::String(tags.title, TagLib::String::UTF8));
+    tag->setArtist(TagLib::String(tags.artist, TagLib::String::UTF8));
+    tag->setAlbum(TagLib::String(tags.album, TagLib::String::UTF8));
+    tag->setGenre(TagLib::String(tags.genre, TagLib::String::UTF8));
+    tag->setYear(tags.year);
+    tag->setTrack(tags.track);
+    TagLib::PropertyMap properties = file.file()->properties();
+    if (!tags.albumArtist.empty())
+        properties.replace("ALBUMARTIST", TagLib::StringList(TagLib::String(tags.albumArtist,
+                                                                            TagLib::String::UTF8)));
+    if (tags.disc > 0)
+        properties.replace("DISCNUMBER", TagLib::StringList(TagLib::String::number(tags.disc)));
+    file.file()->setProperties(properties);
+    file.save();
+}
+
+void MakeAudioFile(const std::string& path, const Tags& tags) {
+    MakeDirs(path.substr(0, path.rfind('/')));
+    Run("sox -q -n -r 8000 -c 1 " + Quoted(path) + " synth 0.3 sine 440");
+    WriteTags(path, tags);
+}
+
+const std::map<std::string, Tags>& StandardShare() {
+    static const std::map<std::string, Tags> share = {
+        {"Rock/Alpha & Omega/01 First.flac",
+         {"First <Song> & \"more\"", "Band A", "Alpha & Omega", "Band A", "Rock", 2001, 1, 1}},
+        {"Rock/Alpha & Omega/02 Second.ogg",
+         {"Second", "Band A feat. X", "Alpha & Omega", "Band A", "Rock", 2001, 2, 1}},
+        {"Jazz/Blue/Late/03 Third.mp3", {"Third", "Trio", "Blue", "", "Jazz", 1999, 3, 0}},
+        {"Jazz/Blue/04 Fourth.wav", {"Fourth", "Trio", "Blue", "", "Jazz", 1999, 4, 0}},
+        {"loose.ogg", {"Zulu", "Solo", "", "", "Pop", 0, 0, 0}},
+    };
+    return share;
+}
+
+void MakeStandardShare() {
+    for (const auto& [relative, tags] : StandardShare())
+        MakeAudioFile(std::string(kShare) + "/" + relative, tags);
+    WriteFile(std::string(kShare) + "/Jazz/notes.txt", "not audio\n");
+}
+
+IndexRun RunIndexer() {
+    IndexRun run;
+    FILE* pipe = popen(HARMONA_INDEX_PATH " 2>&1", "r");
+    if (pipe == nullptr)
+        return run;
+    char buffer[4096];
+    while (std::fgets(buffer, sizeof(buffer), pipe) != nullptr)
+        run.output += buffer;
+    const int status = pclose(pipe);
+    run.exitStatus = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+    std::istringstream words(run.output);
+    std::string word;
+    while (words >> word) {
+        const std::size_t equals = word.find('=');
+        if (equals != std::string::npos)
+            run.counts[word.substr(0, equals)] = std::atol(word.c_str() + equals + 1);
+    }
+    return run;
+}
+
+void SetUpNetwork() {
+    if (std::system("ip link show hm0 >/dev/null 2>&1") == 0)
+        return;
+    Run("ip link add hm0 type veth peer name hm1");
+    Run("echo 1 > /proc/sys/net/ipv6/conf/hm0/disable_ipv6");
+    Run("echo 1 > /proc/sys/net/ipv6/conf/hm1/disable_ipv6");
+    // Both ends live in this namespace: packets between them carry a local source address, which
+    // the kernel drops unless told to accept them (SSDP search and reply between hm1 and hm0).
+    for (const char* end : {"hm0", "hm1", "all"}) {
+        Run(std::string("echo 1 > /proc/sys/net/ipv4/conf/") + end + "/accept_local");
+        Run(std::string("echo 0 > /proc/sys/net/ipv4/conf/") + end + "/rp_filter");
+    }
+    Run("ip addr add 192.0.2.1/24 dev hm0 && ip addr add 192.0.2.2/24 dev hm1");
+    Run("ip link set hm0 up && ip link set hm1 up && ip link set lo multicast on");
+    Run("ip route add 239.0.0.0/8 dev hm0");
+}
+
+bool ServerProcess::Start() {
+    SetUpNetwork();
+    pid_ = fork();
+    if (pid_ == 0) {
+        execl(HARMONA_MEDIAD_PATH, HARMONA_MEDIAD_PATH, "--interface", kInterface,
+              static_cast<char*>(nullptr));
+        _exit(127);
+    }
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(10);
+    while (std::chrono::steady_clock::now() < deadline) {
+        int status = 0;
+        if (waitpid(pid_, &status, WNOHANG) == pid_) {
+            pid_ = -1;
+            return false;
+        }
+        if (Exists(kPidFile) && std::atol(ReadFile(kPidFile).c_str()) == pid_)
+            return true;
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    }
+    return false;
+}
+
+int ServerProcess::Stop() {
+    if (pid_ <= 0)
+        return -1;
+    kill(pid_, SIGTERM);
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(10);
+    int status = 0;
+    while (waitpid(pid_, &status, WNOHANG) == 0) {
+        if (std::chrono::steady_clock::now() > deadline) {
+            kill(pid_, SIGKILL);
+            waitpid(pid_, &status, 0);
+            pid_ = -1;
+            return -1;
+        }
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    }
+    pid_ = -1;
+    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
+BrowseReply SoapBrowse(const std::string& objectId, const std::string& flag, unsigned start,
+                       unsigned count, const std::string& sort) {
+    BrowseReply reply;
+    reply.raw = Post("Browse",
+                     "<ObjectID>" + Escape(objectId) + "</ObjectID><BrowseFlag>" + flag +
+                         "</BrowseFlag><Filter>*</Filter><StartingIndex>" + std::to_string(start) +
+                         "</StartingIndex><RequestedCount>" + std::to_string(count) +
+                         "</RequestedCount><SortCriteria>" + Escape(sort) + "</SortCriteria>",
+                     &reply.httpStatus);
+    pugi::xml_document envelope;
+    if (!envelope.load_string(reply.raw.c_str()))
+        return reply;
+    if (pugi::xml_node error = FindLocal(envelope, "errorCode")) {
+        reply.upnpError = std::atoi(error.text().get());
+        return reply;
+    }
+    reply.numberReturned = NumberOf(FindLocal(envelope, "NumberReturned"));
+    reply.totalMatches = NumberOf(FindLocal(envelope, "TotalMatches"));
+    reply.updateId = NumberOf(FindLocal(envelope, "UpdateID"));
+    pugi::xml_document didl;
+    if (!didl.load_string(FindLocal(envelope, "Result").text().get()))
+        return reply;
+    for (pugi::xml_node object : didl.first_child().children()) {
+        DidlEntry entry;
+        entry.container = std::string(object.name()) == "container";
+        entry.id = object.attribute("id").value();
+        entry.parentId = object.attribute("parentID").value();
+        entry.childCount =
+            object.attribute("childCount") ? object.attribute("childCount").as_int() : -1;
+        entry.title = object.child("dc:title").text().get();
+        entry.upnpClass = object.child("upnp:class").text().get();
+        entry.artist = object.child("upnp:artist").text().get();
+        entry.album = object.child("upnp:album").text().get();
+        entry.genre = object.child("upnp:genre").text().get();
+        entry.res = object.child("res").text().get();
+        entry.protocolInfo = object.child("res").attribute("protocolInfo").value();
+        reply.entries.push_back(entry);
+    }
+    return reply;
+}
+
+std::string SoapSimpleAction(const std::string& action, const std::string& outArgument) {
+    long status = 0;
+    const std::string raw = Post(action, "", &status);
+    pugi::xml_document envelope;
+    if (status != 200 || !envelope.load_string(raw.c_str()))
+        return "<failed>";
+    pugi::xml_node out = FindLocal(envelope, outArgument.c_str());
+    return out ? out.text().get() : "<missing>";
+}
+
+HttpReply HttpGet(const std::string& url, const std::string& range) {
+    HttpReply reply;
+    CURL* curl = curl_easy_init();
+    curl_easy_setopt(curl, CURLOPT_URL, url.c_str());
+    curl_easy_setopt(curl, CURLOPT_WRITEFUNCTION, Collect);
+    curl_easy_setopt(curl, CURLOPT_WRITEDATA, &reply.body);
+    curl_easy_setopt(curl, CURLOPT_TIMEOUT, 30L);
+    if (!range.empty())
+        curl_easy_setopt(curl, CURLOPT_RANGE, range.c_str());
+    if (curl_easy_perform(curl) == CURLE_OK) {
+        curl_easy_getinfo(curl, CURLINFO_RESPONSE_CODE, &reply.status);
+        char* type = nullptr;
+        curl_easy_getinfo(curl, CURLINFO_CONTENT_TYPE, &type);
+        reply.contentType = type != nullptr ? type : "";
+    }
+    curl_easy_cleanup(curl);
+    return reply;
+}
+
+}  // namespace harmona::test::mediad

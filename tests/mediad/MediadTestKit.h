@@ -1,0 +1,87 @@
+// The test kit of issue 8: a generated audio share (sox makes the files, TagLib writes their tags),
+// the real harmona-index and harmona-mediad run as child processes, a network of two veth ends in
+// the test's namespace (libupnp will not run on loopback), and an independent ContentDirectory
+// client (a hand-written SOAP body over libcurl, the reply read with pugixml).
+#pragma once
+
+#include <sys/types.h>
+
+#include <cstdint>
+#include <map>
+#include <string>
+#include <vector>
+
+namespace harmona::test::mediad {
+
+inline constexpr const char* kShare = "/volume1/music";
+inline constexpr const char* kControlUrl = "http://127.0.0.1:50003/ContentDirectory/control";
+inline constexpr const char* kPidFile = "/run/vanu/service/3.pid";
+inline constexpr const char* kInterface = "hm0";
+
+struct Tags {
+    std::string title, artist, album, albumArtist, genre;
+    unsigned year = 0, track = 0, disc = 0;
+};
+
+// A short tone in the format of the path's extension (sox), then the tags (TagLib).
+void MakeAudioFile(const std::string& path, const Tags& tags);
+// Writes the tags into an existing file with TagLib.
+void WriteTags(const std::string& path, const Tags& tags);
+
+// The generated share: relative path -> tags.
+const std::map<std::string, Tags>& StandardShare();
+void MakeStandardShare();
+
+struct IndexRun {
+    int exitStatus = -1;
+    std::string output;
+    std::map<std::string, long> counts;  // files, added, updated, removed, tagreads, broken
+};
+IndexRun RunIndexer();
+
+// Two veth ends, hm0 (192.0.2.1, where the server runs) and hm1 (192.0.2.2), up, IPv6 off (its
+// duplicate address detection would delay libupnp's bind), multicast routed through hm0, and
+// packets between the two ends accepted although both addresses are local.
+void SetUpNetwork();
+
+// harmona-mediad as a child; Start waits for the pid file (up to 10 s).
+class ServerProcess {
+  public:
+    ~ServerProcess() { Stop(); }
+    bool Start();
+    // SIGTERM and wait (up to 10 s); the exit status, or -1.
+    int Stop();
+    pid_t pid() const { return pid_; }
+
+  private:
+    pid_t pid_ = -1;
+};
+
+struct DidlEntry {
+    bool container = false;
+    std::string id, parentId, title, upnpClass, artist, album, genre, res, protocolInfo;
+    long childCount = -1;
+};
+
+struct BrowseReply {
+    long httpStatus = 0;
+    int upnpError = 0;  // from a SOAP fault
+    std::vector<DidlEntry> entries;
+    long numberReturned = -1, totalMatches = -1, updateId = -1;
+    std::string raw;
+};
+
+BrowseReply SoapBrowse(const std::string& objectId,
+                       const std::string& flag = "BrowseDirectChildren", unsigned start = 0,
+                       unsigned count = 0, const std::string& sort = "");
+// Any action of ContentDirectory without arguments; the out argument's text.
+std::string SoapSimpleAction(const std::string& action, const std::string& outArgument);
+
+struct HttpReply {
+    long status = 0;
+    std::string contentType;
+    std::string body;
+};
+HttpReply HttpGet(const std::string& url, const std::string& range = "");
+
+}  // namespace harmona::test::mediad

@@ -1,0 +1,323 @@
+// The tree page: asks audiotree.cgi for the navigation tree and shows it, as the application's
+// left-hand side does. Plain DOM code; every server text is inserted with textContent.
+import { parseReply, decodeEntities, languageFromTags, safeIcon, isLazyContainer, nodesOf, REFRESH_TARGETS, BUTTON_IDS } from "./reply.js";
+import { LABELS, HTML_LANG } from "./labels.js";
+
+const CGI = "webapi/audiotree.cgi";
+const UILANG = "webapi/uilang.cgi";
+const BLANK = "3rdparty/Harmona/images/s.gif";
+// The keep-alive period; ?keepalive=SECONDS overrides it (the browser tests use a short one).
+const KEEPALIVE_MS = (() => {
+  const seconds = Number(new URLSearchParams(location.search).get("keepalive"));
+  return Number.isFinite(seconds) && seconds >= 1 ? seconds * 1000 : 4 * 60 * 1000;
+})();
+
+const page = {
+  language: "enu",
+  texts: {},     // the UI text tables of the user's language: {section: {key: text}}
+  fallback: {},  // the English ones, for a key that a language lacks
+  labels: LABELS.enu,
+  keepAlives: 0,
+};
+const nodeData = new WeakMap(); // li -> the node object as the server sent it
+const $ = (id) => document.getElementById(id);
+
+// --- requests --------------------------------------------------------------------------------------
+// One CGI request (urlencoded POST, platform.md section 3). Resolves to parseReply's result, or to
+// {kind: "http", status} / {kind: "offline"}.
+async function call(params) {
+  let response;
+  try {
+    response = await fetch(CGI, {
+      method: "POST",
+      body: new URLSearchParams(params),
+      credentials: "same-origin",
+      cache: "no-store",
+    });
+  } catch {
+    return { kind: "offline" };
+  }
+  const text = await response.text();
+  if (!response.ok) return { kind: "http", status: response.status };
+  if (text.trim() === "") return { kind: "http", status: response.status }; // the CGI printed nothing
+  return parseReply(text);
+}
+
+// --- status line -----------------------------------------------------------------------------------
+function format(template, values) {
+  return template.replace(/\{(\w+)\}/g, (_, name) => String(values[name] ?? ""));
+}
+function serverText(section, key) {
+  const pick = (table) => (table && table[section] && typeof table[section][key] === "string" ? table[section][key] : null);
+  return pick(page.texts) ?? pick(page.fallback);
+}
+function showStatus(message, isError = false) {
+  const status = $("status");
+  delete status.dataset.errinfo;
+  status.textContent = message;
+  status.classList.toggle("error", isError);
+  status.setAttribute("role", isError ? "alert" : "status");
+  status.title = "";
+}
+// Shows what went wrong with a reply that was not what the action expects.
+function showFailure(reply) {
+  if (reply.kind === "error") {
+    const { sec, key, line } = reply.errinfo;
+    showStatus(serverText(sec, key) ?? format(page.labels.unknownError, { sec, key }), true);
+    $("status").title = `${sec} / ${key}${line != null ? " : " + line : ""}`;
+    $("status").dataset.errinfo = `${sec}/${key}`;
+  } else if (reply.kind === "http" && reply.status === 401) {
+    showStatus(page.labels.sessionExpired, true);
+  } else if (reply.kind === "http") {
+    showStatus(format(page.labels.noReply, { status: reply.status }), true);
+  } else if (reply.kind === "offline") {
+    showStatus(page.labels.offline, true);
+  } else {
+    showStatus(page.labels.badReply, true);
+  }
+}
+
+// --- tree ------------------------------------------------------------------------------------------
+function renderNode(node, depth) {
+  const li = document.createElement("li");
+  li.setAttribute("role", "treeitem");
+  li.setAttribute("aria-selected", "false");
+  nodeData.set(li, node);
+  const id = typeof node.id === "string" ? node.id : "";
+  li.dataset.id = id;
+  if (depth === 0) li.classList.add("category");
+  if (BUTTON_IDS.has(id)) li.classList.add("button");
+
+  const row = document.createElement("div");
+  row.className = "row";
+  row.tabIndex = -1;
+  const twisty = document.createElement("span");
+  twisty.className = "twisty";
+  twisty.setAttribute("aria-hidden", "true");
+  const icon = document.createElement("img");
+  icon.className = "icon";
+  icon.alt = "";
+  icon.src = safeIcon(node.icon) ?? BLANK;
+  if (node.iconCls === "x-tree-hide-icon" || !safeIcon(node.icon)) icon.classList.add("hidden");
+  const label = document.createElement("span");
+  label.className = "label";
+  label.textContent = decodeEntities(node.text);
+  row.title = decodeEntities(node.qtip ?? node.text);
+  row.append(twisty, icon, label);
+  li.append(row);
+
+  const group = document.createElement("ul");
+  group.setAttribute("role", "group");
+  group.hidden = true;
+  li.append(group);
+  li.dataset.depth = String(depth);
+
+  if (Array.isArray(node.children)) {
+    li.setAttribute("aria-expanded", "false");
+    li.dataset.state = "inline";
+    if (node.expanded === true) expand(li);
+  } else if (isLazyContainer(node)) {
+    li.setAttribute("aria-expanded", "false");
+    li.dataset.state = "lazy";
+  }
+  return li;
+}
+
+function fillGroup(li, nodes) {
+  const group = li.querySelector(":scope > ul");
+  const depth = Number(li.dataset.depth) + 1;
+  group.replaceChildren(...nodes.map((node) => renderNode(node, depth)));
+  if (nodes.length === 0) showEmpty(li);
+}
+function showEmpty(li) {
+  const group = li.querySelector(":scope > ul");
+  const empty = document.createElement("li");
+  empty.className = "empty";
+  empty.setAttribute("role", "none");
+  empty.textContent = page.labels.empty;
+  group.replaceChildren(empty);
+}
+
+async function expand(li) {
+  const group = li.querySelector(":scope > ul");
+  const node = nodeData.get(li);
+  if (li.dataset.state === "inline") {
+    fillGroup(li, nodesOf(node.children));
+    li.dataset.state = "loaded";
+  } else if (li.dataset.state === "lazy" || li.dataset.state === "failed") {
+    li.dataset.state = "loading";
+    li.setAttribute("aria-busy", "true");
+    const reply = await call({ action: "gettreenode", node: node.id });
+    li.removeAttribute("aria-busy");
+    if (reply.kind === "nodes") {
+      fillGroup(li, reply.nodes);
+      li.dataset.state = "loaded";
+    } else {
+      li.dataset.state = "failed";
+      showFailure(reply);
+      return;
+    }
+  }
+  group.hidden = false;
+  li.setAttribute("aria-expanded", "true");
+}
+function collapse(li) {
+  li.querySelector(":scope > ul").hidden = true;
+  li.setAttribute("aria-expanded", "false");
+}
+function toggle(li) {
+  if (!li.hasAttribute("aria-expanded") || li.dataset.state === "loading") return;
+  if (li.getAttribute("aria-expanded") === "true") collapse(li);
+  else expand(li);
+}
+
+function select(li) {
+  for (const old of document.querySelectorAll('li[aria-selected="true"]')) old.setAttribute("aria-selected", "false");
+  li.setAttribute("aria-selected", "true");
+  const row = li.querySelector(":scope > .row");
+  row.focus();
+  const node = nodeData.get(li);
+  $("hint").hidden = true;
+  $("selected").hidden = false;
+  $("selected-text").textContent = decodeEntities(node.text);
+  $("selected-id").textContent = typeof node.id === "string" ? node.id : "";
+  $("selected-icon").src = safeIcon(node.icon) ?? BLANK;
+}
+
+// A refresh button: asks for the category's children again and puts them after its buttons.
+async function refresh(buttonLi) {
+  const target = REFRESH_TARGETS[buttonLi.dataset.id];
+  const category = buttonLi.parentElement.closest("li[role=treeitem]");
+  if (!category || category.getAttribute("aria-busy") === "true") return;
+  category.setAttribute("aria-busy", "true");
+  const reply = await call({ action: "refresh", target });
+  category.removeAttribute("aria-busy");
+  if (reply.kind !== "success") {
+    showFailure(reply);
+    return;
+  }
+  const group = category.querySelector(":scope > ul");
+  for (const child of [...group.children])
+    if (!(child.dataset.id && BUTTON_IDS.has(child.dataset.id))) child.remove();
+  const depth = Number(category.dataset.depth) + 1;
+  group.append(...reply.items.map((node) => renderNode(node, depth)));
+  category.dataset.refreshed = String(Number(category.dataset.refreshed ?? 0) + 1);
+  showStatus(page.labels.refreshed);
+}
+
+function activate(li) {
+  select(li);
+  if (REFRESH_TARGETS[li.dataset.id]) refresh(li);
+  else toggle(li);
+}
+
+function visibleRows() {
+  return [...document.querySelectorAll("#tree li[role=treeitem]")].filter((li) => li.offsetParent !== null);
+}
+function onKey(event) {
+  const li = event.target.closest("li[role=treeitem]");
+  if (!li) return;
+  const rows = visibleRows();
+  const at = rows.indexOf(li);
+  const expanded = li.getAttribute("aria-expanded");
+  switch (event.key) {
+    case "Enter": case " ": activate(li); break;
+    case "ArrowDown": if (rows[at + 1]) select(rows[at + 1]); break;
+    case "ArrowUp": if (at > 0) select(rows[at - 1]); break;
+    case "ArrowRight": if (expanded === "false") expand(li); break;
+    case "ArrowLeft":
+      if (expanded === "true") collapse(li);
+      else { const parent = li.parentElement.closest("li[role=treeitem]"); if (parent) select(parent); }
+      break;
+    default: return;
+  }
+  event.preventDefault();
+}
+
+// --- actions ---------------------------------------------------------------------------------------
+async function rerandom() {
+  const button = $("rerandom");
+  button.disabled = true;
+  const reply = await call({ action: "rerandom100" });
+  button.disabled = false;
+  if (reply.kind !== "success") {
+    showFailure(reply);
+    return;
+  }
+  showStatus(page.labels.rerandomDone);
+  document.body.dataset.rerandom = String(Number(document.body.dataset.rerandom ?? 0) + 1);
+  // The random container shows the new draw the next time it is opened.
+  for (const li of document.querySelectorAll('li[data-id="musiclib_random"]')) {
+    if (li.dataset.state === "loaded") {
+      li.dataset.state = "lazy";
+      if (li.getAttribute("aria-expanded") === "true") expand(li);
+    }
+  }
+}
+
+async function keepAlive() {
+  const reply = await call({ action: "avoid_timeout" });
+  page.keepAlives += 1;
+  document.body.dataset.keepalive = String(page.keepAlives);
+  if (reply.kind === "http" && reply.status === 401) showFailure(reply);
+}
+
+// --- start -----------------------------------------------------------------------------------------
+async function loadLanguage() {
+  try {
+    const response = await fetch(UILANG, { credentials: "same-origin", cache: "no-store" });
+    const reply = await response.json();
+    if (typeof reply.language === "string" && /^[a-z]{3}$/.test(reply.language)) return reply.language;
+  } catch {
+    // below
+  }
+  return languageFromTags(navigator.languages?.length ? navigator.languages : [navigator.language]);
+}
+async function loadTexts() {
+  try {
+    const response = await fetch("ui/texts.json", { credentials: "same-origin" });
+    return await response.json();
+  } catch {
+    return {};
+  }
+}
+
+async function start() {
+  const [language, texts] = await Promise.all([loadLanguage(), loadTexts()]);
+  page.language = language;
+  page.texts = texts[language] ?? texts.enu ?? {};
+  page.fallback = texts.enu ?? {};
+  page.labels = { ...LABELS.enu, ...(LABELS[language] ?? {}) };
+  document.documentElement.lang = HTML_LANG[language] ?? "en";
+  document.body.dataset.language = language;
+  document.title = page.labels.title;
+  $("title").textContent = page.labels.title;
+  $("tree").setAttribute("aria-label", page.labels.tree);
+  $("hint").textContent = page.labels.hint;
+  $("rerandom").textContent = page.labels.rerandom;
+  $("rerandom").addEventListener("click", rerandom);
+
+  const tree = $("tree");
+  tree.addEventListener("click", (event) => {
+    const li = event.target.closest("li[role=treeitem]");
+    if (!li) return;
+    if (event.target.classList.contains("twisty")) toggle(li);
+    else activate(li);
+  });
+  tree.addEventListener("keydown", onKey);
+
+  showStatus(page.labels.loading);
+  const reply = await call({ action: "gettreenode", node: "audiotree_root" });
+  const nodes = reply.kind === "nodes" ? reply.nodes : reply.kind === "error" || reply.kind === "success" ? reply.items : [];
+  tree.replaceChildren(...nodes.map((node) => renderNode(node, 0)));
+  tree.removeAttribute("aria-busy");
+  const first = tree.querySelector("li[role=treeitem] > .row");
+  if (first) first.tabIndex = 0;
+  if (reply.kind === "nodes") showStatus("");
+  else showFailure(reply);
+  $("rerandom").disabled = false;
+  document.body.dataset.ready = "true";
+  setInterval(keepAlive, KEEPALIVE_MS);
+}
+
+start();
