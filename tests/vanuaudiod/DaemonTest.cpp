@@ -12,6 +12,8 @@
 #include <cstring>
 #include <future>
 
+#include "DMABrowse.h"
+#include "DMAParser.h"
 #include "DaemonKit.h"
 #include "Fixtures.h"
 #include "HttpGet.h"
@@ -483,4 +485,86 @@ TEST_F(Vanuaudiod, CommandFourteenSendsANewSearch) {
     ASSERT_EQ(reply["list"].size(), 1u);
     EXPECT_EQ(reply["list"][0]["udn"], "uuid:quiet");
     EXPECT_GT(fake.SearchesSeen(), before);
+}
+
+// The storage server's own media server, harmona-mediad, found on the network beside MiniDLNA.
+namespace {
+
+Process StartMediad(PeerNetwork& peer) {
+    Process mediad = peer.SpawnOnPeer({HARMONA_MEDIAD_PATH, "--interface", kPeerInterface},
+                                      "/tmp/harmona-mediad.log");
+    // It writes its pid file once it serves (platform.md section 5, service 3).
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(10);
+    while (!Exists("/run/vanu/service/3.pid") && std::chrono::steady_clock::now() < deadline)
+        std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    EXPECT_TRUE(Exists("/run/vanu/service/3.pid")) << ReadFile("/tmp/harmona-mediad.log");
+    return mediad;
+}
+
+std::string HostName() {
+    char name[256] = {};
+    gethostname(name, sizeof(name) - 1);
+    return name;
+}
+
+constexpr const char* kMediadNodeId = "mediaserver_http://10.77.0.2:50003/ContentDirectory/control";
+
+}  // namespace
+
+TEST_F(Vanuaudiod, HarmonaMediadAndMiniDlnaBothAppearAsMediaServerNodesThroughTheCgi) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    Process mediad = StartMediad(peer_);
+    Process minidlna = StartMiniDlna(peer_, "Attic MiniDLNA", 8204);
+    RefreshMediaServers();  // the scan button
+    WaitForList([](const Json::Value& l) { return l.size() == 2; }, 15000);
+    const CgiResult refresh = RefreshMediaServers();
+    ASSERT_TRUE(refresh.jsonOk) << refresh.output;
+    const Json::Value& items = refresh.json["items"];
+    ASSERT_EQ(items.size(), 2u) << refresh.body << ReadFile("/tmp/vanuaudiod.log");
+    // Listed by friendly name: "Attic MiniDLNA" before "Harmona Music Library (...)".
+    EXPECT_EQ(items[0]["id"], "mediaserver_http://10.77.0.2:8204/ctl/ContentDir");
+    EXPECT_EQ(items[0]["text"], "Attic MiniDLNA");
+    EXPECT_EQ(items[1]["id"], kMediadNodeId);
+    EXPECT_EQ(items[1]["text"], "Harmona Music Library (" + HostName() + ")");
+    EXPECT_EQ(items[1]["pid"], "mediaserver_root");
+    // The control URLs the daemon lists are the real ContentDirectory endpoints: the project's
+    // browse library (platform.md section 9) browses the root of each.
+    const Json::Value list = Reply(Call(16, "0 10"))["list"];
+    ASSERT_EQ(list.size(), 2u);
+    for (const Json::Value& server : list) {
+        SCOPED_TRACE(server["control_url"].asString());
+        DMABrowse browse(BrowseDirectChildren, server["control_url"].asString());
+        browse.objectId = "0";
+        ASSERT_EQ(browse.Prepare(), 0);
+        DMAParser parser;
+        ASSERT_EQ(parser.Parse(&browse), 0) << parser.Error();
+        ASSERT_NE(parser.GetResult(), nullptr);
+        EXPECT_FALSE(parser.GetResult()->empty());
+    }
+    // harmona-mediad's root holds Part 3.1's seven categories.
+    DMABrowse browse(BrowseDirectChildren, list[1]["control_url"].asString());
+    browse.objectId = "0";
+    ASSERT_EQ(browse.Prepare(), 0);
+    DMAParser parser;
+    ASSERT_EQ(parser.Parse(&browse), 0) << parser.Error();
+    ASSERT_NE(parser.GetResult(), nullptr);
+    ASSERT_EQ(parser.GetResult()->size(), 7u);
+    EXPECT_EQ((*parser.GetResult())[0]->getValueByKey("id"), "music_all");
+}
+
+TEST_F(Vanuaudiod, AStoppedHarmonaMediadLeavesTheListAfterItsByebye) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    Process mediad = StartMediad(peer_);
+    RefreshMediaServers();
+    WaitForList([](const Json::Value& l) { return l.size() == 1; }, 15000);
+    const CgiResult before = RefreshMediaServers();
+    ASSERT_EQ(before.json["items"].size(), 1u) << before.body;
+    EXPECT_EQ(before.json["items"][0]["id"], kMediadNodeId);
+    EXPECT_EQ(mediad.Stop(SIGTERM, 10000), 0);
+    WaitForList([](const Json::Value& l) { return l.empty(); }, 5000);
+    const CgiResult after = RefreshMediaServers();
+    ASSERT_TRUE(after.jsonOk) << after.output;
+    EXPECT_EQ(after.json["items"].size(), 0u) << after.body;
 }
