@@ -1,4 +1,5 @@
 #include "MediaServer.h"
+#include "SoapBrowse.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -16,9 +17,13 @@
 #include <vector>
 
 #include "MediaFiles.h"
+#include "SoapBrowse.h"
 
 namespace harmona::mediad {
 namespace {
+
+// The same escaping as the browse library's requests (platform/dma).
+using harmona::dma::XmlEscape;
 
 constexpr const char* kContentDirectoryType = "urn:schemas-upnp-org:service:ContentDirectory:1";
 constexpr const char* kConnectionManagerType = "urn:schemas-upnp-org:service:ConnectionManager:1";
@@ -422,29 +427,6 @@ std::string MakeUdn() {
     hex.replace(0, 8, "4861726d");  // "Harm": differs from other devices of the same machine
     return "uuid:" + hex.substr(0, 8) + "-" + hex.substr(8, 4) + "-" + hex.substr(12, 4) + "-" +
            hex.substr(16, 4) + "-" + hex.substr(20, 12);
-}
-
-std::string XmlEscape(const std::string& text) {
-    std::string out;
-    for (const char c : text) {
-        switch (c) {
-            case '&':
-                out += "&amp;";
-                break;
-            case '<':
-                out += "&lt;";
-                break;
-            case '>':
-                out += "&gt;";
-                break;
-            case '"':
-                out += "&quot;";
-                break;
-            default:
-                out += c;
-        }
-    }
-    return out;
 }
 
 std::string HostName() {
