@@ -15,10 +15,7 @@
 // and /tmp holding the fixtures; nothing reaches the real machine but empty mount points.
 #include <fcntl.h>
 #include <sched.h>
-#include <spawn.h>
 #include <sys/mount.h>
-#include <sys/ptrace.h>
-#include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -35,8 +32,9 @@
 #include <string>
 #include <vector>
 
-#include "sqlite/Database.h"
+#include "BenchProcess.h"
 #include "Plugin.h"
+#include "sqlite/Database.h"
 
 namespace {
 
@@ -146,91 +144,15 @@ struct Program {
     std::vector<long> maxRssKb;  // peak resident memory (VmHWM) of one traced run
 };
 
-// Runs one CGI process to its end; returns its wall time in ms and its output.
-double RunOnce(const Program& program, std::string& output, long& maxRssKb) {
-    const std::vector<std::string> env = {"GATEWAY_INTERFACE=CGI/1.1", "REQUEST_METHOD=GET",
-                                          "QUERY_STRING=" + program.query,
-                                          "REMOTE_USER=" + program.user, "PATH=/usr/bin:/bin"};
-    std::vector<char*> envp;
-    for (const std::string& e : env)
-        envp.push_back(const_cast<char*>(e.c_str()));
-    envp.push_back(nullptr);
-    char* argv[] = {const_cast<char*>(program.path.c_str()), nullptr};
-
-    int out[2];
-    if (pipe2(out, O_CLOEXEC) != 0)
-        Die("pipe");
-    posix_spawn_file_actions_t actions;
-    posix_spawn_file_actions_init(&actions);
-    posix_spawn_file_actions_adddup2(&actions, out[1], 1);
-    posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
-
-    const auto start = std::chrono::steady_clock::now();
-    pid_t pid = 0;
-    if (posix_spawn(&pid, program.path.c_str(), &actions, nullptr, argv, envp.data()) != 0)
-        Die("spawn " + program.path);
-    close(out[1]);
-    output.clear();
-    char buffer[65536];
-    for (;;) {
-        const ssize_t n = read(out[0], buffer, sizeof(buffer));
-        if (n < 0 && errno == EINTR)
-            continue;
-        if (n <= 0)
-            break;
-        output.append(buffer, static_cast<std::size_t>(n));
-    }
-    int status = 0;
-    rusage usage{};
-    while (wait4(pid, &status, 0, &usage) < 0 && errno == EINTR) {
-    }
-    const auto end = std::chrono::steady_clock::now();
-    close(out[0]);
-    posix_spawn_file_actions_destroy(&actions);
-    maxRssKb = usage.ru_maxrss;
-    return std::chrono::duration<double, std::milli>(end - start).count();
+std::vector<std::string> Environment(const Program& program) {
+    return harmona::bench::CgiEnvironment(program.query, program.user);
 }
 
-// Peak resident memory of the program's own image: the child is traced, stopped at its exit, and
-// its VmHWM read then. (ru_maxrss would also count this big benchmark process, whose memory a
-// spawned child shares until its exec.) Output goes to /dev/null; not timed.
-long PeakMemoryKb(const Program& program) {
-    const std::vector<std::string> env = {"GATEWAY_INTERFACE=CGI/1.1", "REQUEST_METHOD=GET",
-                                          "QUERY_STRING=" + program.query,
-                                          "REMOTE_USER=" + program.user, "PATH=/usr/bin:/bin"};
-    std::vector<char*> envp;
-    for (const std::string& e : env)
-        envp.push_back(const_cast<char*>(e.c_str()));
-    envp.push_back(nullptr);
-    char* argv[] = {const_cast<char*>(program.path.c_str()), nullptr};
-    const pid_t pid = fork();
-    if (pid < 0)
-        Die("fork");
-    if (pid == 0) {
-        const int null = open("/dev/null", O_RDWR);
-        dup2(null, 0);
-        dup2(null, 1);
-        ptrace(PTRACE_TRACEME, 0, nullptr, nullptr);
-        execve(argv[0], argv, envp.data());
-        _exit(127);
-    }
-    int status = 0;
-    waitpid(pid, &status, 0);  // stopped after its exec
-    ptrace(PTRACE_SETOPTIONS, pid, nullptr, reinterpret_cast<void*>(PTRACE_O_TRACEEXIT));
-    ptrace(PTRACE_CONT, pid, nullptr, nullptr);
-    long peakKb = -1;
-    while (waitpid(pid, &status, 0) == pid && !WIFEXITED(status) && !WIFSIGNALED(status)) {
-        if (status >> 8 == (SIGTRAP | (PTRACE_EVENT_EXIT << 8))) {
-            std::ifstream in("/proc/" + std::to_string(pid) + "/status");
-            std::string line;
-            while (std::getline(in, line))
-                if (line.rfind("VmHWM:", 0) == 0)
-                    peakKb = std::atol(line.c_str() + 6);
-        }
-        const int signal = WIFSTOPPED(status) && WSTOPSIG(status) != SIGTRAP ? WSTOPSIG(status) : 0;
-        ptrace(PTRACE_CONT, pid, nullptr, reinterpret_cast<void*>(static_cast<long>(signal)));
-    }
-    return peakKb;
+// Runs one CGI process to its end; returns its wall time in ms and its output.
+double RunOnce(const Program& program, std::string& output) {
+    harmona::bench::ProcessRun run = harmona::bench::RunProcess(program.path, Environment(program));
+    output = std::move(run.output);
+    return run.wallMs;
 }
 
 template <typename T>
@@ -248,9 +170,8 @@ double Percentile(std::vector<double> v, double p) {
 // Runs `programs` in `runs` interleaved rounds (after a warm-up) and prints the figures.
 void Measure(const std::string& title, std::vector<Program>& programs, int runs) {
     std::string output;
-    long rss = 0;
     for (Program& program : programs) {
-        RunOnce(program, output, rss);
+        RunOnce(program, output);
         if (output.find(program.expect) == std::string::npos) {
             std::fprintf(stderr, "bench_playlists: %s: unexpected reply:\n%.2000s\n",
                          program.label.c_str(), output.c_str());
@@ -258,14 +179,15 @@ void Measure(const std::string& title, std::vector<Program>& programs, int runs)
         }
     }
     for (Program& program : programs)
-        program.maxRssKb.push_back(PeakMemoryKb(program));
+        program.maxRssKb.push_back(
+            harmona::bench::PeakMemoryKb(program.path, Environment(program)));
     for (int warm = 0; warm < 5; ++warm)
         for (Program& program : programs)
-            RunOnce(program, output, rss);
+            RunOnce(program, output);
     for (int round = 0; round < runs; ++round) {
         for (std::size_t k = 0; k < programs.size(); ++k) {
             Program& program = programs[(k + static_cast<std::size_t>(round)) % programs.size()];
-            program.ms.push_back(RunOnce(program, output, rss));
+            program.ms.push_back(RunOnce(program, output));
         }
     }
     const double trivialMedian = Median(programs[0].ms);
@@ -318,7 +240,6 @@ int main(int argc, char** argv) {
 
     const std::string trivial = dir + "bench_trivial_cgi";
     const std::string cgi = dir + "audiotree.cgi";
-    const std::string categoryCgi = dir + "bench_playlists_category_cgi";
     const std::string ok = "{\"success\":true}";
 
     std::vector<double> randomMedians;
@@ -356,29 +277,29 @@ int main(int argc, char** argv) {
     const std::string n = std::to_string(lists);
     std::vector<Program> listings = {
         {"trivial C CGI", trivial, "", "admin", ok, {}, {}},
-        {"personal category, " + n + " playlist files",
-         categoryCgi,
-         "category=personal",
+        {"refresh personal, " + n + " playlist files",
+         cgi,
+         "action=refresh&target=personal",
          "alice",
          "musiclib_music_personal/playlist/Playlist " + std::to_string(lists - 1),
          {},
          {}},
-        {"personal category, " + n + " smart playlists",
-         categoryCgi,
-         "category=personal",
+        {"refresh personal, " + n + " smart playlists",
+         cgi,
+         "action=refresh&target=personal",
          "bob",
          "musiclib_music_personal/smart/Smart " + std::to_string(lists - 1),
          {},
          {}},
-        {"shared category, " + n + " + " + n + " smart",
-         categoryCgi,
-         "category=shared",
+        {"refresh shared, " + n + " + " + n + " smart",
+         cgi,
+         "action=refresh&target=shared",
          "admin",
          "musiclib_music_shared/smart/Shared smart " + std::to_string(lists - 1),
          {},
          {}}};
     Measure(
-        "Playlist category listings (builders in a CGI process; root/refresh not yet connected)",
+        "Playlist listings through the real refresh request",
         listings, runs);
     return 0;
 }

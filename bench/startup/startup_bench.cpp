@@ -6,7 +6,6 @@
 // /usr/vanu holding the fixtures (users.conf, a text table, an iPod database written with libgpod
 // and its mountpoint file); nothing reaches the real machine but two empty mount points.
 #include <fcntl.h>
-#include <spawn.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -24,8 +23,9 @@
 #include <string>
 #include <vector>
 
-#include "gpod/Database.h"
+#include "BenchProcess.h"
 #include "Plugin.h"
+#include "gpod/Database.h"
 
 extern char** environ;
 
@@ -92,60 +92,17 @@ struct Program {
 
 // Runs one CGI process to its end; returns its wall time in ms and its standard output.
 double RunOnce(const Program& program, std::string& output) {
-    const std::vector<std::string> env = {"GATEWAY_INTERFACE=CGI/1.1", "REQUEST_METHOD=GET",
-                                          "QUERY_STRING=" + program.query, "REMOTE_USER=admin",
-                                          "PATH=/usr/bin:/bin"};
-    std::vector<char*> envp;
-    for (const std::string& e : env)
-        envp.push_back(const_cast<char*>(e.c_str()));
-    envp.push_back(nullptr);
-    char* argv[] = {const_cast<char*>(program.path.c_str()), nullptr};
-
-    int out[2];
-    if (pipe2(out, O_CLOEXEC) != 0)
-        Die("pipe");
-    posix_spawn_file_actions_t actions;
-    posix_spawn_file_actions_init(&actions);
-    posix_spawn_file_actions_adddup2(&actions, out[1], 1);
-    posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
-
-    const auto start = std::chrono::steady_clock::now();
-    pid_t pid = 0;
-    if (posix_spawn(&pid, program.path.c_str(), &actions, nullptr, argv, envp.data()) != 0)
-        Die("spawn " + program.path);
-    close(out[1]);
-    output.clear();
-    char buffer[65536];
-    for (;;) {
-        const ssize_t n = read(out[0], buffer, sizeof(buffer));
-        if (n < 0 && errno == EINTR)
-            continue;
-        if (n <= 0)
-            break;
-        output.append(buffer, static_cast<std::size_t>(n));
-    }
-    int status = 0;
-    while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
-    }
-    const auto end = std::chrono::steady_clock::now();
-    close(out[0]);
-    posix_spawn_file_actions_destroy(&actions);
-    return std::chrono::duration<double, std::milli>(end - start).count();
+    harmona::bench::ProcessRun run = harmona::bench::RunProcess(
+        program.path, harmona::bench::CgiEnvironment(program.query, "admin"));
+    output = std::move(run.output);
+    return run.wallMs;
 }
 
-double Median(std::vector<double> v) {
-    std::sort(v.begin(), v.end());
-    const std::size_t n = v.size();
-    return n % 2 ? v[n / 2] : (v[n / 2 - 1] + v[n / 2]) / 2;
-}
+using harmona::bench::Median;
+using harmona::bench::Percentile;
 
 double Mean(const std::vector<double>& v) {
     return std::accumulate(v.begin(), v.end(), 0.0) / static_cast<double>(v.size());
-}
-
-double Percentile(std::vector<double> v, double p) {
-    std::sort(v.begin(), v.end());
-    return v[std::min(v.size() - 1, static_cast<std::size_t>(p * static_cast<double>(v.size())))];
 }
 
 // Runs `programs` in `runs` interleaved rounds (after a warm-up) and prints the figures.
