@@ -4,12 +4,9 @@
 //
 // 1. "rerandom100" of the real audiotree.cgi over library.db files of 1,000, 100,000 and 1,000,000
 //    tracks (Part 4.4). Target: at 1,000,000 tracks within 2x its time at 1,000.
-// 2. The playlist category listings (Parts 4.1 to 4.3) with 10,000 personal playlist files, a
-//    personal smart playlist file of 10,000 playlists, and 10,000 shared playlists plus 10,000
-//    shared smart playlists. These builders are reached from a real request only through the root
-//    tree and the refresh action, not yet connected; bench_playlists_category_cgi is a CGI process
-//    that authorizes and serves one category's children with the real builders, as those requests
-//    will.
+// 2. The playlist listings (Parts 4.2 and 4.3) through the real "refresh" request (Part 2.3) with
+//    10,000 personal playlist files, a personal smart playlist file of 10,000 playlists, and 10,000
+//    shared playlists plus 10,000 shared smart playlists.
 //
 // Runs as root in a private mount namespace of its own, with tmpfs over /var/packages, /usr/vanu
 // and /tmp holding the fixtures; nothing reaches the real machine but empty mount points.
