@@ -24,7 +24,9 @@
 #include <vector>
 
 #include "BenchProcess.h"
+#include "Fixtures.h"
 #include "Plugin.h"
+#include "Sandbox.h"
 #include "gpod/Database.h"
 
 extern char** environ;
@@ -36,32 +38,8 @@ namespace {
     std::exit(2);
 }
 
-void MakeDirs(const std::string& path) {
-    for (std::size_t i = 1; i <= path.size(); ++i)
-        if (i == path.size() || path[i] == '/')
-            if (mkdir(path.substr(0, i).c_str(), 0755) != 0 && errno != EEXIST)
-                Die("mkdir " + path.substr(0, i));
-}
-
-void WriteFile(const std::string& path, const std::string& content) {
-    MakeDirs(path.substr(0, path.rfind('/')));
-    std::ofstream out(path, std::ios::binary | std::ios::trunc);
-    out << content;
-    if (!out)
-        Die("write " + path);
-}
-
-void EnterPrivateRoots() {
-    if (unshare(CLONE_NEWNS) != 0)
-        Die("unshare(CLONE_NEWNS) (run as root)");
-    if (mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0)
-        Die("make / private");
-    for (const char* root : {"/var/packages", "/usr/vanu"}) {
-        MakeDirs(root);
-        if (mount("tmpfs", root, "tmpfs", 0, "mode=755") != 0)
-            Die(std::string("mount tmpfs ") + root);
-    }
-}
+using harmona::test::MakeDirs;
+using harmona::test::WriteFile;
 
 constexpr const char* kIPodMount = "/usr/vanu/bench-ipod";
 
@@ -151,7 +129,8 @@ int main(int argc, char** argv) {
             playlists = std::max(0, std::atoi(argv[i + 1]));
     }
     const std::string dir = harmona::plugin::ProgramDirectory();
-    EnterPrivateRoots();
+    // The private mount and network namespaces of the tests, with tmpfs over the fixed roots.
+    harmona::test::EnterSandbox();
     WriteFile("/var/packages/Harmona/etc/users.conf", "[admin]\npermission=29\nlanguage=enu\n");
     WriteFile("/var/packages/Harmona/target/app/texts/enu/strings",
               "[player]\nrefresh_btn_title=Refresh\n");
