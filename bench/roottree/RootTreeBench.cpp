@@ -2,6 +2,7 @@
 // realistic fixture (1,000 personal playlists, 200 smart playlists, 50 shared playlists, an iPod
 // with 50 playlists, a daemon with 30 media servers), wall time and peak memory beside a trivial C
 // CGI in the same run; and what the UI texts cost, parsed once per builder (up to seven times).
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <chrono>
@@ -61,14 +62,42 @@ struct Row {
     long peakKb = -1;
 };
 
+// `--exec USER COMMAND...`: runs COMMAND with the CGI program appended as its last argument and
+// the root request's CGI environment for USER, over the same fixture (profilers: perf, valgrind).
+int ExecOverFixture(const std::string& user, char** command, int count) {
+    std::vector<std::string> arguments(command, command + count);
+    arguments.push_back(CgiProgram());
+    std::vector<char*> argv;
+    for (std::string& argument : arguments)
+        argv.push_back(argument.data());
+    argv.push_back(nullptr);
+    std::vector<std::string> environment = CgiEnvironment(kRootQuery, user);
+    std::vector<char*> envp;
+    for (std::string& variable : environment)
+        envp.push_back(variable.data());
+    envp.push_back(nullptr);
+    const pid_t pid = fork();
+    if (pid == 0) {
+        execvpe(argv[0], argv.data(), envp.data());
+        _exit(127);
+    }
+    int status = 0;
+    waitpid(pid, &status, 0);
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 1;
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
-    const int runs = argc > 1 ? std::max(1, std::atoi(argv[1])) : 100;
+    const bool exec = argc > 3 && std::string(argv[1]) == "--exec";
+    const int runs = !exec && argc > 1 ? std::max(1, std::atoi(argv[1])) : 100;
     EnterSandbox();
     ResetSandbox();
     MakeRealisticFixture();
     ScriptedDaemon daemon(ServeMediaServers(MakeMediaServers(30)));
+    WriteUsersConf({{"admin", {"13", ""}}, {"noipod", {"12", ""}}, {"plain", {"16", ""}}});
+    if (exec)
+        return ExecOverFixture(argv[2], argv + 3, argc - 3);
 
     const std::string cgi = CgiProgram();
     const CgiResult check = Get(kRootQuery);
@@ -86,7 +115,6 @@ int main(int argc, char** argv) {
     };
     // "noipod": permission 4|8, no iPod category; "plain": bit 16 alone, neither iPod nor media
     // servers: the rows show what each category costs.
-    WriteUsersConf({{"admin", {"13", ""}}, {"noipod", {"12", ""}}, {"plain", {"16", ""}}});
     for (const Row& row : rows) {
         const harmona::bench::ProcessRun run = RunProcess(row.program, row.environment);
         std::printf("check: %-34s exit %d, %zu reply bytes\n", row.label, run.exitStatus, run.output.size());

@@ -3,6 +3,7 @@
 #include <cstdio>
 #include <memory>
 #include <sstream>
+#include <vector>
 
 #include "JsonWriter.h"
 
@@ -22,6 +23,15 @@ void MakeObject(Json::Value& reply) {
     reply = std::move(object);
 }
 
+// A CGI process makes one reply and exits. Freeing a reply of many nodes, one small block at a
+// time, costs about a third of what building it did (12 ms for 10,000 nodes, bench/browse), for
+// memory that the exit hands back at once; the printed reply is therefore kept, reachable from
+// here, until the process ends (the same choice as clang's -disable-free).
+void KeepUntilExit(Json::Value&& value) {
+    static auto* kept = new std::vector<Json::Value>();
+    kept->push_back(std::move(value));
+}
+
 }  // namespace
 
 std::string SerializeReply(Json::Value value) {
@@ -38,11 +48,14 @@ std::string SerializeReply(Json::Value value) {
 ActionHandler::~ActionHandler() = default;
 
 void ActionHandler::PrintResponse(Json::Value value, const char* type) {
-    const std::string body = harmona::cgi::SerializeReply(std::move(value));
     std::printf("Content-Type: %s\r\n\r\n", type != nullptr ? type : "text/plain");
-    std::fwrite(body.data(), 1, body.size(), stdout);
+    if (value.isNull())
+        std::fputs(harmona::cgi::SerializeReply(Json::Value()).c_str(), stdout);
+    else
+        harmona::cgi::WriteCompactJson(value, stdout);
     std::fputc('\n', stdout);
     std::fflush(stdout);
+    harmona::cgi::KeepUntilExit(std::move(value));
 }
 
 void ActionHandler::SetError(Json::Value& reply, const char* section, const char* key, int line) {

@@ -10,39 +10,65 @@
 namespace harmona::cgi {
 namespace {
 
-void WriteEscapedChar(unsigned char c, std::string& out) {
+// Large replies are written in chunks of this size as they are made, so that a list of 100,000
+// nodes never sits in memory a second time as one text.
+constexpr std::size_t kChunkSize = 64 * 1024;
+
+// Where the text goes: `text` alone, or `text` flushed to `file` whenever a list element ends
+// past a chunk's size.
+struct Output {
+    std::string& text;
+    std::FILE* file;
+    bool failed = false;
+
+    void Flush() {
+        if (file != nullptr && !text.empty()) {
+            failed = failed || std::fwrite(text.data(), 1, text.size(), file) != text.size();
+            text.clear();
+        }
+    }
+    void ElementDone() {
+        if (file != nullptr && text.size() >= kChunkSize)
+            Flush();
+    }
+};
+
+void WriteValue(const Json::Value& value, Output& out);
+
+
+void WriteEscapedChar(unsigned char c, Output& out) {
     switch (c) {
         case '"':
-            out += "\\\"";
+            out.text += "\\\"";
             break;
         case '\\':
-            out += "\\\\";
+            out.text += "\\\\";
             break;
         case '\b':
-            out += "\\b";
+            out.text += "\\b";
             break;
         case '\f':
-            out += "\\f";
+            out.text += "\\f";
             break;
         case '\n':
-            out += "\\n";
+            out.text += "\\n";
             break;
         case '\r':
-            out += "\\r";
+            out.text += "\\r";
             break;
         case '\t':
-            out += "\\t";
+            out.text += "\\t";
             break;
         default: {
             char escape[8];
             std::snprintf(escape, sizeof(escape), "\\u%04x", c);
-            out += escape;
+            out.text += escape;
         }
     }
 }
 
-void WriteString(const char* begin, const char* end, std::string& out) {
-    out.push_back('"');
+void WriteString(const char* begin, const char* end, Output& out) {
+    out.text.push_back('"');
     const std::string_view text(begin, static_cast<std::size_t>(end - begin));
     // Copy runs of plain bytes at once; escape and repair the rest.
     std::size_t run = 0;
@@ -52,43 +78,43 @@ void WriteString(const char* begin, const char* end, std::string& out) {
             ++i;
             continue;
         }
-        out.append(text.substr(run, i - run));
+        out.text.append(text.substr(run, i - run));
         if (c < 0x80) {
             WriteEscapedChar(c, out);
             ++i;
         } else {
             const std::size_t length = Utf8SequenceLength(text, i);
             if (length == 0) {
-                out += "\xEF\xBF\xBD";
+                out.text += "\xEF\xBF\xBD";
                 ++i;
             } else {
-                out.append(text.substr(i, length));
+                out.text.append(text.substr(i, length));
                 i += length;
             }
         }
         run = i;
     }
-    out.append(text.substr(run));
-    out.push_back('"');
+    out.text.append(text.substr(run));
+    out.text.push_back('"');
 }
 
 void WriteMember(const char* name, const char* end, const Json::Value& member, bool first,
-                 std::string& out) {
+                 Output& out) {
     if (!first)
-        out.push_back(',');
+        out.text.push_back(',');
     WriteString(name, end, out);
-    out.push_back(':');
-    WriteCompactJson(member, out);
+    out.text.push_back(':');
+    WriteValue(member, out);
 }
 
-void WriteObject(const Json::Value& value, std::string& out) {
+void WriteObject(const Json::Value& value, Output& out) {
     bool namesValid = true;
     for (auto it = value.begin(); it != value.end() && namesValid; ++it) {
         const char* end = nullptr;
         const char* name = it.memberName(&end);
         namesValid = IsValidUtf8(std::string_view(name, static_cast<std::size_t>(end - name)));
     }
-    out.push_back('{');
+    out.text.push_back('{');
     bool first = true;
     if (namesValid) {
         for (auto it = value.begin(); it != value.end(); ++it) {
@@ -112,27 +138,25 @@ void WriteObject(const Json::Value& value, std::string& out) {
             first = false;
         }
     }
-    out.push_back('}');
+    out.text.push_back('}');
 }
 
-}  // namespace
-
-void WriteCompactJson(const Json::Value& value, std::string& out) {
+void WriteValue(const Json::Value& value, Output& out) {
     switch (value.type()) {
         case Json::nullValue:
-            out += "null";
+            out.text += "null";
             break;
         case Json::intValue:
-            out += std::to_string(value.asLargestInt());
+            out.text += std::to_string(value.asLargestInt());
             break;
         case Json::uintValue:
-            out += std::to_string(value.asLargestUInt());
+            out.text += std::to_string(value.asLargestUInt());
             break;
         case Json::realValue:
-            out += Json::valueToString(value.asDouble());
+            out.text += Json::valueToString(value.asDouble());
             break;
         case Json::booleanValue:
-            out += value.asBool() ? "true" : "false";
+            out.text += value.asBool() ? "true" : "false";
             break;
         case Json::stringValue: {
             const char* begin = nullptr;
@@ -142,21 +166,38 @@ void WriteCompactJson(const Json::Value& value, std::string& out) {
             break;
         }
         case Json::arrayValue: {
-            out.push_back('[');
+            out.text.push_back('[');
             bool first = true;
             for (const Json::Value& element : value) {
                 if (!first)
-                    out.push_back(',');
+                    out.text.push_back(',');
                 first = false;
-                WriteCompactJson(element, out);
+                WriteValue(element, out);
+                out.ElementDone();
             }
-            out.push_back(']');
+            out.text.push_back(']');
             break;
         }
         case Json::objectValue:
             WriteObject(value, out);
             break;
     }
+}
+
+}  // namespace
+
+void WriteCompactJson(const Json::Value& value, std::string& out) {
+    Output output{out, nullptr};
+    WriteValue(value, output);
+}
+
+bool WriteCompactJson(const Json::Value& value, std::FILE* file) {
+    std::string text;
+    text.reserve(2 * kChunkSize);
+    Output output{text, file};
+    WriteValue(value, output);
+    output.Flush();
+    return !output.failed;
 }
 
 }  // namespace harmona::cgi

@@ -6,10 +6,14 @@
 
 #include <json/value.h>
 
+#include <cstdio>
 #include <string>
 
 namespace harmona::cgi {
 
 void WriteCompactJson(const Json::Value& value, std::string& out);
+
+// The same text written to `file` in chunks as it is made; false when a write failed.
+bool WriteCompactJson(const Json::Value& value, std::FILE* file);
 
 }  // namespace harmona::cgi

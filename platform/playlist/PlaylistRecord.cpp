@@ -29,10 +29,14 @@ void CopyUtf8Field(char* field, std::size_t size, std::string_view text) {
 }
 
 bool PlaylistListBuilder::Append(std::uint32_t id, std::string_view name, std::string_view key) {
-    auto* record = static_cast<PLAYLIST_INFO*>(std::calloc(1, sizeof(PLAYLIST_INFO)));
+    // Not zero-filled: a record is 4.6 KB of which a listing reads two short NUL-terminated texts,
+    // and clearing a thousand of them cost a thousand page faults and most of a root request's
+    // time (bench/roottree). Every field that is read is written here.
+    auto* record = static_cast<PLAYLIST_INFO*>(std::malloc(sizeof(PLAYLIST_INFO)));
     if (record == nullptr)
         return false;
     record->id = id;
+    record->pNext = nullptr;
     CopyUtf8Field(record->szName, sizeof(record->szName), name);
     CopyUtf8Field(record->szKey, sizeof(record->szKey), key);
     if (tail_ == nullptr)
