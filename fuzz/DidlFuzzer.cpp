@@ -15,7 +15,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     harmona::dma::BrowsePage page;
     if (harmona::dma::ParseBrowseResponse(reply, page) == harmona::dma::ReplyStatus::Ok &&
         page.hasResult)
-        didl = page.result;
+        didl = page.ResultText();
 
     std::vector<ItemNode*> items;
     const long count = harmona::dma::ParseDidl(didl, items);

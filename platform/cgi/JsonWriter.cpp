@@ -2,6 +2,7 @@
 
 #include <json/writer.h>
 
+#include <array>
 #include <cstdio>
 #include <map>
 
@@ -20,6 +21,7 @@ struct Output {
     std::string& text;
     std::FILE* file;
     bool failed = false;
+    int holdFlush = 0;  // objects open whose text may still be taken back
 
     void Flush() {
         if (file != nullptr && !text.empty()) {
@@ -28,7 +30,7 @@ struct Output {
         }
     }
     void ElementDone() {
-        if (file != nullptr && text.size() >= kChunkSize)
+        if (file != nullptr && holdFlush == 0 && text.size() >= kChunkSize)
             Flush();
     }
 };
@@ -67,18 +69,27 @@ void WriteEscapedChar(unsigned char c, Output& out) {
     }
 }
 
+// Bytes copied as they stand: printable ASCII other than the quote and the backslash.
+constexpr std::array<bool, 256> kPlainBytes = [] {
+    std::array<bool, 256> plain{};
+    for (int c = 0x20; c < 0x80; ++c)
+        plain[static_cast<std::size_t>(c)] = c != '"' && c != '\\';
+    return plain;
+}();
+
 void WriteString(const char* begin, const char* end, Output& out) {
     out.text.push_back('"');
     const std::string_view text(begin, static_cast<std::size_t>(end - begin));
+    const auto* bytes = reinterpret_cast<const unsigned char*>(begin);
     // Copy runs of plain bytes at once; escape and repair the rest.
     std::size_t run = 0;
     for (std::size_t i = 0; i < text.size();) {
-        const unsigned char c = static_cast<unsigned char>(text[i]);
-        if (c >= 0x20 && c < 0x80 && c != '"' && c != '\\') {
+        while (i < text.size() && kPlainBytes[bytes[i]])
             ++i;
-            continue;
-        }
-        out.text.append(text.substr(run, i - run));
+        if (i == text.size())
+            break;
+        out.text.append(begin + run, i - run);
+        const unsigned char c = bytes[i];
         if (c < 0x80) {
             WriteEscapedChar(c, out);
             ++i;
@@ -88,13 +99,13 @@ void WriteString(const char* begin, const char* end, Output& out) {
                 out.text += "\xEF\xBF\xBD";
                 ++i;
             } else {
-                out.text.append(text.substr(i, length));
+                out.text.append(begin + i, length);
                 i += length;
             }
         }
         run = i;
     }
-    out.text.append(text.substr(run));
+    out.text.append(begin + run, text.size() - run);
     out.text.push_back('"');
 }
 
@@ -107,38 +118,48 @@ void WriteMember(const char* name, const char* end, const Json::Value& member, b
     WriteValue(member, out);
 }
 
-void WriteObject(const Json::Value& value, Output& out) {
-    bool namesValid = true;
-    for (auto it = value.begin(); it != value.end() && namesValid; ++it) {
-        const char* end = nullptr;
-        const char* name = it.memberName(&end);
-        namesValid = IsValidUtf8(std::string_view(name, static_cast<std::size_t>(end - name)));
+// Members whose names need repair: repaired names may coincide, and an object keeps each name
+// once (the later member wins), in the order of the repaired names, as jsoncpp orders members.
+void WriteRepairedMembers(const Json::Value& value, Output& out) {
+    std::map<std::string, const Json::Value*> repaired;
+    for (auto it = value.begin(), end = value.end(); it != end; ++it) {
+        const char* nameEnd = nullptr;
+        const char* name = it.memberName(&nameEnd);
+        repaired[RepairUtf8(std::string_view(name, static_cast<std::size_t>(nameEnd - name)))] =
+            &*it;
     }
+    bool first = true;
+    for (const auto& [name, member] : repaired) {
+        WriteMember(name.data(), name.data() + name.size(), *member, first, out);
+        first = false;
+    }
+}
+
+// One pass in the usual case: the members are written as their names are checked, and only a
+// name that is not UTF-8 sends the object, from its start, through the repair. Nothing written
+// since the object's start may reach the file before its end (holdFlush).
+void WriteObject(const Json::Value& value, Output& out) {
+    const std::size_t start = out.text.size();
+    ++out.holdFlush;
     out.text.push_back('{');
     bool first = true;
-    if (namesValid) {
-        for (auto it = value.begin(); it != value.end(); ++it) {
-            const char* end = nullptr;
-            const char* name = it.memberName(&end);
-            WriteMember(name, end, *it, first, out);
-            first = false;
+    bool namesValid = true;
+    for (auto it = value.begin(), end = value.end(); it != end; ++it) {
+        const char* nameEnd = nullptr;
+        const char* name = it.memberName(&nameEnd);
+        if (!IsValidUtf8(std::string_view(name, static_cast<std::size_t>(nameEnd - name)))) {
+            namesValid = false;
+            break;
         }
-    } else {
-        // Repaired names may coincide; an object keeps each name once (the later member wins), in
-        // the order of the repaired names, as jsoncpp orders members.
-        std::map<std::string, const Json::Value*> repaired;
-        for (auto it = value.begin(); it != value.end(); ++it) {
-            const char* end = nullptr;
-            const char* name = it.memberName(&end);
-            repaired[RepairUtf8(std::string_view(name, static_cast<std::size_t>(end - name)))] =
-                &*it;
-        }
-        for (const auto& [name, member] : repaired) {
-            WriteMember(name.data(), name.data() + name.size(), *member, first, out);
-            first = false;
-        }
+        WriteMember(name, nameEnd, *it, first, out);
+        first = false;
+    }
+    if (!namesValid) {
+        out.text.resize(start + 1);
+        WriteRepairedMembers(value, out);
     }
     out.text.push_back('}');
+    --out.holdFlush;
 }
 
 void WriteValue(const Json::Value& value, Output& out) {

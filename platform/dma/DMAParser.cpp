@@ -28,6 +28,14 @@ int AppendToReply(void* context, const char* bytes, size_t size) {
     return 0;
 }
 
+// Reserves the announced size at once (a 2 MiB reply grown by doubling is copied about ten times);
+// beyond the size limit nothing is reserved, the sink refuses the bytes as they come.
+void ExpectReplySize(void* context, unsigned long long size) {
+    auto* reply = static_cast<ReplyBuffer*>(context);
+    if (size <= harmona::dma::kMaxReplyBytes)
+        reply->data.reserve(static_cast<std::size_t>(size));
+}
+
 }  // namespace
 
 DMAParser::~DMAParser() {
@@ -87,6 +95,7 @@ int DMAParser::Parse(DMABrowse* browse) {
         request.totalTimeoutMs = remainingMs;
         request.sink = AppendToReply;
         request.sinkContext = &reply;
+        request.expect = ExpectReplySize;
         harmona_http_post_result outcome{};
         if (post(&request, &outcome) != 0)
             return Fail(reply.tooLarge ? "reply over the size limit" : outcome.error);
@@ -96,8 +105,6 @@ int DMAParser::Parse(DMABrowse* browse) {
         harmona::dma::BrowsePage page;
         const harmona::dma::ReplyStatus status =
             harmona::dma::ParseBrowseResponse(reply.data, page);
-        // The reply's buffer is no longer needed; free it before the DIDL document is parsed.
-        std::string().swap(reply.data);
         if (status == harmona::dma::ReplyStatus::Fault)
             return Fail("SOAP fault");
         if (status != harmona::dma::ReplyStatus::Ok)
@@ -107,7 +114,9 @@ int DMAParser::Parse(DMABrowse* browse) {
             hasResult_ = page.hasResult;
         if (!page.hasResult)
             break;
-        const long count = harmona::dma::ParseDidl(page.result, items_);
+        // The DIDL-Lite text usually lies inside the reply buffer (see BrowsePage), which lives
+        // until this page is done.
+        const long count = harmona::dma::ParseDidl(page.ResultData(), page.ResultSize(), items_);
         if (count < 0)
             return Fail("Result is not DIDL-Lite");
         index += static_cast<unsigned long>(count);

@@ -10,12 +10,25 @@ namespace {
 
 struct SinkState {
     const harmona_http_post_request* request;
+    const harmona::curl::Easy* easy;
     bool aborted = false;
+    bool announced = false;
 };
+
+// Passes the Content-Length on, once, so that the receiver can size its buffer in one step.
+void AnnounceSize(SinkState& state) {
+    state.announced = true;
+    curl_off_t length = -1;
+    if (state.request->expect != nullptr &&
+        state.easy->GetInfo(CURLINFO_CONTENT_LENGTH_DOWNLOAD_T, &length) == CURLE_OK && length >= 0)
+        state.request->expect(state.request->sinkContext, static_cast<unsigned long long>(length));
+}
 
 size_t WriteToSink(char* data, size_t size, size_t count, void* context) {
     auto* state = static_cast<SinkState*>(context);
     const size_t bytes = size * count;
+    if (!state->announced)
+        AnnounceSize(*state);
     if (state->request->sink(state->request->sinkContext, data, bytes) != 0) {
         state->aborted = true;
         return 0;  // anything other than `bytes` makes libcurl abort with CURLE_WRITE_ERROR
@@ -79,7 +92,7 @@ extern "C" __attribute__((visibility("default"))) int harmona_http_post(
         return -1;
     }
     harmona::curl::StringList headers;
-    SinkState state{request};
+    SinkState state{request, &easy};
     if (!Configure(easy, request, headers, state)) {
         SetError(result, "curl refused an option");
         return -1;

@@ -10,6 +10,10 @@ extern "C" {
 // Receives the reply body piece by piece; a nonzero result aborts the transfer at once.
 typedef int (*harmona_http_sink)(void* context, const char* data, size_t size);
 
+// Told, once and before the first piece, the body's size announced by Content-Length; a reply
+// without one is not announced. A hint only: the announced size is not trusted.
+typedef void (*harmona_http_expect)(void* context, unsigned long long size);
+
 struct harmona_http_post_request {
     const char* url;             // absolute http:// URL
     const char* const* headers;  // extra request header lines ("Name: value")
@@ -20,6 +24,7 @@ struct harmona_http_post_request {
     long totalTimeoutMs;    // no whole reply within this: failure
     harmona_http_sink sink;
     void* sinkContext;
+    harmona_http_expect expect;  // may be null; gets sinkContext
 };
 
 struct harmona_http_post_result {

@@ -153,10 +153,38 @@ std::string Trimmed(const std::string& text) {
 
 constexpr unsigned kParseOptions = pugi::parse_default;  // no parse_doctype: a DTD is skipped
 
-bool ParseInPlace(pugi::xml_document& document, std::string& text) {
+bool ParseInPlace(pugi::xml_document& document, char* text, std::size_t size) {
     const pugi::xml_parse_result parsed =
-        document.load_buffer_inplace(text.data(), text.size(), kParseOptions, pugi::encoding_auto);
+        document.load_buffer_inplace(text, size, kParseOptions, pugi::encoding_auto);
     return static_cast<bool>(parsed);
+}
+
+bool IsBlank(const char* text, std::size_t size) {
+    for (std::size_t i = 0; i < size; ++i)
+        if (text[i] != ' ' && text[i] != '\t' && text[i] != '\r' && text[i] != '\n')
+            return false;
+    return true;
+}
+
+// Points `page` at the text of Result: in place when it is one piece of character data (pugixml
+// parsed the reply in place, so that piece is the unescaped text, NUL-terminated, inside the reply
+// buffer), joined into `page.joined` otherwise.
+void TakeResult(pugi::xml_node result, BrowsePage& page) {
+    pugi::xml_node only;
+    int pieces = 0;
+    for (pugi::xml_node child : result.children()) {
+        if (child.type() == pugi::node_pcdata || child.type() == pugi::node_cdata) {
+            only = child;
+            ++pieces;
+        }
+    }
+    if (pieces == 1) {
+        page.inReply = const_cast<char*>(only.value());
+        page.inReplySize = std::strlen(page.inReply);
+    } else {
+        page.joined = TextOf(result);
+    }
+    page.hasResult = !IsBlank(page.ResultData(), page.ResultSize());
 }
 
 const char* ContentDirectoryPrefix = "urn:schemas-upnp-org:service:ContentDirectory:";
@@ -166,7 +194,7 @@ const char* ContentDirectoryPrefix = "urn:schemas-upnp-org:service:ContentDirect
 ReplyStatus ParseBrowseResponse(std::string& reply, BrowsePage& page) {
     page = BrowsePage{};
     pugi::xml_document document;
-    if (!ParseInPlace(document, reply))
+    if (!ParseInPlace(document, reply.data(), reply.size()))
         return ReplyStatus::Malformed;
     const pugi::xml_node envelope = document.document_element();
     if (!Is(envelope, kSoapEnvelopeNs, "Envelope"))
@@ -189,10 +217,8 @@ ReplyStatus ParseBrowseResponse(std::string& reply, BrowsePage& page) {
     if (!response)
         return ReplyStatus::NotBrowseResponse;
     const pugi::xml_node result = FindArgument(response, "Result");
-    if (result) {
-        page.result = TextOf(result);
-        page.hasResult = !Trimmed(page.result).empty();
-    }
+    if (result)
+        TakeResult(result, page);
     page.totalMatches = ToUnsigned(TextOf(FindArgument(response, "TotalMatches")));
     page.numberReturned = ToUnsigned(TextOf(FindArgument(response, "NumberReturned")));
     return ReplyStatus::Ok;
@@ -236,9 +262,9 @@ void FillItem(pugi::xml_node object, ItemNode& item) {
 
 }  // namespace
 
-long ParseDidl(std::string& didl, std::vector<ItemNode*>& items) {
+long ParseDidl(char* didl, std::size_t size, std::vector<ItemNode*>& items) {
     pugi::xml_document document;
-    if (!ParseInPlace(document, didl))
+    if (!ParseInPlace(document, didl, size))
         return -1;
     const pugi::xml_node root = document.document_element();
     if (!Is(root, kDidlNs, "DIDL-Lite"))

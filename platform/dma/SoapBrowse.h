@@ -41,18 +41,32 @@ std::string BuildBrowseEnvelope(const std::string& objectId, const char* browseF
 
 struct BrowsePage {
     bool hasResult = false;  // a non-empty Result element
-    std::string result;      // the DIDL-Lite text of Result, unescaped
     unsigned long totalMatches = 0;
     unsigned long numberReturned = 0;
+
+    // The DIDL-Lite text of Result, unescaped. When Result holds one piece of text (the usual
+    // case) it is left where the parse put it, inside the reply buffer, which must then outlive
+    // its use: a megabyte-sized result is not copied. Pieces of text and CDATA are joined.
+    char* ResultData() { return inReply != nullptr ? inReply : joined.data(); }
+    std::size_t ResultSize() const { return inReply != nullptr ? inReplySize : joined.size(); }
+    std::string ResultText() { return std::string(ResultData(), ResultSize()); }
+
+    char* inReply = nullptr;
+    std::size_t inReplySize = 0;
+    std::string joined;
 };
 
 enum class ReplyStatus { Ok, Malformed, Fault, NotBrowseResponse };
 
-// Parses a SOAP reply (modified in place: pugixml parses the buffer itself).
+// Parses a SOAP reply (modified in place: pugixml parses the buffer itself; `page` may point into
+// it).
 ReplyStatus ParseBrowseResponse(std::string& reply, BrowsePage& page);
 
 // Appends the DIDL-Lite document's container and item objects, in document order, to `items` (new
 // objects, owned by the caller); the number appended, or -1 when the document is not DIDL-Lite XML.
-long ParseDidl(std::string& didl, std::vector<ItemNode*>& items);
+long ParseDidl(char* didl, std::size_t size, std::vector<ItemNode*>& items);
+inline long ParseDidl(std::string& didl, std::vector<ItemNode*>& items) {
+    return ParseDidl(didl.data(), didl.size(), items);
+}
 
 }  // namespace harmona::dma

@@ -189,7 +189,8 @@ TEST(DmaBrowseLibrary, SoapReplyParsingFaultsAndMissingResult) {
     EXPECT_TRUE(page.hasResult);
     EXPECT_EQ(page.totalMatches, 9u);
     std::vector<ItemNode*> items;
-    ASSERT_EQ(ParseDidl(page.result, items), 1);
+    std::string didl = page.ResultText();
+    ASSERT_EQ(ParseDidl(didl, items), 1);
     EXPECT_EQ(items[0]->title, "Seven");
     delete items[0];
 }
