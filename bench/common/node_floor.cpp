@@ -4,7 +4,7 @@
 // else: no request parsing, no fetch, no XML. What a CGI request that lists COUNT children costs
 // beyond this is the part that the code can still win; this much it cannot, while nodes are
 // jsoncpp values.
-//   bench_node_floor COUNT [TITLE_PREFIX]
+//   bench_node_floor COUNT [TITLE_PREFIX]    (or COUNT from the environment: NODE_COUNT=COUNT)
 #include <cstdio>
 #include <cstdlib>
 #include <string>
@@ -12,7 +12,10 @@
 #include "HarmonaHandler.h"
 
 int main(int argc, char** argv) {
-    const long count = argc > 1 ? std::atol(argv[1]) : 0;
+    const char* fromEnvironment = std::getenv("NODE_COUNT");
+    const long count = argc > 1                     ? std::atol(argv[1])
+                       : fromEnvironment != nullptr ? std::atol(fromEnvironment)
+                                                    : 0;
     const std::string title = argc > 2 ? argv[2] : "Title ";
     HarmonaHandler handler;
     Json::Value children;

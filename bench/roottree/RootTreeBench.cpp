@@ -54,6 +54,15 @@ void MakeRealisticFixture() {
     AttachIPod(ipod);
 }
 
+// Tree nodes in a reply: every object that has an "id", at any depth.
+std::size_t CountNodes(const Json::Value& value) {
+    std::size_t count = value.isObject() && value.isMember("id") ? 1 : 0;
+    if (value.isArray() || value.isObject())
+        for (const Json::Value& member : value)
+            count += CountNodes(member);
+    return count;
+}
+
 struct Row {
     const char* label;
     std::string program;
@@ -106,12 +115,17 @@ int main(int argc, char** argv) {
                      check.body.c_str());
         return 1;
     }
+    const std::size_t nodes = CountNodes(check.json);
     std::vector<Row> rows = {
         {"trivial C CGI", HARMONA_TRIVIAL_CGI, CgiEnvironment("", "admin"), {}},
         {"avoid_timeout", cgi, CgiEnvironment("action=avoid_timeout", "admin"), {}},
         {"root tree, realistic fixture", cgi, CgiEnvironment(kRootQuery, "admin"), {}},
         {"root tree, no iPod category", cgi, CgiEnvironment(kRootQuery, "noipod"), {}},
         {"root tree, no iPod, no media servers", cgi, CgiEnvironment(kRootQuery, "plain"), {}},
+        // What the spec's node record costs alone: as many jsoncpp nodes as the full reply has,
+        // made with FillTreeNode and printed, nothing listed or read.
+        {"spec floor: the reply's nodes alone", HARMONA_NODE_FLOOR,
+         {"NODE_COUNT=" + std::to_string(nodes)}, {}},
     };
     // "noipod": permission 4|8, no iPod category; "plain": bit 16 alone, neither iPod nor media
     // servers: the rows show what each category costs.
@@ -152,5 +166,7 @@ int main(int argc, char** argv) {
         "UI texts (enu, %zu sections): %.1f us per parse, %.3f ms for the 7 parses of a root "
         "request\n",
         sections / parses, parseUs, 7 * parseUs / 1000.0);
+    std::printf("the full reply holds %zu tree nodes (the floor row makes and prints as many)\n",
+                nodes);
     return 0;
 }

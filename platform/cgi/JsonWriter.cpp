@@ -3,7 +3,9 @@
 #include <json/writer.h>
 
 #include <array>
+#include <cstdint>
 #include <cstdio>
+#include <cstring>
 #include <map>
 
 #include "Utf8.h"
@@ -77,6 +79,17 @@ constexpr std::array<bool, 256> kPlainBytes = [] {
     return plain;
 }();
 
+// True when none of the eight bytes of `word` needs escaping or repair: each is at least 0x20,
+// below 0x80, and neither the quote nor the backslash (bit tricks that test eight bytes at once).
+bool AllPlain(std::uint64_t word) {
+    constexpr std::uint64_t kOnes = 0x0101010101010101ull;
+    constexpr std::uint64_t kHighs = 0x8080808080808080ull;
+    const auto hasZeroByte = [](std::uint64_t v) { return (v - kOnes) & ~v & kHighs; };
+    const std::uint64_t controlOrHigh = ((word - 0x20 * kOnes) | word) & kHighs;
+    return (controlOrHigh | hasZeroByte(word ^ ('"' * kOnes)) | hasZeroByte(word ^ ('\\' * kOnes))) ==
+           0;
+}
+
 void WriteString(const char* begin, const char* end, Output& out) {
     out.text.push_back('"');
     const std::string_view text(begin, static_cast<std::size_t>(end - begin));
@@ -84,6 +97,11 @@ void WriteString(const char* begin, const char* end, Output& out) {
     // Copy runs of plain bytes at once; escape and repair the rest.
     std::size_t run = 0;
     for (std::size_t i = 0; i < text.size();) {
+        for (std::uint64_t word; i + 8 <= text.size(); i += 8) {
+            std::memcpy(&word, bytes + i, 8);
+            if (!AllPlain(word))
+                break;
+        }
         while (i < text.size() && kPlainBytes[bytes[i]])
             ++i;
         if (i == text.size())

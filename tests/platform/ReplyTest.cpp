@@ -1,7 +1,10 @@
 // platform.md section 3: PrintResponse, SetError, SetSuccess, EncodeHtml and the UTF-8 repair.
 #include <gtest/gtest.h>
 
+#include <cstdio>
+
 #include "ActionHandler.h"
+#include "JsonWriter.h"
 #include "CgiRunner.h"
 #include "Utf8.h"
 #include "WebUtils.h"
@@ -127,6 +130,77 @@ TEST(SetSuccess, ErrorAfterSuccessIsFalse) {
     handler.SetSuccess(reply, true);
     handler.SetError(reply, "playlist", "error_create_random100", 616);
     EXPECT_EQ(reply["success"], false);
+}
+
+// The writer tests eight bytes at a time for bytes that need escaping or repair; each such byte,
+// at every offset around those eight-byte steps, must come out as a byte-at-a-time writer makes it.
+std::string EscapedByteAtATime(const std::string& text) {
+    std::string out = "\"";
+    for (std::size_t i = 0; i < text.size();) {
+        const unsigned char c = static_cast<unsigned char>(text[i]);
+        if (c == '"' || c == '\\') {
+            out += '\\';
+            out += static_cast<char>(c);
+        } else if (c == '\n') {
+            out += "\\n";
+        } else if (c < 0x20) {
+            char escape[8];
+            std::snprintf(escape, sizeof escape, "\\u%04x", c);
+            out += escape;
+        } else if (c < 0x80) {
+            out += static_cast<char>(c);
+        } else {
+            const std::size_t length = harmona::cgi::Utf8SequenceLength(text, i);
+            out += length == 0 ? "\xEF\xBF\xBD" : text.substr(i, length);
+            i += length == 0 ? 1 : length;
+            continue;
+        }
+        ++i;
+    }
+    return out + "\"";
+}
+
+TEST(PrintResponse, EveryByteThatNeedsEscapingIsFoundAtEveryOffset) {
+    for (const std::string special : {"\x01", "\x1F", "\"", "\\", "\n", "\xC3\xA9", "\xFF", "\xE6\x97",
+                                      "\x7F", " ", "~"}) {
+        for (std::size_t offset = 0; offset < 20; ++offset) {
+            const std::string text = std::string(offset, 'a') + special + std::string(19, 'z');
+            EXPECT_EQ(SerializeReply(Json::Value(text)), EscapedByteAtATime(text))
+                << "offset " << offset << ", byte " << static_cast<int>(special[0] & 0xFF);
+        }
+    }
+}
+
+// PrintResponse writes a large reply in chunks as it is made; an object whose member name needs
+// repair is written again from its start, which must never have reached the file already.
+TEST(PrintResponse, ChunkedReplyEqualsTheWholeTextWhenANameNeedsRepair) {
+    Json::Value reply;
+    for (int i = 0; i < 3000; ++i) {
+        Json::Value node(Json::objectValue);
+        node["id"] = "node " + std::to_string(i) + std::string(40, 'x');
+        if (i == 2500) {
+            for (int j = 0; j < 2000; ++j)
+                node["a children"].append(std::string(50, 'c'));
+            node["z\xFF"] = "bad name after a large member";
+        }
+        reply.append(std::move(node));
+    }
+    std::string whole;
+    harmona::cgi::WriteCompactJson(reply, whole);
+    std::FILE* file = std::tmpfile();
+    ASSERT_NE(file, nullptr);
+    ASSERT_TRUE(harmona::cgi::WriteCompactJson(reply, file));
+    std::fflush(file);
+    std::rewind(file);
+    std::string chunked;
+    char buffer[65536];
+    for (std::size_t n; (n = std::fread(buffer, 1, sizeof buffer, file)) > 0;)
+        chunked.append(buffer, n);
+    std::fclose(file);
+    EXPECT_GT(whole.size(), 200000u);
+    EXPECT_EQ(chunked, whole);
+    EXPECT_NE(whole.find("\"z\xEF\xBF\xBD\":\"bad name after a large member\""), std::string::npos);
+    EXPECT_TRUE(IsValidUtf8(chunked));
 }
 
 }  // namespace
