@@ -1,22 +1,40 @@
 // One DIDL-Lite object (container or item) of a Browse result (platform.md section 9).
 #pragma once
 
+#include <array>
+#include <cstdint>
 #include <string>
+#include <string_view>
 
 class ItemNode {
   public:
+    enum Field : unsigned char { Id, ParentId, Title, Class, ChildCount, Artist, Album, Res };
+    static constexpr std::size_t kFieldCount = 8;
+
     // "id", "parentID", "title" (dc:title), "class" (upnp:class), "childCount", "artist"
     // (upnp:artist, else dc:creator), "album" (upnp:album), "res" (the first res URL); "" for a
     // missing value or an unknown key.
     std::string getValueByKey(const std::string& key) const;
 
+    std::string_view Get(Field field) const;
+    // The same values by name, as copies.
+    std::string id() const { return std::string(Get(Id)); }
+    std::string parentID() const { return std::string(Get(ParentId)); }
+    std::string title() const { return std::string(Get(Title)); }
+    std::string upnpClass() const { return std::string(Get(Class)); }
+    std::string childCount() const { return std::string(Get(ChildCount)); }
+    std::string artist() const { return std::string(Get(Artist)); }
+    std::string album() const { return std::string(Get(Album)); }
+    std::string res() const { return std::string(Get(Res)); }
+
+    // Stores the eight values, in Field order, at once. A container of 100,000 objects keeps
+    // 100,000 of these until its nodes are made: one block per object rather than eight strings
+    // halves what they take.
+    void Assign(const std::array<std::string_view, kFieldCount>& values);
+
     bool isContainer = false;
-    std::string id;
-    std::string parentID;
-    std::string title;
-    std::string upnpClass;
-    std::string childCount;
-    std::string artist;
-    std::string album;
-    std::string res;
+
+  private:
+    std::string values_;                             // the values one after another
+    std::array<std::uint32_t, kFieldCount> ends_{};  // where each value ends in values_
 };

@@ -1,5 +1,6 @@
 #include "SoapBrowse.h"
 
+#include <array>
 #include <cstdlib>
 #include <cstring>
 #include <pugixml.hpp>
@@ -143,14 +144,6 @@ unsigned long ToUnsigned(const std::string& text) {
     return std::strtoul(begin, nullptr, 10);
 }
 
-std::string Trimmed(const std::string& text) {
-    const std::size_t first = text.find_first_not_of(" \t\r\n");
-    if (first == std::string::npos)
-        return "";
-    const std::size_t last = text.find_last_not_of(" \t\r\n");
-    return text.substr(first, last - first + 1);
-}
-
 constexpr unsigned kParseOptions = pugi::parse_default;  // no parse_doctype: a DTD is skipped
 
 bool ParseInPlace(pugi::xml_document& document, char* text, std::size_t size) {
@@ -226,12 +219,36 @@ ReplyStatus ParseBrowseResponse(std::string& reply, BrowsePage& page) {
 
 namespace {
 
-void FillItem(pugi::xml_node object, ItemNode& item) {
-    item.isContainer = std::strcmp(LocalName(object.name()), "container") == 0;
-    item.id = object.attribute("id").value();
-    item.parentID = object.attribute("parentID").value();
-    item.childCount = object.attribute("childCount").value();
+// The values of one object as they are gathered. One scratch serves every object of a document,
+// so that its buffers are reused and each object costs one allocation (ItemNode::Assign).
+struct ItemScratch {
+    std::array<std::string, ItemNode::kFieldCount> values;
     std::string creator;
+};
+
+// All character data directly inside `element` (text and CDATA pieces joined) into `out`.
+void AssignTextOf(pugi::xml_node element, std::string& out) {
+    out.clear();
+    for (pugi::xml_node child : element.children())
+        if (child.type() == pugi::node_pcdata || child.type() == pugi::node_cdata)
+            out += child.value();
+}
+
+void Trim(std::string& text) {
+    const std::size_t last = text.find_last_not_of(" \t\r\n");
+    text.erase(last == std::string::npos ? 0 : last + 1);
+    text.erase(0, text.find_first_not_of(" \t\r\n"));
+}
+
+void FillItem(pugi::xml_node object, ItemNode& item, ItemScratch& scratch) {
+    auto& values = scratch.values;
+    for (std::string& value : values)
+        value.clear();
+    scratch.creator.clear();
+    item.isContainer = std::strcmp(LocalName(object.name()), "container") == 0;
+    values[ItemNode::Id] = object.attribute("id").value();
+    values[ItemNode::ParentId] = object.attribute("parentID").value();
+    values[ItemNode::ChildCount] = object.attribute("childCount").value();
     bool haveRes = false, haveArtist = false;
     for (pugi::xml_node child : object.children()) {
         if (child.type() != pugi::node_element)
@@ -240,24 +257,31 @@ void FillItem(pugi::xml_node object, ItemNode& item) {
         const char* ns = NamespaceOf(child);
         if (std::strcmp(ns, kDublinCoreNs) == 0) {
             if (std::strcmp(local, "title") == 0)
-                item.title = TextOf(child);
+                AssignTextOf(child, values[ItemNode::Title]);
             else if (std::strcmp(local, "creator") == 0)
-                creator = TextOf(child);
+                AssignTextOf(child, scratch.creator);
         } else if (std::strcmp(ns, kUpnpNs) == 0) {
-            if (std::strcmp(local, "class") == 0)
-                item.upnpClass = Trimmed(TextOf(child));
-            else if (std::strcmp(local, "artist") == 0 && !haveArtist) {
-                item.artist = TextOf(child);
+            if (std::strcmp(local, "class") == 0) {
+                AssignTextOf(child, values[ItemNode::Class]);
+                Trim(values[ItemNode::Class]);
+            } else if (std::strcmp(local, "artist") == 0 && !haveArtist) {
+                AssignTextOf(child, values[ItemNode::Artist]);
                 haveArtist = true;
-            } else if (std::strcmp(local, "album") == 0)
-                item.album = TextOf(child);
+            } else if (std::strcmp(local, "album") == 0) {
+                AssignTextOf(child, values[ItemNode::Album]);
+            }
         } else if (std::strcmp(ns, kDidlNs) == 0 && std::strcmp(local, "res") == 0 && !haveRes) {
-            item.res = Trimmed(TextOf(child));
+            AssignTextOf(child, values[ItemNode::Res]);
+            Trim(values[ItemNode::Res]);
             haveRes = true;
         }
     }
     if (!haveArtist)
-        item.artist = creator;
+        values[ItemNode::Artist] = scratch.creator;
+    std::array<std::string_view, ItemNode::kFieldCount> views;
+    for (std::size_t i = 0; i < views.size(); ++i)
+        views[i] = values[i];
+    item.Assign(views);
 }
 
 }  // namespace
@@ -270,11 +294,12 @@ long ParseDidl(char* didl, std::size_t size, std::vector<ItemNode*>& items) {
     if (!Is(root, kDidlNs, "DIDL-Lite"))
         return -1;
     long count = 0;
+    ItemScratch scratch;
     for (pugi::xml_node object : root.children()) {
         if (!Is(object, kDidlNs, "container") && !Is(object, kDidlNs, "item"))
             continue;
         auto* item = new ItemNode;
-        FillItem(object, *item);
+        FillItem(object, *item, scratch);
         items.push_back(item);
         ++count;
     }

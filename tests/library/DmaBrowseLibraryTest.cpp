@@ -148,8 +148,8 @@ TEST(DmaBrowseLibrary, EntitiesOfADtdAreNeverExpanded) {
         "</item></DIDL-Lite>";
     std::vector<ItemNode*> items;
     ASSERT_EQ(ParseDidl(bomb, items), 1);
-    EXPECT_EQ(items[0]->title.find("aaaa"), std::string::npos);
-    EXPECT_EQ(items[0]->title.find("root:"), std::string::npos);
+    EXPECT_EQ(items[0]->title().find("aaaa"), std::string::npos);
+    EXPECT_EQ(items[0]->title().find("root:"), std::string::npos);
     delete items[0];
 }
 
@@ -191,7 +191,7 @@ TEST(DmaBrowseLibrary, SoapReplyParsingFaultsAndMissingResult) {
     std::vector<ItemNode*> items;
     std::string didl = page.ResultText();
     ASSERT_EQ(ParseDidl(didl, items), 1);
-    EXPECT_EQ(items[0]->title, "Seven");
+    EXPECT_EQ(items[0]->title(), "Seven");
     delete items[0];
 }
 
@@ -247,7 +247,7 @@ TEST(DmaBrowseLibrary, ExplicitRequestedCountAsksOnePageOnly) {
     DMAParser parser;
     ASSERT_EQ(parser.Parse(&browse), 0);
     ASSERT_EQ(parser.GetResult()->size(), 30u);
-    EXPECT_EQ(parser.GetResult()->front()->id, "t10");
+    EXPECT_EQ(parser.GetResult()->front()->id(), "t10");
     ASSERT_EQ(server.Requests().size(), 1u);
     EXPECT_EQ(server.Requests()[0].startingIndex, 10);
     EXPECT_EQ(server.Requests()[0].requestedCount, 30);
@@ -266,7 +266,7 @@ TEST(DmaBrowseLibrary, PagingFromAStartingIndexStopsAtTotalMatches) {
     DMAParser parser;
     ASSERT_EQ(parser.Parse(&browse), 0);
     ASSERT_EQ(parser.GetResult()->size(), 90u);
-    EXPECT_EQ(parser.GetResult()->back()->id, "t119");
+    EXPECT_EQ(parser.GetResult()->back()->id(), "t119");
     const std::vector<RecordedRequest> requests = server.Requests();
     ASSERT_EQ(requests.size(), 2u);
     EXPECT_EQ(requests[1].startingIndex, 80);
