@@ -16,6 +16,7 @@
 #include <string>
 #include <vector>
 
+#include "BenchProcess.h"
 #include "CgiRunner.h"
 #include "Fixtures.h"
 #include "Sandbox.h"
@@ -106,31 +107,6 @@ void Print(const char* what, const Run& r, const Run& baseline) {
                 r.wallMs, r.peakKiB / 1024.0, r.wallMs / baseline.wallMs, r.status, r.outputBytes);
 }
 
-// `--exec SIZE COMMAND...`: runs COMMAND with the CGI program appended as its last argument and
-// the CGI environment of the request that lists the container of SIZE children (10000 or 100000),
-// against the same scripted server (profilers: perf, valgrind).
-int ExecAgainstServer(const std::string& size, char** command, int count) {
-    std::vector<std::string> arguments(command, command + count);
-    arguments.push_back(CgiProgram());
-    std::vector<char*> argv;
-    for (std::string& argument : arguments)
-        argv.push_back(argument.data());
-    argv.push_back(nullptr);
-    std::vector<std::string> environment = CgiEnv("action=gettreenode&node=musiclib_big" + size);
-    std::vector<char*> envp;
-    for (std::string& variable : environment)
-        envp.push_back(variable.data());
-    envp.push_back(nullptr);
-    const pid_t pid = fork();
-    if (pid == 0) {
-        execvpe(argv[0], argv.data(), envp.data());
-        _exit(127);
-    }
-    int status = 0;
-    waitpid(pid, &status, 0);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 1;
-}
-
 }  // namespace
 
 int main(int argc, char** argv) {
@@ -186,7 +162,11 @@ int main(int argc, char** argv) {
         }
     }
     if (exec) {
-        const int status = ExecAgainstServer(argv[2], argv + 3, argc - 3);
+        // `--exec SIZE COMMAND...`: COMMAND (a profiler) runs the CGI request that lists the
+        // container of SIZE children (10000 or 100000) against this scripted server.
+        const int status = harmona::bench::RunWrapped(
+            std::vector<std::string>(argv + 3, argv + argc), CgiProgram(),
+            CgiEnv("action=gettreenode&node=musiclib_big" + std::string(argv[2])));
         kill(serverPid, SIGTERM);
         waitpid(serverPid, nullptr, 0);
         return status;

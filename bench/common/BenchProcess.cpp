@@ -37,6 +37,24 @@ long ReadVmHwmKb(pid_t pid) {
 
 }  // namespace
 
+int RunWrapped(std::vector<std::string> command, const std::string& program,
+               std::vector<std::string> environment) {
+    command.push_back(program);
+    std::vector<char*> argv = Pointers(command);
+    std::vector<char*> envp = Pointers(environment);
+    const pid_t pid = fork();
+    if (pid < 0)
+        return 1;
+    if (pid == 0) {
+        execvpe(argv[0], argv.data(), envp.data());
+        _exit(127);
+    }
+    int status = 0;
+    while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
+    }
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 1;
+}
+
 std::vector<std::string> CgiEnvironment(const std::string& queryString, const std::string& user) {
     return {"GATEWAY_INTERFACE=CGI/1.1", "REQUEST_METHOD=GET", "QUERY_STRING=" + queryString,
             "REMOTE_USER=" + user, "PATH=/usr/bin:/bin"};

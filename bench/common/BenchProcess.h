@@ -20,6 +20,12 @@ ProcessRun RunProcess(const std::string& program, const std::vector<std::string>
 // The program's VmHWM in KiB at its exit (-1 when it could not be read); output discarded.
 long PeakMemoryKb(const std::string& program, const std::vector<std::string>& environment);
 
+// Runs `command` with `program` appended as its last argument, with exactly `environment`, and
+// waits for it; its exit status (1 when it did not exit normally). For the benchmarks' --exec
+// modes, which put a profiler (perf, valgrind) in front of the CGI.
+int RunWrapped(std::vector<std::string> command, const std::string& program,
+               std::vector<std::string> environment);
+
 // A GET request's CGI environment.
 std::vector<std::string> CgiEnvironment(const std::string& queryString, const std::string& user);
 

@@ -2,7 +2,6 @@
 // realistic fixture (1,000 personal playlists, 200 smart playlists, 50 shared playlists, an iPod
 // with 50 playlists, a daemon with 30 media servers), wall time and peak memory beside a trivial C
 // CGI in the same run; and what the UI texts cost, parsed once per builder (up to seven times).
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <chrono>
@@ -71,30 +70,6 @@ struct Row {
     long peakKb = -1;
 };
 
-// `--exec USER COMMAND...`: runs COMMAND with the CGI program appended as its last argument and
-// the root request's CGI environment for USER, over the same fixture (profilers: perf, valgrind).
-int ExecOverFixture(const std::string& user, char** command, int count) {
-    std::vector<std::string> arguments(command, command + count);
-    arguments.push_back(CgiProgram());
-    std::vector<char*> argv;
-    for (std::string& argument : arguments)
-        argv.push_back(argument.data());
-    argv.push_back(nullptr);
-    std::vector<std::string> environment = CgiEnvironment(kRootQuery, user);
-    std::vector<char*> envp;
-    for (std::string& variable : environment)
-        envp.push_back(variable.data());
-    envp.push_back(nullptr);
-    const pid_t pid = fork();
-    if (pid == 0) {
-        execvpe(argv[0], argv.data(), envp.data());
-        _exit(127);
-    }
-    int status = 0;
-    waitpid(pid, &status, 0);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 1;
-}
-
 }  // namespace
 
 int main(int argc, char** argv) {
@@ -105,8 +80,11 @@ int main(int argc, char** argv) {
     MakeRealisticFixture();
     ScriptedDaemon daemon(ServeMediaServers(MakeMediaServers(30)));
     WriteUsersConf({{"admin", {"13", ""}}, {"noipod", {"12", ""}}, {"plain", {"16", ""}}});
+    // `--exec USER COMMAND...`: COMMAND (a profiler) runs the root request of USER over this
+    // fixture.
     if (exec)
-        return ExecOverFixture(argv[2], argv + 3, argc - 3);
+        return harmona::bench::RunWrapped(std::vector<std::string>(argv + 3, argv + argc),
+                                          CgiProgram(), CgiEnvironment(kRootQuery, argv[2]));
 
     const std::string cgi = CgiProgram();
     const CgiResult check = Get(kRootQuery);
