@@ -208,7 +208,8 @@ int main(int argc, char** argv) {
             "= %.1f MiB\n",
             b.wallMs / c.wallMs, b.peakKiB / 1024.0, 3 * replyMiB + 10);
         std::printf(
-            "  spec floor / curl wall: %.2fx; floor peak %.1f MiB (its nodes made with FillTreeNode "
+            "  spec floor / curl wall: %.2fx; floor peak %.1f MiB (its nodes made with "
+            "FillTreeNode "
             "into Json::Value and printed, nothing fetched or parsed)\n",
             f.wallMs / c.wallMs, f.peakKiB / 1024.0);
     }

@@ -1,9 +1,9 @@
 // The floor of a listing request under the spec: a process that makes COUNT tree nodes the way
-// every builder must (Part 1.2: HarmonaHandler::FillTreeNode into a Json::Value, Json::Value::append
-// into the children array) and prints them with ActionHandler::PrintResponse, and does nothing
-// else: no request parsing, no fetch, no XML. What a CGI request that lists COUNT children costs
-// beyond this is the part that the code can still win; this much it cannot, while nodes are
-// jsoncpp values.
+// every builder must (Part 1.2: HarmonaHandler::FillTreeNode into a Json::Value,
+// Json::Value::append into the children array) and prints them with ActionHandler::PrintResponse,
+// and does nothing else: no request parsing, no fetch, no XML. What a CGI request that lists COUNT
+// children costs beyond this is the part that the code can still win; this much it cannot, while
+// nodes are jsoncpp values.
 //   bench_node_floor COUNT [TITLE_PREFIX]    (or COUNT from the environment: NODE_COUNT=COUNT)
 #include <cstdio>
 #include <cstdlib>
@@ -22,8 +22,7 @@ int main(int argc, char** argv) {
     Json::Value node;
     for (long i = 0; i < count; ++i) {
         const std::string number = std::to_string(i);
-        handler.FillTreeNode(node, "musiclib_item-" + number, "musiclib_container",
-                             title + number,
+        handler.FillTreeNode(node, "musiclib_item-" + number, "musiclib_container", title + number,
                              "3rdparty/Harmona/images/files_class/icon_container.png", NODE_LEAF);
         children.append(std::move(node));
     }

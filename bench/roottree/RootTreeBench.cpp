@@ -102,14 +102,17 @@ int main(int argc, char** argv) {
         {"root tree, no iPod, no media servers", cgi, CgiEnvironment(kRootQuery, "plain"), {}},
         // What the spec's node record costs alone: as many jsoncpp nodes as the full reply has,
         // made with FillTreeNode and printed, nothing listed or read.
-        {"spec floor: the reply's nodes alone", HARMONA_NODE_FLOOR,
-         {"NODE_COUNT=" + std::to_string(nodes)}, {}},
+        {"spec floor: the reply's nodes alone",
+         HARMONA_NODE_FLOOR,
+         {"NODE_COUNT=" + std::to_string(nodes)},
+         {}},
     };
     // "noipod": permission 4|8, no iPod category; "plain": bit 16 alone, neither iPod nor media
     // servers: the rows show what each category costs.
     for (const Row& row : rows) {
         const harmona::bench::ProcessRun run = RunProcess(row.program, row.environment);
-        std::printf("check: %-34s exit %d, %zu reply bytes\n", row.label, run.exitStatus, run.output.size());
+        std::printf("check: %-34s exit %d, %zu reply bytes\n", row.label, run.exitStatus,
+                    run.output.size());
     }
     for (int i = 0; i < runs; ++i) {
         for (Row& row : rows)

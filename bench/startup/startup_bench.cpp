@@ -33,11 +33,6 @@ extern char** environ;
 
 namespace {
 
-[[noreturn]] void Die(const std::string& what) {
-    std::fprintf(stderr, "bench_startup: %s: %s\n", what.c_str(), std::strerror(errno));
-    std::exit(2);
-}
-
 using harmona::test::MakeDirs;
 using harmona::test::WriteFile;
 

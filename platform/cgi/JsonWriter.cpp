@@ -39,7 +39,6 @@ struct Output {
 
 void WriteValue(const Json::Value& value, Output& out);
 
-
 void WriteEscapedChar(unsigned char c, Output& out) {
     switch (c) {
         case '"':
@@ -86,8 +85,8 @@ bool AllPlain(std::uint64_t word) {
     constexpr std::uint64_t kHighs = 0x8080808080808080ull;
     const auto hasZeroByte = [](std::uint64_t v) { return (v - kOnes) & ~v & kHighs; };
     const std::uint64_t controlOrHigh = ((word - 0x20 * kOnes) | word) & kHighs;
-    return (controlOrHigh | hasZeroByte(word ^ ('"' * kOnes)) | hasZeroByte(word ^ ('\\' * kOnes))) ==
-           0;
+    return (controlOrHigh | hasZeroByte(word ^ ('"' * kOnes)) |
+            hasZeroByte(word ^ ('\\' * kOnes))) == 0;
 }
 
 void WriteString(const char* begin, const char* end, Output& out) {

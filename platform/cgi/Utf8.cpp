@@ -74,5 +74,4 @@ std::string RepairUtf8(std::string_view text) {
     return out;
 }
 
-
 }  // namespace harmona::cgi

@@ -3,8 +3,8 @@
 #include <cstdio>
 #include <cstring>
 
-#include "curl/Easy.h"
 #include "HttpPost.h"
+#include "curl/Easy.h"
 
 namespace {
 

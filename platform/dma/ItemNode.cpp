@@ -8,10 +8,14 @@ struct KeyField {
 };
 
 constexpr KeyField kKeys[] = {
-    {"id", ItemNode::Id},         {"parentID", ItemNode::ParentId},
-    {"title", ItemNode::Title},   {"class", ItemNode::Class},
-    {"childCount", ItemNode::ChildCount}, {"artist", ItemNode::Artist},
-    {"album", ItemNode::Album},   {"res", ItemNode::Res},
+    {"id", ItemNode::Id},
+    {"parentID", ItemNode::ParentId},
+    {"title", ItemNode::Title},
+    {"class", ItemNode::Class},
+    {"childCount", ItemNode::ChildCount},
+    {"artist", ItemNode::Artist},
+    {"album", ItemNode::Album},
+    {"res", ItemNode::Res},
 };
 
 }  // namespace

@@ -4,8 +4,8 @@
 #include <cstdio>
 
 #include "ActionHandler.h"
-#include "JsonWriter.h"
 #include "CgiRunner.h"
+#include "JsonWriter.h"
 #include "Utf8.h"
 #include "WebUtils.h"
 
@@ -161,8 +161,8 @@ std::string EscapedByteAtATime(const std::string& text) {
 }
 
 TEST(PrintResponse, EveryByteThatNeedsEscapingIsFoundAtEveryOffset) {
-    for (const std::string special : {"\x01", "\x1F", "\"", "\\", "\n", "\xC3\xA9", "\xFF", "\xE6\x97",
-                                      "\x7F", " ", "~"}) {
+    for (const std::string special :
+         {"\x01", "\x1F", "\"", "\\", "\n", "\xC3\xA9", "\xFF", "\xE6\x97", "\x7F", " ", "~"}) {
         for (std::size_t offset = 0; offset < 20; ++offset) {
             const std::string text = std::string(offset, 'a') + special + std::string(19, 'z');
             EXPECT_EQ(SerializeReply(Json::Value(text)), EscapedByteAtATime(text))
