@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <pugixml.hpp>
+#include <string_view>
 
 #include "ItemNode.h"
 
@@ -126,19 +127,26 @@ pugi::xml_node FindArgument(pugi::xml_node parent, const char* local) {
     return {};
 }
 
-// All character data directly inside `element` (text and CDATA pieces joined).
-std::string TextOf(pugi::xml_node element) {
-    std::string text;
+// XML's white space, trimmed from values that are not free text.
+constexpr const char* kXmlSpace = " \t\r\n";
+
+// All character data directly inside `element` (text and CDATA pieces joined) into `out`, whose
+// buffer is reused.
+void AssignTextOf(pugi::xml_node element, std::string& out) {
+    out.clear();
     for (pugi::xml_node child : element.children())
         if (child.type() == pugi::node_pcdata || child.type() == pugi::node_cdata)
-            text += child.value();
+            out += child.value();
+}
+
+std::string TextOf(pugi::xml_node element) {
+    std::string text;
+    AssignTextOf(element, text);
     return text;
 }
 
 unsigned long ToUnsigned(const std::string& text) {
-    const char* begin = text.c_str();
-    while (*begin == ' ' || *begin == '\t' || *begin == '\r' || *begin == '\n')
-        ++begin;
+    const char* begin = text.c_str() + std::strspn(text.c_str(), kXmlSpace);
     if (*begin < '0' || *begin > '9')
         return 0;
     return std::strtoul(begin, nullptr, 10);
@@ -153,10 +161,7 @@ bool ParseInPlace(pugi::xml_document& document, char* text, std::size_t size) {
 }
 
 bool IsBlank(const char* text, std::size_t size) {
-    for (std::size_t i = 0; i < size; ++i)
-        if (text[i] != ' ' && text[i] != '\t' && text[i] != '\r' && text[i] != '\n')
-            return false;
-    return true;
+    return std::string_view(text, size).find_first_not_of(kXmlSpace) == std::string_view::npos;
 }
 
 // Points `page` at the text of Result: in place when it is one piece of character data (pugixml
@@ -226,18 +231,10 @@ struct ItemScratch {
     std::string creator;
 };
 
-// All character data directly inside `element` (text and CDATA pieces joined) into `out`.
-void AssignTextOf(pugi::xml_node element, std::string& out) {
-    out.clear();
-    for (pugi::xml_node child : element.children())
-        if (child.type() == pugi::node_pcdata || child.type() == pugi::node_cdata)
-            out += child.value();
-}
-
 void Trim(std::string& text) {
-    const std::size_t last = text.find_last_not_of(" \t\r\n");
+    const std::size_t last = text.find_last_not_of(kXmlSpace);
     text.erase(last == std::string::npos ? 0 : last + 1);
-    text.erase(0, text.find_first_not_of(" \t\r\n"));
+    text.erase(0, text.find_first_not_of(kXmlSpace));
 }
 
 void FillItem(pugi::xml_node object, ItemNode& item, ItemScratch& scratch) {

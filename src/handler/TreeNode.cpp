@@ -12,10 +12,10 @@ namespace {
 constexpr unsigned int kNodeFlagMask = 31;
 
 // A node of the given shape, its texts left null (cheaper to copy than "", and every one of them
-// is written after the copy). Inserting ten members into jsoncpp's ordered map
-// costs ten searches and ten inserts per node; copying a finished node of the same shape clones
-// the map without a single comparison, which makes a large listing about a third faster
-// (bench/roottree, bench/browse). The member names are static texts, so the copies share them.
+// is written after the copy). Inserting ten members into jsoncpp's ordered map costs ten searches
+// and ten inserts per node; copying a finished node of the same shape clones the map without a
+// single comparison, which makes a large listing about a third faster (bench/roottree,
+// bench/browse). The member names are static texts, so the copies share them.
 const Json::Value& NodeOfShape(bool hasPid, bool hasIcon, unsigned int flags) {
     static std::array<Json::Value, 4 * (kNodeFlagMask + 1)> shapes;
     Json::Value& shape = shapes[((hasPid ? 2u : 0u) + (hasIcon ? 1u : 0u)) * (kNodeFlagMask + 1) +
