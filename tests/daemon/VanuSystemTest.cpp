@@ -1,5 +1,7 @@
-// platform.md section 5: configuration, shares, services and the CORX helpers that Part 6.2 and
-// Part 2.1 call, against real files at their fixed paths inside the sandbox.
+// The system helpers that the equalizer profile lookup and the root tree call (platform/README.md,
+// "System configuration, shares and services"): audio.conf lookup, the audio share, service
+// status and the CORX string and file helpers, against real files at their fixed paths inside the
+// sandbox.
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -15,21 +17,21 @@ using namespace harmona::test;
 
 namespace {
 
-TEST(Platform_5, ConfGetCopiesTheValueAndReturnsItsLength) {
+TEST(SystemConfiguration, ConfGetCopiesTheValueAndReturnsItsLength) {
     WriteFile(kAudioConf, "# comment\naudio_default_equalizer = Rock \n[section]\nother=1\n");
     char buffer[64];
     EXPECT_EQ(VANUAudioConfGet("audio_default_equalizer", buffer, sizeof(buffer)), 4);
     EXPECT_STREQ(buffer, "Rock");
 }
 
-TEST(Platform_5, ConfGetReadsOnlyKeysOutsideSections) {
+TEST(SystemConfiguration, ConfGetReadsOnlyKeysOutsideSections) {
     WriteFile(kAudioConf, "[section]\naudio_default_equalizer=Rock\n");
     char buffer[64] = "keep";
     EXPECT_EQ(VANUAudioConfGet("audio_default_equalizer", buffer, sizeof(buffer)), 0);
     EXPECT_STREQ(buffer, "keep");
 }
 
-TEST(Platform_5, ConfGetCutsToTheBufferButReturnsTheFullLength) {
+TEST(SystemConfiguration, ConfGetCutsToTheBufferButReturnsTheFullLength) {
     WriteFile(kAudioConf, "key=\"abcdefghij\"\n");
     char buffer[5];
     EXPECT_EQ(VANUAudioConfGet("key", buffer, sizeof(buffer)), 10);
@@ -39,7 +41,7 @@ TEST(Platform_5, ConfGetCutsToTheBufferButReturnsTheFullLength) {
     EXPECT_STREQ(one, "");
 }
 
-TEST(Platform_5, ConfGetGivesZeroForAbsentOrEmptyValuesAndAMissingFile) {
+TEST(SystemConfiguration, ConfGetGivesZeroForAbsentOrEmptyValuesAndAMissingFile) {
     char buffer[16];
     EXPECT_EQ(VANUAudioConfGet("key", buffer, sizeof(buffer)), 0);  // no file
     WriteFile(kAudioConf, "key=\nquoted=\"\"\n");
@@ -48,7 +50,7 @@ TEST(Platform_5, ConfGetGivesZeroForAbsentOrEmptyValuesAndAMissingFile) {
     EXPECT_EQ(VANUAudioConfGet("absent", buffer, sizeof(buffer)), 0);
 }
 
-TEST(Platform_5, ConfGetRefusesBadArgumentsAndAnUnreadableFile) {
+TEST(SystemConfiguration, ConfGetRefusesBadArgumentsAndAnUnreadableFile) {
     WriteFile(kAudioConf, "key=1\n");
     char buffer[16];
     EXPECT_EQ(VANUAudioConfGet(nullptr, buffer, sizeof(buffer)), -1);
@@ -60,14 +62,14 @@ TEST(Platform_5, ConfGetRefusesBadArgumentsAndAnUnreadableFile) {
     EXPECT_EQ(VANUAudioConfGet("key", buffer, sizeof(buffer)), -1);
 }
 
-TEST(Platform_5, ConfGetLastOfTwoEqualKeysCounts) {
+TEST(SystemConfiguration, ConfGetLastOfTwoEqualKeysCounts) {
     WriteFile(kAudioConf, "\xEF\xBB\xBFkey=first\r\nkey=second\r\n");
     char buffer[16];
     EXPECT_EQ(VANUAudioConfGet("key", buffer, sizeof(buffer)), 6);
     EXPECT_STREQ(buffer, "second");
 }
 
-TEST(Platform_5, TrimSpaceRemovesWhiteSpaceAroundInPlace) {
+TEST(SystemConfiguration, TrimSpaceRemovesWhiteSpaceAroundInPlace) {
     char text[] = " \t 1.0 2.0 \r\n";
     EXPECT_GE(CORXStrTrimSpace(text, 0), 0);
     EXPECT_STREQ(text, "1.0 2.0");
@@ -83,7 +85,7 @@ TEST(Platform_5, TrimSpaceRemovesWhiteSpaceAroundInPlace) {
     EXPECT_LT(CORXStrTrimSpace(nullptr, 0), 0);
 }
 
-TEST(Platform_5, FileExistFollowsStat) {
+TEST(SystemConfiguration, FileExistFollowsStat) {
     EXPECT_EQ(CORXFileExist("/tmp/none"), 0);
     EXPECT_EQ(CORXFileExist(nullptr), 0);
     WriteFile("/tmp/some", "x");
@@ -91,7 +93,7 @@ TEST(Platform_5, FileExistFollowsStat) {
     EXPECT_NE(CORXFileExist("/tmp"), 0);
 }
 
-TEST(Platform_5, HasShareLooksAtTheDefaultShareFolder) {
+TEST(SystemConfiguration, HasShareLooksAtTheDefaultShareFolder) {
     EXPECT_EQ(VANUAudioHasShare(), 0);
     WriteFile("/volume1/music", "a file, not a folder");
     EXPECT_EQ(VANUAudioHasShare(), 0);
@@ -100,7 +102,7 @@ TEST(Platform_5, HasShareLooksAtTheDefaultShareFolder) {
     EXPECT_NE(VANUAudioHasShare(), 0);
 }
 
-TEST(Platform_5, HasShareFollowsTheConfiguredSharePath) {
+TEST(SystemConfiguration, HasShareFollowsTheConfiguredSharePath) {
     MakeDirs("/volume1/music");
     WriteFile(kAudioConf, "audio_share_path=/volume1/audio\n");
     EXPECT_EQ(VANUAudioHasShare(), 0);
@@ -108,7 +110,7 @@ TEST(Platform_5, HasShareFollowsTheConfiguredSharePath) {
     EXPECT_NE(VANUAudioHasShare(), 0);
 }
 
-TEST(Platform_5, ServiceStatusReadsThePidFile) {
+TEST(SystemConfiguration, ServiceStatusReadsThePidFile) {
     EXPECT_EQ(VANUServiceStatusGet(3), 0);  // no pid file
     WriteFile("/run/vanu/service/3.pid", std::to_string(getpid()) + "\n");
     EXPECT_EQ(VANUServiceStatusGet(3), 1);
@@ -126,7 +128,7 @@ TEST(Platform_5, ServiceStatusReadsThePidFile) {
     EXPECT_EQ(VANUServiceStatusGet(3), 0);
 }
 
-TEST(Platform_5, ServiceStatusOfAnEndedProcessIsZero) {
+TEST(SystemConfiguration, ServiceStatusOfAnEndedProcessIsZero) {
     const pid_t child = fork();
     ASSERT_GE(child, 0);
     if (child == 0)
@@ -136,7 +138,7 @@ TEST(Platform_5, ServiceStatusOfAnEndedProcessIsZero) {
     EXPECT_EQ(VANUServiceStatusGet(3), 0);
 }
 
-TEST(Platform_5, ServiceStatusOutsideOneToSixtyFourIsMinusOne) {
+TEST(SystemConfiguration, ServiceStatusOutsideOneToSixtyFourIsMinusOne) {
     EXPECT_EQ(VANUServiceStatusGet(0), -1);
     EXPECT_EQ(VANUServiceStatusGet(65), -1);
     EXPECT_EQ(VANUServiceStatusGet(-3), -1);

@@ -1,5 +1,5 @@
-// The iPod library of platform.md section 8 (VANUIPodPlaylistGetAll) over real iPod databases, and
-// its plugin called directly.
+// The iPod library (VANUIPodPlaylistGetAll; platform/README.md, "iPod") over real iPod databases,
+// and its plugin called directly.
 #include <gtest/gtest.h>
 #include <sys/mount.h>
 #include <sys/stat.h>

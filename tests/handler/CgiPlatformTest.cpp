@@ -1,5 +1,5 @@
-// platform.md section 3 through the real CGI: parameters from the query string and a urlencoded
-// POST body, as the exit status of "avoid_timeout" (1) and of an unknown action (0) shows them.
+// Request parameters through the real CGI, from the query string and from a urlencoded POST body,
+// as the exit status of "avoid_timeout" (1) and of an unknown action (0) shows them.
 #include <gtest/gtest.h>
 
 #include "CgiRunner.h"

@@ -1,4 +1,4 @@
-// Writers of the fixtures that tests put into the sandbox's fixed paths (platform.md section 1).
+// Writers of the fixtures that tests put into the sandbox's fixed paths.
 #pragma once
 
 #include <map>
@@ -7,7 +7,7 @@
 
 namespace harmona::test {
 
-// Paths of platform.md section 1.
+// Fixed paths of the installed system (platform/README.md, "Fixed paths").
 inline constexpr const char* kTextsDir = "/var/packages/Harmona/target/app/texts/";
 inline constexpr const char* kUsersConf = "/var/packages/Harmona/etc/users.conf";
 inline constexpr const char* kAudioConf = "/var/packages/Harmona/etc/audio.conf";

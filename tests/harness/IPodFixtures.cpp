@@ -14,7 +14,7 @@ std::string IPodDatabasePath(const std::string& mountpoint) {
 }
 
 std::vector<std::uint64_t> WriteIPodDatabaseWithIds(const std::string& mountpoint,
-                                                    const std::vector<IPodPlaylistSpec>& playlists,
+                                                    const std::vector<IPodPlaylistEntry>& playlists,
                                                     bool withMaster) {
     // itdb_write needs the iTunes folder; a real iPod has it.
     MakeDirs(mountpoint + "/iPod_Control/iTunes");
@@ -27,9 +27,9 @@ std::vector<std::uint64_t> WriteIPodDatabaseWithIds(const std::string& mountpoin
         itdb_playlist_add(database.Get(), master, -1);
     }
     std::vector<std::uint64_t> ids;
-    for (const IPodPlaylistSpec& spec : playlists) {
-        Itdb_Playlist* playlist = itdb_playlist_new(spec.name.c_str(), FALSE);
-        playlist->id = spec.id;  // itdb_playlist_add gives a zero id a random unique one
+    for (const IPodPlaylistEntry& entry : playlists) {
+        Itdb_Playlist* playlist = itdb_playlist_new(entry.name.c_str(), FALSE);
+        playlist->id = entry.id;  // itdb_playlist_add gives a zero id a random unique one
         itdb_playlist_add(database.Get(), playlist, -1);
         ids.push_back(playlist->id);
     }
@@ -41,10 +41,10 @@ std::vector<std::uint64_t> WriteIPodDatabaseWithIds(const std::string& mountpoin
 
 std::vector<std::uint64_t> WriteIPodDatabase(const std::string& mountpoint,
                                              const std::vector<std::string>& names) {
-    std::vector<IPodPlaylistSpec> specs;
+    std::vector<IPodPlaylistEntry> entries;
     for (const std::string& name : names)
-        specs.push_back({name, 0});
-    return WriteIPodDatabaseWithIds(mountpoint, specs);
+        entries.push_back({name, 0});
+    return WriteIPodDatabaseWithIds(mountpoint, entries);
 }
 
 void WriteIPodMountpointFile(const std::string& content) {

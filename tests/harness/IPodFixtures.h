@@ -1,7 +1,7 @@
 // Real iPod databases for tests, written with libgpod itself (itdb_new, itdb_playlist_add,
-// itdb_write), and the mountpoint file that attaches them (platform.md section 8). Linked through
-// the separate library harmona_testkit_ipod, so that only the test programs that use it load
-// libgpod.
+// itdb_write), and the mountpoint file that attaches them (platform/README.md, "iPod"). Linked
+// through the separate library harmona_testkit_ipod, so that only the test programs that use it
+// load libgpod.
 #pragma once
 
 #include <cstdint>
@@ -17,7 +17,7 @@ inline constexpr const char* kDefaultIPodMountpoint = "/tmp/ipod";
 // The name of the master playlist that every written database holds (never listed by the tree).
 inline constexpr const char* kIPodMasterPlaylistName = "iPod Master Library";
 
-struct IPodPlaylistSpec {
+struct IPodPlaylistEntry {
     std::string name;
     std::uint64_t id = 0;  // 0: libgpod picks a random unique id
 };
@@ -26,7 +26,7 @@ struct IPodPlaylistSpec {
 // `withMaster` is false) and then `playlists` in the given order. Returns the playlists' 64-bit ids
 // in that order (the master's not included). Throws std::runtime_error when libgpod fails.
 std::vector<std::uint64_t> WriteIPodDatabaseWithIds(const std::string& mountpoint,
-                                                    const std::vector<IPodPlaylistSpec>& playlists,
+                                                    const std::vector<IPodPlaylistEntry>& playlists,
                                                     bool withMaster = true);
 std::vector<std::uint64_t> WriteIPodDatabase(const std::string& mountpoint,
                                              const std::vector<std::string>& names);

@@ -1,7 +1,7 @@
-// Fixture writers for the playlists (platform.md sections 6 and 7): a real library.db made with
-// SQLite, personal playlist files, smart playlist files, a writer that holds the database locked,
-// and a reader of the extended M3U files that the random playlist generator writes. For the
-// playlist tests and for any test of the whole tree (root tree, refresh) that needs playlists.
+// Fixture writers for the playlists: a real library.db made with SQLite, personal playlist files,
+// smart playlist files, a writer that holds the database locked, and a reader of the extended M3U
+// files that the random playlist generator writes. For the playlist tests and for any test of the
+// whole tree (root tree, refresh) that needs playlists.
 #pragma once
 
 #include <cstdint>
@@ -28,8 +28,9 @@ struct SharedPlaylistRow {
     std::string name;
 };
 
-// Creates (or replaces) the database at `path` with the schema of platform.md section 6
-// (user_version 1) and the given rows, in one transaction.
+// Creates (or replaces) the database at `path` with the music library's schema (user_version 1;
+// platform/README.md, "Music library database and random-100 playlist") and the given rows, in one
+// transaction.
 void MakeLibraryDb(const std::vector<TrackRow>& tracks,
                    const std::vector<SharedPlaylistRow>& playlists = {},
                    const std::string& path = kLibraryDb);

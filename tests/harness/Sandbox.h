@@ -8,7 +8,8 @@
 
 namespace harmona::test {
 
-// The fixed roots of platform.md section 1 that get a fresh tmpfs for every test.
+// The program's fixed roots (platform/README.md, "Fixed paths"); each gets a fresh tmpfs for
+// every test.
 const std::vector<std::string>& SandboxRoots();
 
 // Enters the namespaces once per process; aborts the process with a clear message when that is not

@@ -1,5 +1,5 @@
-// A scripted stand-in for the audio daemon vanuaudiod (spec Part 6.1, platform.md section 10), for
-// tests inside the sandbox. It listens on /tmp/vanuaudiod.sock in a thread of the test process, so
+// A scripted audio daemon in place of vanuaudiod (platform/README.md, "Audio daemon"), for tests
+// inside the sandbox. It listens on /tmp/vanuaudiod.sock in a thread of the test process, so
 // both in-process daemon clients and the real CGI (a child process in the same namespaces) reach
 // it. It records every request record as received (all 8196 bytes) and answers each from a script:
 // a reply text, after a delay, in pieces, oversized, not JSON, never, or by closing without answer.
@@ -123,7 +123,7 @@ Json::Value MediaServerElement(const MediaServer& server);
 // The reply to command 16 "offset count": {"success": true, "list": [...], "total": N}.
 std::string MediaServerPage(const std::vector<MediaServer>& servers, int offset, int count);
 
-// The script of a daemon holding `servers`, as platform.md section 10 describes the real one:
+// The script of a daemon holding `servers`, answering as the real one does:
 // 14 -> {"success": true}; 16 "offset count" -> MediaServerPage; any other code ->
 // {"success": false, "error": "unsupported"}.
 DaemonScript ServeMediaServers(std::vector<MediaServer> servers);

@@ -1,8 +1,8 @@
 // A scripted HTTP server for tests, on 127.0.0.1:<port> in a thread of the test process: it records
 // every request and answers each one from a script. Made for the ContentDirectory of the local
-// media server (platform.md section 9: 127.0.0.1:50003, /ContentDirectory/control), with helpers
-// that write SOAP replies and DIDL-Lite, and a ContentTree that serves a whole container tree with
-// paging.
+// media server (127.0.0.1:50003, /ContentDirectory/control; platform/README.md, "Local media
+// server and browse library"), with helpers that write SOAP replies and DIDL-Lite, and a
+// ContentTree that serves a whole container tree with paging.
 //
 // Use:
 //   ScriptedHttpServer server;                 // port 50003

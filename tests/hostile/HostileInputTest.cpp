@@ -1,6 +1,6 @@
-// Hostile input through the real CGI (issue 11): every request, file, database, daemon and media
-// server answer below comes from someone who wants the program to crash, hang, eat memory or write
-// where it should not. Each test checks the reply the spec implies, that the program ended by
+// Hostile input through the real CGI: every request, file, database, daemon and media server
+// answer below comes from someone who wants the program to crash, hang, eat memory or write where
+// it should not. Each test checks the reply the program gives such input, that the program ended by
 // itself within its time limit, its peak memory, and that no file changed but the one the action
 // writes.
 #include <gtest/gtest.h>
@@ -170,7 +170,7 @@ TEST_F(Hostile, EveryActionWithEveryParameterMissingOrEmpty) {
     for (const std::string& query : queries) {
         const CgiResult r = RunQuery(query);
         EXPECT_TRUE(r.exited) << query;
-        // Nothing printed exactly when Part 1.1 says so; otherwise one JSON reply.
+        // Some print nothing (no action, or no node); whatever is printed is one JSON reply.
         if (!r.output.empty())
             EXPECT_TRUE(r.jsonOk) << query << ": " << r.output;
     }
@@ -232,7 +232,7 @@ TEST_F(Hostile, MediaServerReplyOfTenMillionObjectsIsRefused) {
     RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
 }
 
-// 200,000 objects fit the limit: the spec turns the whole list into nodes (Part 3.1), so memory
+// 200,000 objects fit the limit: the music library turns the whole list into nodes, so memory
 // grows with the list; recorded here, bounded by the 64 MiB reply limit.
 TEST_F(Hostile, MediaServerWithTwoHundredThousandObjects) {
     ScriptedHttpServer server;

@@ -1,6 +1,7 @@
-// The browse library (platform.md section 9) against a real MiniDLNA, started inside the sandbox on
-// a port of its own over a generated music folder: a few hundred tagged tracks in album folders,
-// and one folder of thousands of tracks, so large that MiniDLNA cuts its Browse reply at 2 MiB.
+// The browse library (platform/README.md, "Local media server and browse library") against a real
+// MiniDLNA, started inside the sandbox on a port of its own over a generated music folder: a few
+// hundred tagged tracks in album folders, and one folder of thousands of tracks, so large that
+// MiniDLNA cuts its Browse reply at 2 MiB.
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/wait.h>

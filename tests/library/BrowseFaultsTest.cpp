@@ -1,5 +1,6 @@
-// Part 3.1 with a broken or hostile media server: every fault ends the request quickly with the
-// empty reply and exit status 0, never a crash or a hang (platform.md section 9's limits).
+// The music library subtree with a broken or hostile media server: every fault ends the request
+// quickly with the empty reply and exit status 0, never a crash or a hang (the browse library's
+// limits: platform/README.md, "Local media server and browse library").
 #include <gtest/gtest.h>
 #include <netinet/in.h>
 #include <sys/resource.h>
@@ -13,11 +14,12 @@ using namespace harmona::test;
 
 namespace {
 
-class Part_3_1_Faults : public ::testing::Test {
+class MusicLibraryBrowseFaults : public ::testing::Test {
   protected:
     void SetUp() override { LibraryFixture(); }
 
-    // Runs the CGI for a browse and checks the failure reply of Part 2.2 (empty, exit 0).
+    // Runs the CGI for a browse and checks the failure reply of the child node routing (empty,
+    // exit 0).
     CgiResult ExpectFailedBrowse(int timeoutMs = 30000) {
         CgiRequest request;
         request.queryString = Query({{"action", "gettreenode"}, {"node", "musiclib_music_all"}});
@@ -39,12 +41,12 @@ long ChildrenPeakKiB() {
     return usage.ru_maxrss;
 }
 
-TEST_F(Part_3_1_Faults, ConnectionRefused) {
+TEST_F(MusicLibraryBrowseFaults, ConnectionRefused) {
     const CgiResult r = ExpectFailedBrowse();
     EXPECT_LT(r.wallMs, 5000);
 }
 
-TEST_F(Part_3_1_Faults, ServerThatNeverAcceptsFailsAfterTheConnectLimit) {
+TEST_F(MusicLibraryBrowseFaults, ServerThatNeverAcceptsFailsAfterTheConnectLimit) {
     // A listener whose accept queue is full: further SYNs are dropped, so connect never completes.
     const int listener = socket(AF_INET, SOCK_STREAM, 0);
     sockaddr_in address{};
@@ -68,7 +70,7 @@ TEST_F(Part_3_1_Faults, ServerThatNeverAcceptsFailsAfterTheConnectLimit) {
     close(listener);
 }
 
-TEST_F(Part_3_1_Faults, Http500WithAValidBrowseBodyFails) {
+TEST_F(MusicLibraryBrowseFaults, Http500WithAValidBrowseBodyFails) {
     server.Enqueue(
         Reply(BrowseResponseBody(DidlLite({{true, "1", "music_all", "One"}}), 1, 1), 500));
     ASSERT_TRUE(server.Start());
@@ -76,13 +78,13 @@ TEST_F(Part_3_1_Faults, Http500WithAValidBrowseBodyFails) {
     EXPECT_EQ(server.Requests().size(), 1u);
 }
 
-TEST_F(Part_3_1_Faults, SoapFaultWithStatus200Fails) {
+TEST_F(MusicLibraryBrowseFaults, SoapFaultWithStatus200Fails) {
     server.Enqueue(Reply(SoapFaultBody(701, "No such object")));
     ASSERT_TRUE(server.Start());
     ExpectFailedBrowse();
 }
 
-TEST_F(Part_3_1_Faults, MalformedXmlFails) {
+TEST_F(MusicLibraryBrowseFaults, MalformedXmlFails) {
     for (const std::string& body :
          {std::string(
               "<s:Envelope xmlns:s=\"http://schemas.xmlsoap.org/soap/envelope/\"><s:Body><u:Brow"),
@@ -98,7 +100,7 @@ TEST_F(Part_3_1_Faults, MalformedXmlFails) {
     }
 }
 
-TEST_F(Part_3_1_Faults, ConnectionClosedWithoutReplyFails) {
+TEST_F(MusicLibraryBrowseFaults, ConnectionClosedWithoutReplyFails) {
     ScriptedReply reply;
     reply.closeWithoutReply = true;
     server.Enqueue(reply);
@@ -106,7 +108,7 @@ TEST_F(Part_3_1_Faults, ConnectionClosedWithoutReplyFails) {
     ExpectFailedBrowse();
 }
 
-TEST_F(Part_3_1_Faults, ReplyThatNeverEndsIsCutAtTheWholeReplyLimit) {
+TEST_F(MusicLibraryBrowseFaults, ReplyThatNeverEndsIsCutAtTheWholeReplyLimit) {
     // Headers at once, then one byte a second forever: only the 20-second whole-reply limit ends
     // it.
     ScriptedReply reply =
@@ -122,7 +124,7 @@ TEST_F(Part_3_1_Faults, ReplyThatNeverEndsIsCutAtTheWholeReplyLimit) {
     EXPECT_LE(r.wallMs, 25000);
 }
 
-TEST_F(Part_3_1_Faults, OversizedReplyIsRefusedAndTheTransferAborted) {
+TEST_F(MusicLibraryBrowseFaults, OversizedReplyIsRefusedAndTheTransferAborted) {
     // A valid beginning, then 80 MiB of padding announced by Content-Length.
     ScriptedReply reply =
         Reply(BrowseResponseBody(DidlLite({{true, "1", "music_all", "One"}}), 1, 1));
@@ -139,7 +141,7 @@ TEST_F(Part_3_1_Faults, OversizedReplyIsRefusedAndTheTransferAborted) {
     EXPECT_LT(ChildrenPeakKiB(), 400 * 1024);
 }
 
-TEST_F(Part_3_1_Faults, ReplyJustUnderTheLimitIsAccepted) {
+TEST_F(MusicLibraryBrowseFaults, ReplyJustUnderTheLimitIsAccepted) {
     // 60 MiB of trailing white space after the envelope: well-formed, under 64 MiB.
     ScriptedReply reply =
         Reply(BrowseResponseBody(DidlLite({{true, "1", "music_all", "One"}}), 1, 1));
@@ -163,7 +165,7 @@ std::string Bomb() {
     return dtd + "]>";
 }
 
-TEST_F(Part_3_1_Faults, EntityExpansionBombIsHarmless) {
+TEST_F(MusicLibraryBrowseFaults, EntityExpansionBombIsHarmless) {
     // The bomb twice: in the SOAP envelope's DTD, and inside the DIDL-Lite document of Result.
     const std::string didl = "<?xml version=\"1.0\"?>" + Bomb() +
                              "<DIDL-Lite xmlns=\"urn:schemas-upnp-org:metadata-1-0/DIDL-Lite/\" "
@@ -189,7 +191,7 @@ TEST_F(Part_3_1_Faults, EntityExpansionBombIsHarmless) {
     }
 }
 
-TEST_F(Part_3_1_Faults, ExternalEntityIsNeverFetched) {
+TEST_F(MusicLibraryBrowseFaults, ExternalEntityIsNeverFetched) {
     WriteFile("/tmp/secret", "TOPSECRET");
     const std::string didl =
         "<?xml version=\"1.0\"?><!DOCTYPE d [<!ENTITY x SYSTEM \"file:///tmp/secret\">]>"
@@ -203,7 +205,7 @@ TEST_F(Part_3_1_Faults, ExternalEntityIsNeverFetched) {
     EXPECT_EQ(r.body.find("TOPSECRET"), std::string::npos);
 }
 
-TEST_F(Part_3_1_Faults, ServerCappingPagesAt50StillYieldsEveryChild) {
+TEST_F(MusicLibraryBrowseFaults, ServerCappingPagesAt50StillYieldsEveryChild) {
     ContentTree tree;
     tree.AddManyItems("music_all", 237, "track-");
     server.ServeTree(tree, /*pageCap=*/50);
@@ -227,7 +229,7 @@ TEST_F(Part_3_1_Faults, ServerCappingPagesAt50StillYieldsEveryChild) {
     }
 }
 
-TEST_F(Part_3_1_Faults, FailureOnALaterPageFailsTheWholeBrowse) {
+TEST_F(MusicLibraryBrowseFaults, FailureOnALaterPageFailsTheWholeBrowse) {
     ContentTree tree;
     tree.AddManyItems("music_all", 120, "t");
     const ScriptedReply firstPage = tree.Answer(
@@ -248,7 +250,7 @@ TEST_F(Part_3_1_Faults, FailureOnALaterPageFailsTheWholeBrowse) {
     EXPECT_EQ(server.Requests().size(), 2u);
 }
 
-TEST_F(Part_3_1_Faults, ObjectIdWithMarkupQuotesAndNonAsciiArrivesIntact) {
+TEST_F(MusicLibraryBrowseFaults, ObjectIdWithMarkupQuotesAndNonAsciiArrivesIntact) {
     const std::string objectId = "a&b<c>\"d'e \xC3\xA9\xE2\x82\xAC\xF0\x9F\x8E\xB5 &amp; ]]>";
     ContentTree tree;
     tree.AddContainer("0", objectId, "Strange");
@@ -265,7 +267,7 @@ TEST_F(Part_3_1_Faults, ObjectIdWithMarkupQuotesAndNonAsciiArrivesIntact) {
     EXPECT_EQ(server.Requests()[0].objectId, objectId);
 }
 
-TEST_F(Part_3_1_Faults, DribbledReplyWithinTheLimitIsReadWhole) {
+TEST_F(MusicLibraryBrowseFaults, DribbledReplyWithinTheLimitIsReadWhole) {
     ContentTree tree;
     tree.AddManyItems("music_all", 20, "d");
     RecordedRequest request;

@@ -1,5 +1,6 @@
-// The browse library of platform.md section 9 beneath Part 3.1: the SOAP envelope, its escaping,
-// the parsing of SOAP replies and DIDL-Lite, and DMAParser against a scripted server.
+// The browse library beneath the music library subtree (platform/README.md, "Local media server
+// and browse library"): the SOAP envelope, its escaping, the parsing of SOAP replies and
+// DIDL-Lite, and DMAParser against a scripted server.
 #include <gtest/gtest.h>
 
 #include <pugixml.hpp>

@@ -1,5 +1,5 @@
 // Only the requests that browse may pay for the HTTP client: audiotree.cgi must not link libcurl,
-// and a request that does not browse must not load it (issue 3, point 5).
+// and a request that does not browse must not load it.
 #include <elf.h>
 #include <gtest/gtest.h>
 

@@ -1,4 +1,4 @@
-// Issue 8 item 1: harmona-index over a share generated with sox and tagged with TagLib.
+// The library indexer: harmona-index over a share generated with sox and tagged with TagLib.
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 #include <sys/stat.h>
@@ -69,7 +69,7 @@ void SetMtime(const std::string& path, time_t when) {
     utime(path.c_str(), &times);
 }
 
-TEST(Issue8_Indexer, IndexesEveryAudioFileOfTheShareWithItsTags) {
+TEST(Indexer, IndexesEveryAudioFileOfTheShareWithItsTags) {
     MakeStandardShare();
     const IndexRun run = RunIndexer();
     ASSERT_EQ(run.exitStatus, 0) << run.output;
@@ -105,7 +105,7 @@ TEST(Issue8_Indexer, IndexesEveryAudioFileOfTheShareWithItsTags) {
     EXPECT_EQ(Scalar("SELECT COUNT(*) FROM playlist_entry"), 0);
 }
 
-TEST(Issue8_Indexer, SecondRunOverAnUnchangedShareReadsNoTags) {
+TEST(Indexer, SecondRunOverAnUnchangedShareReadsNoTags) {
     MakeStandardShare();
     ASSERT_EQ(RunIndexer().exitStatus, 0);
     const auto before = TrackRows();
@@ -121,7 +121,7 @@ TEST(Issue8_Indexer, SecondRunOverAnUnchangedShareReadsNoTags) {
         EXPECT_EQ(after.at(path).columns, row.columns) << path;
 }
 
-TEST(Issue8_Indexer, ChangedFilesAreReReadAndMissingFilesRemoved) {
+TEST(Indexer, ChangedFilesAreReReadAndMissingFilesRemoved) {
     MakeStandardShare();
     ASSERT_EQ(RunIndexer().exitStatus, 0);
     const auto before = TrackRows();
@@ -152,7 +152,7 @@ TEST(Issue8_Indexer, ChangedFilesAreReReadAndMissingFilesRemoved) {
     EXPECT_EQ(after.at(SharePath("New/05 Fifth.flac")).columns.at("title"), "Fifth");
 }
 
-TEST(Issue8_Indexer, BrokenTagsAreIndexedByFileNameWithOneLogLineEach) {
+TEST(Indexer, BrokenTagsAreIndexedByFileNameWithOneLogLineEach) {
     MakeStandardShare();
     WriteFile(SharePath("Broken/Not Really.flac"), "this is no FLAC stream at all");
     WriteFile(SharePath("Broken/Also Bad.ogg"), std::string(300, 'x'));
@@ -171,7 +171,7 @@ TEST(Issue8_Indexer, BrokenTagsAreIndexedByFileNameWithOneLogLineEach) {
     EXPECT_EQ(brokenLines, 2);
 }
 
-TEST(Issue8_Indexer, PlaylistRowsAreNeverTouched) {
+TEST(Indexer, PlaylistRowsAreNeverTouched) {
     MakeStandardShare();
     // An existing database made by the playlist platform's fixture writer, with shared playlists
     // and a track the share no longer has.
@@ -186,7 +186,7 @@ TEST(Issue8_Indexer, PlaylistRowsAreNeverTouched) {
     EXPECT_EQ(TrackRows().size(), 5u);
 }
 
-TEST(Issue8_Indexer, OnlySupportedRegularFilesAreIndexedAndLinksAreNotFollowed) {
+TEST(Indexer, OnlySupportedRegularFilesAreIndexedAndLinksAreNotFollowed) {
     MakeStandardShare();
     MakeDirs("/volume1/elsewhere");
     MakeAudioFile("/volume1/elsewhere/outside.mp3", {"Outside", "", "", "", "", 0, 0, 0});
@@ -202,7 +202,7 @@ TEST(Issue8_Indexer, OnlySupportedRegularFilesAreIndexedAndLinksAreNotFollowed) 
             << path;
 }
 
-TEST(Issue8_Indexer, TheShareOfAudioConfIsScanned) {
+TEST(Indexer, TheShareOfAudioConfIsScanned) {
     MakeAudioFile("/volume1/other/a.flac", {"Other A", "", "", "", "", 0, 0, 0});
     WriteFile(kAudioConf, "audio_share_path=/volume1/other\n");
     const IndexRun run = RunIndexer();
@@ -212,7 +212,7 @@ TEST(Issue8_Indexer, TheShareOfAudioConfIsScanned) {
     EXPECT_EQ(rows.begin()->first, "/volume1/other/a.flac");
 }
 
-TEST(Issue8_Indexer, AMissingShareFailsAndLeavesTheLibraryAsItWas) {
+TEST(Indexer, AMissingShareFailsAndLeavesTheLibraryAsItWas) {
     MakeStandardShare();
     ASSERT_EQ(RunIndexer().exitStatus, 0);
     WriteFile(kAudioConf, "audio_share_path=/volume1/unmounted\n");

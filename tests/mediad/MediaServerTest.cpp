@@ -1,6 +1,6 @@
-// Issue 8 item 2: harmona-mediad over the indexed generated share, browsed with an independent
-// client (hand-written SOAP over libcurl) and with the project's own browse library, and through
-// the real CGI.
+// The local media server: harmona-mediad over the indexed generated share, browsed with an
+// independent client (hand-written SOAP over libcurl) and with the project's own browse library,
+// and through the real CGI.
 #include <arpa/inet.h>
 #include <gtest/gtest.h>
 #include <netinet/in.h>
@@ -39,7 +39,7 @@ const DidlEntry* FindTitle(const BrowseReply& reply, const std::string& title) {
     return nullptr;
 }
 
-class Issue8_MediaServer : public ::testing::Test {
+class LocalMediaServer : public ::testing::Test {
   protected:
     void SetUp() override {
         MakeStandardShare();
@@ -50,7 +50,7 @@ class Issue8_MediaServer : public ::testing::Test {
     ServerProcess server_;
 };
 
-TEST_F(Issue8_MediaServer, RootHoldsTheSevenCategoriesInOrder) {
+TEST_F(LocalMediaServer, RootHoldsTheSevenCategoriesInOrder) {
     const BrowseReply root = SoapBrowse("0");
     ASSERT_EQ(root.httpStatus, 200) << root.raw;
     ASSERT_EQ(root.entries.size(), 7u) << root.raw;
@@ -64,7 +64,7 @@ TEST_F(Issue8_MediaServer, RootHoldsTheSevenCategoriesInOrder) {
     EXPECT_EQ(root.entries[0].childCount, 5);  // all music
 }
 
-TEST_F(Issue8_MediaServer, AllMusicHoldsEveryTrackWithTagsAndAServedResource) {
+TEST_F(LocalMediaServer, AllMusicHoldsEveryTrackWithTagsAndAServedResource) {
     const BrowseReply all = SoapBrowse("music_all");
     ASSERT_EQ(all.entries.size(), 5u) << all.raw;
     EXPECT_EQ(all.totalMatches, 5);
@@ -80,7 +80,7 @@ TEST_F(Issue8_MediaServer, AllMusicHoldsEveryTrackWithTagsAndAServedResource) {
     EXPECT_EQ(first->id.rfind("track:", 0), 0u);
 }
 
-TEST_F(Issue8_MediaServer, FoldersAreNestedAsOnTheShare) {
+TEST_F(LocalMediaServer, FoldersAreNestedAsOnTheShare) {
     const BrowseReply top = SoapBrowse("music_file");
     EXPECT_EQ(Titles(top), (std::vector<std::string>{"Jazz", "Rock", "Zulu"})) << top.raw;
     const DidlEntry* jazz = FindTitle(top, "Jazz");
@@ -101,7 +101,7 @@ TEST_F(Issue8_MediaServer, FoldersAreNestedAsOnTheShare) {
     EXPECT_EQ(meta.entries[0].title, "Late");
 }
 
-TEST_F(Issue8_MediaServer, AlbumsArtistsGenresRandomAndLatestAlbums) {
+TEST_F(LocalMediaServer, AlbumsArtistsGenresRandomAndLatestAlbums) {
     const BrowseReply albums = SoapBrowse("music_album");
     EXPECT_EQ(Titles(albums), (std::vector<std::string>{"Alpha & Omega", "Blue"})) << albums.raw;
     const BrowseReply alpha = SoapBrowse(albums.entries[0].id);
@@ -136,7 +136,7 @@ TEST_F(Issue8_MediaServer, AlbumsArtistsGenresRandomAndLatestAlbums) {
     EXPECT_EQ(latestTitles, (std::vector<std::string>{"Alpha & Omega", "Blue"}));
 }
 
-TEST_F(Issue8_MediaServer, PagingGivesTheRequestedSliceAndTheTotal) {
+TEST_F(LocalMediaServer, PagingGivesTheRequestedSliceAndTheTotal) {
     const BrowseReply all = SoapBrowse("music_all");
     ASSERT_EQ(all.entries.size(), 5u);
     const BrowseReply page = SoapBrowse("music_all", "BrowseDirectChildren", 1, 2);
@@ -153,7 +153,7 @@ TEST_F(Issue8_MediaServer, PagingGivesTheRequestedSliceAndTheTotal) {
     EXPECT_EQ(tail.totalMatches, 3);
 }
 
-TEST_F(Issue8_MediaServer, SortCriteriaOnTitleBothWays) {
+TEST_F(LocalMediaServer, SortCriteriaOnTitleBothWays) {
     const std::vector<std::string> ascending = {"First <Song> & \"more\"", "Fourth", "Second",
                                                 "Third", "Zulu"};
     EXPECT_EQ(Titles(SoapBrowse("music_all", "BrowseDirectChildren", 0, 0, "+dc:title")),
@@ -169,7 +169,7 @@ TEST_F(Issue8_MediaServer, SortCriteriaOnTitleBothWays) {
     EXPECT_NE(SoapSimpleAction("GetSystemUpdateID", "Id"), "<failed>");
 }
 
-TEST_F(Issue8_MediaServer, MetadataOfAnItemAndOfACategory) {
+TEST_F(LocalMediaServer, MetadataOfAnItemAndOfACategory) {
     const BrowseReply all = SoapBrowse("music_all");
     ASSERT_FALSE(all.entries.empty());
     const BrowseReply item = SoapBrowse(all.entries[0].id, "BrowseMetadata");
@@ -182,7 +182,7 @@ TEST_F(Issue8_MediaServer, MetadataOfAnItemAndOfACategory) {
     EXPECT_EQ(category.entries[0].childCount, 3);
 }
 
-TEST_F(Issue8_MediaServer, UnknownObjectIdsGetError701) {
+TEST_F(LocalMediaServer, UnknownObjectIdsGetError701) {
     for (const char* id : {"nope", "album:%ZZ/x", "genre:Polka", "track:999999", "folder:..",
                            "folder:Nowhere", "music_all/../x"}) {
         SCOPED_TRACE(id);
@@ -193,7 +193,7 @@ TEST_F(Issue8_MediaServer, UnknownObjectIdsGetError701) {
     EXPECT_EQ(SoapBrowse("track:999999", "BrowseMetadata").upnpError, 701);
 }
 
-TEST_F(Issue8_MediaServer, RangeGetOfAResourceServesTheIndexedFile) {
+TEST_F(LocalMediaServer, RangeGetOfAResourceServesTheIndexedFile) {
     const BrowseReply all = SoapBrowse("music_all");
     const DidlEntry* fourth = FindTitle(all, "Fourth");
     ASSERT_NE(fourth, nullptr);
@@ -218,7 +218,7 @@ TEST_F(Issue8_MediaServer, RangeGetOfAResourceServesTheIndexedFile) {
     EXPECT_EQ(byPath.body.find("OggS"), std::string::npos);
 }
 
-TEST_F(Issue8_MediaServer, TheProjectsBrowseLibraryListsEveryCategory) {
+TEST_F(LocalMediaServer, TheProjectsBrowseLibraryListsEveryCategory) {
     for (const char* category : kCategories) {
         SCOPED_TRACE(category);
         DMABrowse browse(BrowseDirectChildren, kControlUrl);
@@ -239,14 +239,14 @@ TEST_F(Issue8_MediaServer, TheProjectsBrowseLibraryListsEveryCategory) {
     }
 }
 
-TEST_F(Issue8_MediaServer, PidFileWhileRunningAndGoneAfterStop) {
+TEST_F(LocalMediaServer, PidFileWhileRunningAndGoneAfterStop) {
     ASSERT_TRUE(Exists(kPidFile));
     EXPECT_EQ(std::atol(ReadFile(kPidFile).c_str()), server_.pid());
     EXPECT_EQ(server_.Stop(), 0);
     EXPECT_FALSE(Exists(kPidFile));
 }
 
-TEST_F(Issue8_MediaServer, TheDeviceAnswersAnSsdpSearchOnTheNetwork) {
+TEST_F(LocalMediaServer, TheDeviceAnswersAnSsdpSearchOnTheNetwork) {
     const int s = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
     ASSERT_GE(s, 0);
     sockaddr_in local{};
@@ -280,7 +280,7 @@ TEST_F(Issue8_MediaServer, TheDeviceAnswersAnSsdpSearchOnTheNetwork) {
     EXPECT_NE(answer.find("urn:schemas-upnp-org:device:MediaServer:1"), std::string::npos);
 }
 
-TEST_F(Issue8_MediaServer, TheRealCgiListsTheAlbumsOfTheShare) {
+TEST_F(LocalMediaServer, TheRealCgiListsTheAlbumsOfTheShare) {
     StandardFixture();
     const CgiResult r = Get(Query({{"action", "gettreenode"}, {"node", "musiclib_music_album"}}));
     ASSERT_TRUE(r.jsonOk) << r.body;
@@ -296,7 +296,7 @@ TEST_F(Issue8_MediaServer, TheRealCgiListsTheAlbumsOfTheShare) {
     EXPECT_EQ(tracks.json[0]["text"].asString(), "Third");
 }
 
-TEST_F(Issue8_MediaServer, TheRootTreeShowsTheLibraryExactlyWhileTheServerRuns) {
+TEST_F(LocalMediaServer, TheRootTreeShowsTheLibraryExactlyWhileTheServerRuns) {
     StandardFixture();
     const auto ids = [] {
         const CgiResult r = Get(Query({{"action", "gettreenode"}, {"node", "audiotree_root"}}));

@@ -1,7 +1,8 @@
-// The test kit of issue 8: a generated audio share (sox makes the files, TagLib writes their tags),
-// the real harmona-index and harmona-mediad run as child processes, a network of two veth ends in
-// the test's namespace (libupnp will not run on loopback), and an independent ContentDirectory
-// client (a hand-written SOAP body over libcurl, the reply read with pugixml).
+// The test kit of the indexer and media server tests: a generated audio share (sox makes the
+// files, TagLib writes their tags), the real harmona-index and harmona-mediad run as child
+// processes, a network of two veth ends in the test's namespace (libupnp will not run on
+// loopback), and an independent ContentDirectory client (a hand-written SOAP body over libcurl,
+// the reply read with pugixml).
 #pragma once
 
 #include <sys/types.h>

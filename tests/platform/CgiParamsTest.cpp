@@ -1,4 +1,4 @@
-// platform.md section 3: decoding of CGI parameters.
+// Decoding of CGI parameters (platform/README.md, "Requests, users and permissions").
 #include <gtest/gtest.h>
 
 #include <unistd.h>

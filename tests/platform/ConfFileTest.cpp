@@ -1,4 +1,4 @@
-// platform.md section 2: the conf line syntax.
+// The conf line syntax (platform/README.md, "Conf files").
 #include <gtest/gtest.h>
 
 #include <fcntl.h>

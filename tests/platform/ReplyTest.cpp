@@ -1,4 +1,5 @@
-// platform.md section 3: PrintResponse, SetError, SetSuccess, EncodeHtml and the UTF-8 repair.
+// PrintResponse, SetError, SetSuccess, EncodeHtml and the UTF-8 repair (platform/README.md,
+// "Requests, users and permissions").
 #include <gtest/gtest.h>
 
 #include <cstdio>

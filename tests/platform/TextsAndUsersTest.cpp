@@ -1,4 +1,5 @@
-// platform.md sections 3 and 4: permissions from users.conf, the UI text tables, the shipped texts.
+// Permissions from users.conf, the UI text tables and the shipped texts (platform/README.md,
+// "Requests, users and permissions" and "UI texts").
 #include <gtest/gtest.h>
 
 #include <set>
@@ -55,12 +56,13 @@ TEST(ParseTexts, MissingOrUnreadableGivesEmptyObject) {
     texts = VANU::ZET::LocalizedStringParser::ParseTexts("/tmp/d");
     EXPECT_TRUE(texts.isObject());
     EXPECT_EQ(texts.size(), 0u);
-    // A missing member reads as an empty text (spec Part 1.3).
+    // A missing member reads as an empty text.
     EXPECT_EQ(texts["common"]["x"].asString(), "");
 }
 
-// Every section and key that the spec names, in every shipped language, with a text of its own.
-TEST(ShippedTexts, EveryLanguageHoldsEverySpecKey) {
+// Every section and key that the tree and its replies use, in every shipped language, with a text
+// of its own.
+TEST(ShippedTexts, EveryLanguageHoldsEveryKeyTheTreeUses) {
     harmona::test::InstallTexts();
     const std::vector<std::pair<const char*, const char*>> keys = {
         {"playlist", "music_library"},

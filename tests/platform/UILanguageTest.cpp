@@ -1,4 +1,5 @@
-// platform.md section 3: the UI language from users.conf and Accept-Language.
+// The UI language from users.conf and Accept-Language (platform/README.md, "Requests, users and
+// permissions").
 #include <gtest/gtest.h>
 
 #include <cstdlib>

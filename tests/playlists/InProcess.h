@@ -1,7 +1,10 @@
-// The playlist builders of Parts 4.1 to 4.3 are reached from a real request only through the root
-// tree and the refresh action (Parts 2.1, 2.3). Until those exist, these tests run the builders in
-// the test process: the handler is constructed as the CGI entry does it, with the request's
-// environment set as a web server would set it.
+// The playlist builders (categories, ordinary and smart playlist listings) run in the test process.
+// A request reaches them only through the root tree and the refresh action, and those show less: a
+// failing category turns the whole tree into one error reply, hiding the category's own error
+// envelope and buttons, and both start from an empty array. Called directly, a builder shows its
+// result, what it appends to an array that already holds nodes, and what it logs. The request
+// route has its own tests with the root tree and the refresh action. The handler is constructed as
+// the CGI entry does it, with the request's environment set as a web server would set it.
 #pragma once
 
 #include <json/json.h>

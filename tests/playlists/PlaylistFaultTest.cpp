@@ -1,6 +1,6 @@
-// Parts 4.1 and 4.2 over scripted platform answers (ScriptedPlaylistPlatform.cpp): the failing
-// smart playlist listing, which the real Part 4.3 never reports, and a personal playlist name that
-// holds "/", which no file name can.
+// Playlist categories and listing over scripted platform answers (ScriptedPlaylistPlatform.cpp):
+// a failing smart playlist listing, which the real one never reports, and a personal playlist
+// name that holds "/", which no file name can.
 #include <gtest/gtest.h>
 
 #include "Fixtures.h"
@@ -11,7 +11,7 @@ using namespace harmona::test;
 
 namespace {
 
-class Part_4_1 : public ::testing::Test {
+class PlaylistCategoryFaults : public ::testing::Test {
   protected:
     void SetUp() override {
         StandardFixture();
@@ -30,7 +30,8 @@ void ExpectSystemError(const Json::Value& reply, int line, const std::vector<std
     EXPECT_EQ(Ids(reply["items"]), ids);
 }
 
-TEST_F(Part_4_1, FailedPersonalSmartListingGivesErrorLine369AfterTheOrdinaryPlaylists) {
+TEST_F(PlaylistCategoryFaults,
+       FailedPersonalSmartListingGivesErrorLine369AfterTheOrdinaryPlaylists) {
     Scripted().personal.records = {{1, "mine"}};
     Scripted().smartResult = 0;
     EXPECT_EQ(request.handler.AddPersonalPlaylistCategory(children), 0);
@@ -41,7 +42,7 @@ TEST_F(Part_4_1, FailedPersonalSmartListingGivesErrorLine369AfterTheOrdinaryPlay
     EXPECT_EQ(Scripted().personalPrefDir, "/usr/vanu/etc/preference/admin");
 }
 
-TEST_F(Part_4_1, FailedSharedSmartListingGivesErrorLine404AfterTheOrdinaryPlaylists) {
+TEST_F(PlaylistCategoryFaults, FailedSharedSmartListingGivesErrorLine404AfterTheOrdinaryPlaylists) {
     Scripted().shared.records = {{3, "ours"}};
     Scripted().smartResult = 0;
     EXPECT_EQ(request.handler.AddSharedPlaylistCategory(children), 0);
@@ -51,7 +52,7 @@ TEST_F(Part_4_1, FailedSharedSmartListingGivesErrorLine404AfterTheOrdinaryPlayli
     EXPECT_EQ(Scripted().smartCategories, std::vector<std::string>{"music_shared"});
 }
 
-TEST_F(Part_4_1, FailedOrdinaryListingSkipsTheSmartListing) {
+TEST_F(PlaylistCategoryFaults, FailedOrdinaryListingSkipsTheSmartListing) {
     Scripted().personal.result = -1;
     Scripted().shared.result = -5;
     EXPECT_EQ(request.handler.AddPersonalPlaylistCategory(children), 0);
@@ -62,9 +63,9 @@ TEST_F(Part_4_1, FailedOrdinaryListingSkipsTheSmartListing) {
     EXPECT_TRUE(Scripted().smartCategories.empty());
 }
 
-using Part_4_2 = Part_4_1;
+using PlaylistListingFaults = PlaylistCategoryFaults;
 
-TEST_F(Part_4_2, PersonalNameWithSlashGivesAnIdOfMoreThanThreePartsUnescaped) {
+TEST_F(PlaylistListingFaults, PersonalNameWithSlashGivesAnIdOfMoreThanThreePartsUnescaped) {
     Scripted().personal.records = {{1, "rock/80s/live"}};
     ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
     ASSERT_EQ(children.size(), 1u);
@@ -74,7 +75,7 @@ TEST_F(Part_4_2, PersonalNameWithSlashGivesAnIdOfMoreThanThreePartsUnescaped) {
     EXPECT_EQ(children[0]["text"].asString(), "rock/80s/live");
 }
 
-TEST_F(Part_4_2, PositiveListingResultIsSuccessNegativeIsFailure) {
+TEST_F(PlaylistListingFaults, PositiveListingResultIsSuccessNegativeIsFailure) {
     Scripted().shared = {2, {{0, "zero"}}};
     EXPECT_EQ(request.handler.ListPlaylists(children, "music_shared"), 1);
     EXPECT_EQ(Ids(children), std::vector<std::string>{"musiclib_music_shared/playlist/0"});

@@ -1,4 +1,5 @@
-// The platform's playlist calls (platform.md sections 6 and 7) over real files and real SQLite
+// The platform's playlist calls (platform/README.md, "Music library database and random-100
+// playlist" and "Playlists and smart playlists") over real files and real SQLite
 // databases: personal and shared playlist lists, the smart playlist enumerator, the random
 // playlist generator.
 #include <dirent.h>

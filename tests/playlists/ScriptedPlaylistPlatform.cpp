@@ -1,6 +1,6 @@
 // Scripted replacements, linked only into playlists_fault_tests, for what the real platform cannot
 // produce: a personal playlist name holding "/" (a file name cannot), and a failing smart playlist
-// listing (Part 4.3 always succeeds). Defining these symbols here keeps the static libraries'
+// listing (the real one always succeeds). Defining these symbols here keeps the static libraries'
 // real definitions out of this one program.
 #include "ScriptedPlaylistPlatform.h"
 

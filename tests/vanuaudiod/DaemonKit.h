@@ -1,8 +1,8 @@
 // Test kit for the audio daemon: processes started by the test, a second network namespace
 // linked to the test's own by a veth pair (a second "host" on a real Ethernet-like link, so that
-// SSDP multicast and byebye travel as on a LAN), the real built vanuaudiod, a client speaking
-// Part 6.1's record exactly as the CGI does, and a scriptable fake media server (SSDP announcer
-// and description server) for the cases no real server can be made to produce.
+// SSDP multicast and byebye travel as on a LAN), the real built vanuaudiod, a client sending the
+// request record exactly as the CGI does, and a scriptable fake media server (SSDP announcer and
+// description server) for the cases no real server can be made to produce.
 #pragma once
 
 #include <sys/types.h>
@@ -79,7 +79,7 @@ std::string DaemonProgram();
 // on /tmp/vanuaudiod.sock. Its output goes to /tmp/vanuaudiod.log.
 Process StartDaemon(const char* interfaceName = kHostInterface);
 
-// One exchange as Part 6.1's client makes it: connect to the daemon's socket, wait for
+// One exchange as the CGI's daemon client makes it: connect to the daemon's socket, wait for
 // writability, write the 8196-byte record, wait for a reply within what is left of `budgetMs`
 // (0.5 s by default), read once into 40960 bytes.
 struct Exchange {

@@ -1,6 +1,6 @@
-// The real vanuaudiod (platform.md section 10, spec Parts 3.2 and 6.1) in the test's private
-// network: its control socket, its robustness against bad clients, its concurrency, and the
-// discovery of real (MiniDLNA) and scripted media servers over a veth link.
+// The real vanuaudiod (platform/README.md, "Audio daemon") in the test's private network: its
+// control socket, its robustness against bad clients, its concurrency, and the discovery of real
+// (MiniDLNA) and scripted media servers over a veth link.
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/socket.h>
@@ -349,11 +349,11 @@ TEST_F(Vanuaudiod, HostileNamesAreCleanedAndRepliesStayInsideTheClientsBuffer) {
     EXPECT_LT(page.reply.size(), 40960u);
     const Json::Value reply = Reply(page);
     EXPECT_EQ(reply["total"], 15);
-    ASSERT_GE(reply["list"].size(), 10u);  // a page of Part 3.2's size always fits
+    ASSERT_GE(reply["list"].size(), 10u);  // a page of the CGI's size (10) always fits
     EXPECT_EQ(reply["list"][0]["friendly_name"].asString(), std::string(512, '"'));
 }
 
-// Through the real CGI: Part 3.2's client pages the real daemon's list into media server nodes.
+// Through the real CGI: the media server list pages the real daemon's list into nodes.
 namespace {
 
 const Json::Value* FindNode(const Json::Value& nodes, const std::string& id) {
@@ -493,7 +493,8 @@ namespace {
 Process StartMediad(PeerNetwork& peer) {
     Process mediad = peer.SpawnOnPeer({HARMONA_MEDIAD_PATH, "--interface", kPeerInterface},
                                       "/tmp/harmona-mediad.log");
-    // It writes its pid file once it serves (platform.md section 5, service 3).
+    // It writes the pid file of service 3 once it serves (platform/README.md, "System
+    // configuration, shares and services").
     const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(10);
     while (!Exists("/run/vanu/service/3.pid") && std::chrono::steady_clock::now() < deadline)
         std::this_thread::sleep_for(std::chrono::milliseconds(20));
@@ -529,7 +530,7 @@ TEST_F(Vanuaudiod, HarmonaMediadAndMiniDlnaBothAppearAsMediaServerNodesThroughTh
     EXPECT_EQ(items[1]["text"], "Harmona Music Library (" + HostName() + ")");
     EXPECT_EQ(items[1]["pid"], "mediaserver_root");
     // The control URLs the daemon lists are the real ContentDirectory endpoints: the project's
-    // browse library (platform.md section 9) browses the root of each.
+    // browse library browses the root of each.
     const Json::Value list = Reply(Call(16, "0 10"))["list"];
     ASSERT_EQ(list.size(), 2u);
     for (const Json::Value& server : list) {
@@ -542,7 +543,7 @@ TEST_F(Vanuaudiod, HarmonaMediadAndMiniDlnaBothAppearAsMediaServerNodesThroughTh
         ASSERT_NE(parser.GetResult(), nullptr);
         EXPECT_FALSE(parser.GetResult()->empty());
     }
-    // harmona-mediad's root holds Part 3.1's seven categories.
+    // harmona-mediad's root holds the music library's seven categories.
     DMABrowse browse(BrowseDirectChildren, list[1]["control_url"].asString());
     browse.objectId = "0";
     ASSERT_EQ(browse.Prepare(), 0);

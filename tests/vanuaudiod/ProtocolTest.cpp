@@ -1,5 +1,6 @@
-// vanuaudiod's pieces beneath the socket: the request record (Part 6.1), the replies of commands
-// 14 and 16 (Part 3.2, platform.md section 10), their size bound, and the text cleaning.
+// vanuaudiod's pieces beneath the socket: the request record, the replies of commands 14 (search)
+// and 16 (a page of the server list; platform/README.md, "Audio daemon"), their size bound, and the
+// text cleaning.
 #include <gtest/gtest.h>
 #include <json/json.h>
 
@@ -42,7 +43,7 @@ MediaServer WorstCaseServer(int i) {
 
 }  // namespace
 
-TEST(Part_6_1_Daemon, RecordIsReadWithNativeCommandAndTextUpToItsTerminator) {
+TEST(Vanuaudiod_RequestRecord, RecordIsReadWithNativeCommandAndTextUpToItsTerminator) {
     const auto record = Record(16, "0 10");
     Request request;
     ASSERT_TRUE(ParseRequest(record.data(), record.size(), request));
@@ -50,7 +51,7 @@ TEST(Part_6_1_Daemon, RecordIsReadWithNativeCommandAndTextUpToItsTerminator) {
     EXPECT_EQ(request.arguments, "0 10");
 }
 
-TEST(Part_6_1_Daemon, RecordWithoutTerminatorOrOfWrongSizeIsRefused) {
+TEST(Vanuaudiod_RequestRecord, RecordWithoutTerminatorOrOfWrongSizeIsRefused) {
     std::vector<unsigned char> record(kRequestSize, 'x');
     Request request;
     EXPECT_FALSE(ParseRequest(record.data(), record.size(), request));
@@ -59,7 +60,7 @@ TEST(Part_6_1_Daemon, RecordWithoutTerminatorOrOfWrongSizeIsRefused) {
     EXPECT_FALSE(ParseRequest(nullptr, kRequestSize, request));
 }
 
-TEST(Part_3_2_Daemon, PageArgumentsAreParsedStrictly) {
+TEST(Vanuaudiod_Replies, PageArgumentsAreParsedStrictly) {
     int offset = -1;
     int count = -1;
     ASSERT_TRUE(ParsePageArguments("20 10", offset, count));
@@ -72,14 +73,14 @@ TEST(Part_3_2_Daemon, PageArgumentsAreParsedStrictly) {
         EXPECT_FALSE(ParsePageArguments(bad, offset, count)) << '"' << bad << '"';
 }
 
-TEST(Part_3_2_Daemon, CommandFourteenAnswersSuccessAndAsksForASearch) {
+TEST(Vanuaudiod_Replies, CommandFourteenAnswersSuccessAndAsksForASearch) {
     bool search = false;
     const std::string reply = Answer({14, ""}, {}, search);
     EXPECT_TRUE(search);
     EXPECT_EQ(Parse(reply), Parse("{\"success\": true}"));
 }
 
-TEST(Part_3_2_Daemon, OtherCommandsAreUnsupported) {
+TEST(Vanuaudiod_Replies, OtherCommandsAreUnsupported) {
     for (int32_t code : {0, 1, 13, 15, 17, 19, 27, 38, -1, 1 << 30}) {
         bool search = true;
         const Json::Value reply = Parse(Answer({code, "1 2"}, {}, search));
@@ -89,14 +90,14 @@ TEST(Part_3_2_Daemon, OtherCommandsAreUnsupported) {
     }
 }
 
-TEST(Part_3_2_Daemon, BadPageArgumentsGetAnErrorReply) {
+TEST(Vanuaudiod_Replies, BadPageArgumentsGetAnErrorReply) {
     bool search = true;
     const Json::Value reply = Parse(Answer({16, "ten"}, {Server("a", "uuid:a")}, search));
     EXPECT_EQ(reply["success"], false);
     EXPECT_FALSE(search);
 }
 
-TEST(Part_3_2_Daemon, PageHoldsTheElementsFromOffsetAndTheWholeTotal) {
+TEST(Vanuaudiod_Replies, PageHoldsTheElementsFromOffsetAndTheWholeTotal) {
     std::vector<MediaServer> servers;
     for (int i = 0; i < 25; ++i)
         servers.push_back(Server("S" + std::to_string(100 + i), "uuid:" + std::to_string(i)));
@@ -115,7 +116,7 @@ TEST(Part_3_2_Daemon, PageHoldsTheElementsFromOffsetAndTheWholeTotal) {
     EXPECT_EQ(past["total"], 25);
 }
 
-TEST(Part_3_2_Daemon, TenWorstCaseServersFitThePartThreeTwoBuffer) {
+TEST(Vanuaudiod_Replies, TenWorstCaseServersFitTheCgisReplyBuffer) {
     std::vector<MediaServer> servers;
     for (int i = 0; i < 10; ++i)
         servers.push_back(WorstCaseServer(i));
@@ -127,7 +128,7 @@ TEST(Part_3_2_Daemon, TenWorstCaseServersFitThePartThreeTwoBuffer) {
     EXPECT_EQ(page["list"][3]["friendly_name"].asString(), servers[3].friendlyName);
 }
 
-TEST(Part_3_2_Daemon, LargePageIsCutToFitAndTotalStillCountsAll) {
+TEST(Vanuaudiod_Replies, LargePageIsCutToFitAndTotalStillCountsAll) {
     std::vector<MediaServer> servers;
     for (int i = 0; i < 40; ++i)
         servers.push_back(WorstCaseServer(i));
@@ -142,7 +143,7 @@ TEST(Part_3_2_Daemon, LargePageIsCutToFitAndTotalStillCountsAll) {
     EXPECT_EQ(page["list"][0]["udn"].asString(), servers[0].udn);
 }
 
-TEST(Part_3_2_Daemon, JsonStringEscapesQuotesBackslashesAndControls) {
+TEST(Vanuaudiod_Replies, JsonStringEscapesQuotesBackslashesAndControls) {
     EXPECT_EQ(JsonString("a\"b\\c\x01\n"), "\"a\\\"b\\\\c\\u0001\\u000a\"");
     EXPECT_EQ(JsonString("K\xC3\xBC"
                          "che"),
@@ -150,7 +151,7 @@ TEST(Part_3_2_Daemon, JsonStringEscapesQuotesBackslashesAndControls) {
               "che\"");
 }
 
-TEST(Part_3_2_Daemon, LongNamesAreCutOnAUtf8Boundary) {
+TEST(Vanuaudiod_Replies, LongNamesAreCutOnAUtf8Boundary) {
     // "ü" is two bytes: a cut at 5 bytes must not split the third one.
     const std::string name = "\xC3\xBC\xC3\xBC\xC3\xBC";
     EXPECT_EQ(CleanText(name, 5), "\xC3\xBC\xC3\xBC");
@@ -159,7 +160,7 @@ TEST(Part_3_2_Daemon, LongNamesAreCutOnAUtf8Boundary) {
     EXPECT_EQ(CleanText("a\xF0\x9F\x8E\xB5", 4), "a");
 }
 
-TEST(Part_3_2_Daemon, InvalidUtf8AndControlCharactersBecomeSpaces) {
+TEST(Vanuaudiod_Replies, InvalidUtf8AndControlCharactersBecomeSpaces) {
     EXPECT_EQ(CleanText("a\xFF"
                         "b\x01"
                         "c\xC3",

@@ -1,4 +1,4 @@
-// Part 2.3: refresh action, through the real CGI; with Part 1.1's refresh dispatch and Part 1.3's
+// The refresh action, through the real CGI: the dispatch of each target, its exit status, and the
 // error envelope of a failing refresh.
 #include <gtest/gtest.h>
 
@@ -19,7 +19,7 @@ CgiResult Refresh(const std::string& target) {
     return Get(Query({{"action", "refresh"}, {"target", target}}));
 }
 
-TEST(Part_2_3, IPodWithNoIPodAttachedIsASuccessWithNullItems) {
+TEST(RefreshAction, IPodWithNoIPodAttachedIsASuccessWithNullItems) {
     TreeWorld world;
     world.ipod = false;
     TreeFixture fixture(world);
@@ -28,7 +28,7 @@ TEST(Part_2_3, IPodWithNoIPodAttachedIsASuccessWithNullItems) {
     EXPECT_EQ(r.body, "{\"items\":null,\"success\":true}\n");
 }
 
-TEST(Part_2_3, IPodGivesThePlaylistNodesWithoutTheRefreshButton) {
+TEST(RefreshAction, IPodGivesThePlaylistNodesWithoutTheRefreshButton) {
     TreeFixture fixture(TreeWorld{});
     const CgiResult r = Refresh("ipod");
     EXPECT_EQ(r.json["success"], true);
@@ -38,7 +38,7 @@ TEST(Part_2_3, IPodGivesThePlaylistNodesWithoutTheRefreshButton) {
     EXPECT_EQ(r.json["items"][0]["pid"], "ipod_root");
 }
 
-TEST(Part_2_3, PersonalListsPlainPlaylistsThenSmartOnes) {
+TEST(RefreshAction, PersonalListsPlainPlaylistsThenSmartOnes) {
     TreeFixture fixture(TreeWorld{});
     const CgiResult r = Refresh("personal");
     EXPECT_EQ(r.exitStatus, 1);
@@ -50,7 +50,7 @@ TEST(Part_2_3, PersonalListsPlainPlaylistsThenSmartOnes) {
                        "musiclib_music_personal/smart/rock"}));
 }
 
-TEST(Part_2_3, RefreshSeesAPlaylistAddedSinceTheTreeWasBuilt) {
+TEST(RefreshAction, RefreshSeesAPlaylistAddedSinceTheTreeWasBuilt) {
     TreeWorld world;
     world.personalSmart = {};
     TreeFixture fixture(world);
@@ -62,7 +62,7 @@ TEST(Part_2_3, RefreshSeesAPlaylistAddedSinceTheTreeWasBuilt) {
                        "musiclib_music_personal/playlist/Road trip"}));
 }
 
-TEST(Part_2_3, SharedListsPlaylistsByNumberThenSmartOnes) {
+TEST(RefreshAction, SharedListsPlaylistsByNumberThenSmartOnes) {
     TreeFixture fixture(TreeWorld{});
     const CgiResult r = Refresh("shared");
     EXPECT_EQ(Ids(r.json["items"]),
@@ -71,22 +71,22 @@ TEST(Part_2_3, SharedListsPlaylistsByNumberThenSmartOnes) {
     EXPECT_EQ(r.json["items"][0]["text"], "Chill");
 }
 
-TEST(Part_2_3, NoPlaylistsAtAllGivesASuccessWithNullItems) {
+TEST(RefreshAction, NoPlaylistsAtAllGivesASuccessWithNullItems) {
     InstallTexts();
     AddUser("admin", 8);
     EXPECT_EQ(Refresh("personal").body, "{\"items\":null,\"success\":true}\n");
     EXPECT_EQ(Refresh("shared").body, "{\"items\":null,\"success\":true}\n");
 }
 
-// Part 1.3: a failing refresh of personal playlists prints the error envelope and no "items".
-TEST(Part_2_3, FailingPersonalListingPrintsTheErrorEnvelopeWithoutItems) {
+// A failing refresh of personal playlists prints the error envelope and no "items".
+TEST(RefreshAction, FailingPersonalListingPrintsTheErrorEnvelopeWithoutItems) {
     TreeWorld world;
     world.personal = {};
     world.personalSmart = {};
     TreeFixture fixture(world);
     WriteFile(PersonalPlaylistDir(world.user), "not a folder");
     const CgiResult r = Refresh("personal");
-    EXPECT_EQ(r.exitStatus, 1);  // refresh returns 1 whatever the builder did (Part 1.1)
+    EXPECT_EQ(r.exitStatus, 1);  // refresh returns 1 whatever the builder did
     ASSERT_TRUE(r.jsonOk) << r.output;
     EXPECT_FALSE(r.json.isMember("items"));
     EXPECT_EQ(r.json["success"], false);
@@ -94,7 +94,7 @@ TEST(Part_2_3, FailingPersonalListingPrintsTheErrorEnvelopeWithoutItems) {
     EXPECT_EQ(r.json["errinfo"]["key"], "error_system");
 }
 
-TEST(Part_2_3, FailingSharedListingPrintsTheErrorEnvelope) {
+TEST(RefreshAction, FailingSharedListingPrintsTheErrorEnvelope) {
     TreeFixture fixture(TreeWorld{});
     WriteFile(kLibraryDb, "SQLite format 2\n" + std::string(2000, 'z'));
     const CgiResult r = Refresh("shared");
@@ -103,8 +103,9 @@ TEST(Part_2_3, FailingSharedListingPrintsTheErrorEnvelope) {
     EXPECT_EQ(r.json["errinfo"]["key"], "error_system");
 }
 
-// The smart playlist listing always succeeds (Part 4.3), so its failure is made here.
-TEST(Part_2_3, PlainPlaylistsListButSmartOnesFailGivesAnErrorWithoutItems) {
+// The smart playlist listing cannot fail from outside (it always succeeds), so its failure is made
+// here.
+TEST(RefreshAction, PlainPlaylistsListButSmartOnesFailGivesAnErrorWithoutItems) {
     TreeFixture fixture(TreeWorld{});
     setenv("REMOTE_USER", "admin", 1);
     HarmonaHandler handler;
@@ -121,7 +122,7 @@ TEST(Part_2_3, PlainPlaylistsListButSmartOnesFailGivesAnErrorWithoutItems) {
     EXPECT_EQ(output.find("Road trip"), std::string::npos);  // nodes already listed are dropped
 }
 
-TEST(Part_2_3, CapitalisedEmptyAndAbsentTargetsGiveAnEmptyReply) {
+TEST(RefreshAction, CapitalisedEmptyAndAbsentTargetsGiveAnEmptyReply) {
     TreeFixture fixture(TreeWorld{});
     for (const char* query :
          {"action=refresh&target=Personal", "action=refresh&target=", "action=refresh",
@@ -132,8 +133,8 @@ TEST(Part_2_3, CapitalisedEmptyAndAbsentTargetsGiveAnEmptyReply) {
     }
 }
 
-// Part 1.1: "refresh" exits with 1 even when the builder reported an error.
-TEST(Part_2_3, MediaserverAndIPodTargetsExitWithOneWhateverHappened) {
+// "refresh" exits with 1 even when the builder reported an error.
+TEST(RefreshAction, MediaserverAndIPodTargetsExitWithOneWhateverHappened) {
     InstallTexts();
     AddUser("admin", 9);
     const CgiResult media = Refresh("mediaserver");  // no daemon

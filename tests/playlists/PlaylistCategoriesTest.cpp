@@ -1,5 +1,5 @@
-// Part 4.1: playlist category nodes, built in the test process (see InProcess.h) over real
-// playlist files and a real library.db.
+// Playlist category nodes (the personal and shared playlists with their buttons), built in the
+// test process (see InProcess.h) over real playlist files and a real library.db.
 #include <gtest/gtest.h>
 
 #include "Fixtures.h"
@@ -13,7 +13,7 @@ namespace {
 constexpr int kAllButNewShared = PERM_IPOD | PERM_MEDIA_SERVER;
 constexpr int kEverything = PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER;
 
-class Part_4_1 : public ::testing::Test {
+class PlaylistCategories : public ::testing::Test {
   protected:
     void SetUp() override { StandardFixture(); }
 };
@@ -43,7 +43,8 @@ void ExpectNewButton(const Json::Value& node, const std::string& category) {
     EXPECT_FALSE(node["expanded"].asBool());
 }
 
-TEST_F(Part_4_1, WithoutNewSharedPermissionSharedHasRefreshThenPlaylistsAndPersonalBothButtons) {
+TEST_F(PlaylistCategories,
+       WithoutNewSharedPermissionSharedHasRefreshThenPlaylistsAndPersonalBothButtons) {
     AddUser("admin", kAllButNewShared);
     MakeLibraryDb({}, {{7, "Road"}, {3, "chill"}});
     WritePersonalPlaylistFile("admin", "mine.m3u");
@@ -67,7 +68,7 @@ TEST_F(Part_4_1, WithoutNewSharedPermissionSharedHasRefreshThenPlaylistsAndPerso
     EXPECT_EQ(personal[2]["pid"].asString(), "musiclib_music_personal");
 }
 
-TEST_F(Part_4_1, WithNewSharedPermissionSharedHasBothButtons) {
+TEST_F(PlaylistCategories, WithNewSharedPermissionSharedHasBothButtons) {
     MakeLibraryDb({}, {{1, "Road"}});
     InProcessHandler request("admin", kEverything);
     Json::Value shared(Json::arrayValue);
@@ -78,7 +79,7 @@ TEST_F(Part_4_1, WithNewSharedPermissionSharedHasBothButtons) {
     EXPECT_EQ(shared[2]["id"].asString(), "musiclib_music_shared/playlist/1");
 }
 
-TEST_F(Part_4_1, UserWithNoPlaylistsAndNoSmartFileGetsExactlyTheTwoPersonalButtons) {
+TEST_F(PlaylistCategories, UserWithNoPlaylistsAndNoSmartFileGetsExactlyTheTwoPersonalButtons) {
     InProcessHandler request("admin", kEverything);
     Json::Value personal(Json::arrayValue);
     ASSERT_EQ(request.handler.AddPersonalPlaylistCategory(personal), 1);
@@ -88,7 +89,7 @@ TEST_F(Part_4_1, UserWithNoPlaylistsAndNoSmartFileGetsExactlyTheTwoPersonalButto
     EXPECT_TRUE(LoggedErrors().empty());
 }
 
-TEST_F(Part_4_1, OrdinaryPlaylistsComeBeforeSmartPlaylists) {
+TEST_F(PlaylistCategories, OrdinaryPlaylistsComeBeforeSmartPlaylists) {
     WritePersonalPlaylistFile("admin", "zz.m3u");
     WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"aa"});
     MakeLibraryDb({}, {{5, "zz shared"}});
@@ -109,7 +110,7 @@ TEST_F(Part_4_1, OrdinaryPlaylistsComeBeforeSmartPlaylists) {
                   "musiclib_music_shared/playlist/5", "musiclib_music_shared/smart/aa shared"}));
 }
 
-TEST_F(Part_4_1, ButtonTextsFollowTheUserLanguage) {
+TEST_F(PlaylistCategories, ButtonTextsFollowTheUserLanguage) {
     AddUser("admin", kEverything, "ger");
     InProcessHandler request("admin", kEverything);
     Json::Value personal(Json::arrayValue);
@@ -124,7 +125,7 @@ TEST_F(Part_4_1, ButtonTextsFollowTheUserLanguage) {
     EXPECT_NE(personal[1]["text"].asString(), "New Playlist");
 }
 
-// The error envelope that Part 1.3's SetError writes into the children array.
+// The error envelope that SetError writes into the children array.
 void ExpectErrorWithButtons(const Json::Value& children, int line,
                             const std::vector<std::string>& buttonIds) {
     ASSERT_TRUE(children.isObject());
@@ -135,7 +136,7 @@ void ExpectErrorWithButtons(const Json::Value& children, int line,
     EXPECT_EQ(Ids(children["items"]), buttonIds);
 }
 
-TEST_F(Part_4_1, UnlistablePersonalPlaylistsGiveErrorLine364AndKeepTheButtons) {
+TEST_F(PlaylistCategories, UnlistablePersonalPlaylistsGiveErrorLine364AndKeepTheButtons) {
     // The playlists path is a file, so it cannot be read as a directory.
     WriteFile(PersonalPlaylistDir("admin"), "not a folder");
     InProcessHandler request("admin", kEverything);
@@ -147,7 +148,7 @@ TEST_F(Part_4_1, UnlistablePersonalPlaylistsGiveErrorLine364AndKeepTheButtons) {
               std::vector<std::string>{"audio:642 Failed to enum user's playlist!"});
 }
 
-TEST_F(Part_4_1, UnlistableSharedPlaylistsGiveErrorLine399AndKeepTheButtons) {
+TEST_F(PlaylistCategories, UnlistableSharedPlaylistsGiveErrorLine399AndKeepTheButtons) {
     WriteFile(kLibraryDb, std::string(4096, 'x'));  // not a database
     InProcessHandler request("admin", kAllButNewShared);
     Json::Value shared(Json::arrayValue);
@@ -163,7 +164,7 @@ TEST_F(Part_4_1, UnlistableSharedPlaylistsGiveErrorLine399AndKeepTheButtons) {
                            {"musiclib_music_shared_refresh", "musiclib_music_shared_new"});
 }
 
-TEST_F(Part_4_1, ErrorEnvelopeSerializesAsTheBrowserSeesIt) {
+TEST_F(PlaylistCategories, ErrorEnvelopeSerializesAsTheBrowserSeesIt) {
     WriteFile(PersonalPlaylistDir("admin"), "not a folder");
     InProcessHandler request("admin", kEverything);
     Json::Value personal(Json::arrayValue);

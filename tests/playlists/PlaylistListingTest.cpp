@@ -1,4 +1,4 @@
-// Part 4.2: playlist listing, built in the test process (see InProcess.h) over real playlist files
+// Ordinary playlist listing, built in the test process (see InProcess.h) over real playlist files
 // and a real library.db.
 #include <gtest/gtest.h>
 
@@ -14,14 +14,14 @@ namespace {
 constexpr const char* kFailureLog = "audio:642 Failed to enum user's playlist!";
 constexpr const char* kPlaylistIcon = "3rdparty/Harmona/images/files_class/icon_playlist.png";
 
-class Part_4_2 : public ::testing::Test {
+class PlaylistListing : public ::testing::Test {
   protected:
     void SetUp() override { StandardFixture(); }
     InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
     Json::Value children{Json::arrayValue};
 };
 
-TEST_F(Part_4_2, CategoryDifferingOnlyInLetterCaseIsUnknownLogsAndFails) {
+TEST_F(PlaylistListing, CategoryDifferingOnlyInLetterCaseIsUnknownLogsAndFails) {
     WritePersonalPlaylistFile("admin", "mine.m3u");
     MakeLibraryDb({}, {{1, "shared"}});
     for (const char* category :
@@ -32,7 +32,7 @@ TEST_F(Part_4_2, CategoryDifferingOnlyInLetterCaseIsUnknownLogsAndFails) {
     }
 }
 
-TEST_F(Part_4_2, PersonalNodesCarryNameIdParentIconAndLeafFlagOnly) {
+TEST_F(PlaylistListing, PersonalNodesCarryNameIdParentIconAndLeafFlagOnly) {
     WritePersonalPlaylistFile("admin", "Road Trip & <Co>.m3u");
     ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
     ASSERT_EQ(children.size(), 1u);
@@ -48,7 +48,7 @@ TEST_F(Part_4_2, PersonalNodesCarryNameIdParentIconAndLeafFlagOnly) {
     EXPECT_TRUE(LoggedErrors().empty());
 }
 
-TEST_F(Part_4_2, SharedNodesAreAddressedByNumberInTheLibrarysOrder) {
+TEST_F(PlaylistListing, SharedNodesAreAddressedByNumberInTheLibrarysOrder) {
     MakeLibraryDb({}, {{12, "beta"}, {4, "Alpha"}, {9, "alpha"}, {30, "Gamma"}});
     ASSERT_EQ(request.handler.ListPlaylists(children, "music_shared"), 1);
     EXPECT_EQ(Ids(children),
@@ -60,14 +60,14 @@ TEST_F(Part_4_2, SharedNodesAreAddressedByNumberInTheLibrarysOrder) {
     EXPECT_EQ(children[0]["icon"].asString(), kPlaylistIcon);
 }
 
-TEST_F(Part_4_2, SharedPlaylistWithIdZeroGivesDecimalZero) {
+TEST_F(PlaylistListing, SharedPlaylistWithIdZeroGivesDecimalZero) {
     MakeLibraryDb({}, {{0, "zero"}, {4294967295, "largest"}});
     ASSERT_EQ(request.handler.ListPlaylists(children, "music_shared"), 1);
     EXPECT_EQ(Ids(children), (std::vector<std::string>{"musiclib_music_shared/playlist/4294967295",
                                                        "musiclib_music_shared/playlist/0"}));
 }
 
-TEST_F(Part_4_2, TwoPersonalPlaylistsWithTheSameNameGiveTwoNodesWithTheSameId) {
+TEST_F(PlaylistListing, TwoPersonalPlaylistsWithTheSameNameGiveTwoNodesWithTheSameId) {
     // "a.m3u" and "a.M3U8" are two files that both name the playlist "a".
     WritePersonalPlaylistFile("admin", "a.m3u");
     WritePersonalPlaylistFile("admin", "a.M3U8");
@@ -78,10 +78,10 @@ TEST_F(Part_4_2, TwoPersonalPlaylistsWithTheSameNameGiveTwoNodesWithTheSameId) {
                                                        "musiclib_music_personal/playlist/b"}));
 }
 
-TEST_F(Part_4_2, LongestPossibleNameIsWholeInIdAndText) {
-    // A record's name holds at most 254 bytes (platform.md section 7), so an id of this Part is at
-    // most 33 + 254 bytes and can never reach the 4095-byte cut; the longest file name gives the
-    // longest name, whole.
+TEST_F(PlaylistListing, LongestPossibleNameIsWholeInIdAndText) {
+    // A record's name holds at most 254 bytes (platform/README.md, "Playlists and smart
+    // playlists"), so a playlist id is at most 33 + 254 bytes and can never reach the 4095-byte
+    // cut; the longest file name gives the longest name, whole.
     const std::string name(251, 'n');
     WritePersonalPlaylistFile("admin", name + ".m3u");
     ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
@@ -90,7 +90,7 @@ TEST_F(Part_4_2, LongestPossibleNameIsWholeInIdAndText) {
     EXPECT_EQ(children[0]["text"].asString(), name);
 }
 
-TEST_F(Part_4_2, OverlongSharedNameIsCutOnACharacterBoundaryByThePlatform) {
+TEST_F(PlaylistListing, OverlongSharedNameIsCutOnACharacterBoundaryByThePlatform) {
     std::string name;
     for (int i = 0; i < 200; ++i)
         name += "\xC3\xA9";  // é, 2 bytes each: 400 bytes
@@ -101,7 +101,7 @@ TEST_F(Part_4_2, OverlongSharedNameIsCutOnACharacterBoundaryByThePlatform) {
     EXPECT_EQ(children[0]["id"].asString(), "musiclib_music_shared/playlist/1");
 }
 
-TEST_F(Part_4_2, EmptyListsAreSuccessesWithNothingAppended) {
+TEST_F(PlaylistListing, EmptyListsAreSuccessesWithNothingAppended) {
     children.append("kept");
     EXPECT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);  // no folder at all
     MakeDirs(PersonalPlaylistDir("admin"));
@@ -116,7 +116,7 @@ TEST_F(Part_4_2, EmptyListsAreSuccessesWithNothingAppended) {
     EXPECT_TRUE(LoggedErrors().empty());
 }
 
-TEST_F(Part_4_2, NodesAreAppendedAfterWhatTheArrayHolds) {
+TEST_F(PlaylistListing, NodesAreAppendedAfterWhatTheArrayHolds) {
     children.append("first");
     WritePersonalPlaylistFile("admin", "x.m3u");
     ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
@@ -125,7 +125,7 @@ TEST_F(Part_4_2, NodesAreAppendedAfterWhatTheArrayHolds) {
     EXPECT_EQ(children[1]["text"].asString(), "x");
 }
 
-TEST_F(Part_4_2, LibraryThatIsNotADatabaseFailsWithTheLogLine) {
+TEST_F(PlaylistListing, LibraryThatIsNotADatabaseFailsWithTheLogLine) {
     WriteFile(kLibraryDb, "SQLite format 2, or rather not at all\n" + std::string(2000, '\0'));
     EXPECT_EQ(request.handler.ListPlaylists(children, "music_shared"), 0);
     EXPECT_EQ(children, Json::Value(Json::arrayValue));
@@ -135,13 +135,13 @@ TEST_F(Part_4_2, LibraryThatIsNotADatabaseFailsWithTheLogLine) {
     EXPECT_EQ(lines[0].priority & 7, LOG_ERR);
 }
 
-TEST_F(Part_4_2, UnreadablePlaylistsFolderFailsWithTheLogLine) {
+TEST_F(PlaylistListing, UnreadablePlaylistsFolderFailsWithTheLogLine) {
     WriteFile(PersonalPlaylistDir("admin"), "a file where the folder should be");
     EXPECT_EQ(request.handler.ListPlaylists(children, "music_personal"), 0);
     EXPECT_EQ(LoggedErrors(), std::vector<std::string>{kFailureLog});
 }
 
-TEST_F(Part_4_2, DatabaseLockedByAWriterForASecondStillGivesTheList) {
+TEST_F(PlaylistListing, DatabaseLockedByAWriterForASecondStillGivesTheList) {
     MakeLibraryDb({}, {{1, "one"}, {2, "two"}});
     DatabaseWriterLock writer(kLibraryDb, 1000);
     ASSERT_TRUE(writer.Locked());
@@ -149,7 +149,7 @@ TEST_F(Part_4_2, DatabaseLockedByAWriterForASecondStillGivesTheList) {
     EXPECT_EQ(Texts(children), (std::vector<std::string>{"one", "two"}));
 }
 
-TEST_F(Part_4_2, FileNameThatIsNotUtf8GivesAValidUtf8Reply) {
+TEST_F(PlaylistListing, FileNameThatIsNotUtf8GivesAValidUtf8Reply) {
     WritePersonalPlaylistFile("admin", "bad\xFF\xFEname.m3u");
     ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
     ASSERT_EQ(children.size(), 1u);

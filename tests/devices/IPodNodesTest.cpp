@@ -1,6 +1,6 @@
-// Part 5.1: iPod nodes, over real iPod databases written with libgpod. The builders run in the
-// test process: the root tree and the refresh action that show them through a request are Parts
-// 2.1 and 2.3.
+// iPod nodes, over real iPod databases written with libgpod. The builders run in the test process,
+// where their result and the array they append to can be seen; the root tree and the refresh
+// action that show them through a request have tests of their own.
 #include <gtest/gtest.h>
 
 #include "DeviceTestSupport.h"
@@ -15,7 +15,7 @@ namespace {
 constexpr const char* kRefreshIcon = "3rdparty/Harmona/images/button/btn_refresh.png";
 constexpr const char* kPlaylistIcon = "3rdparty/Harmona/images/files_class/icon_genmusic.png";
 
-class Part_5_1 : public ::testing::Test {
+class IPodNodes : public ::testing::Test {
   protected:
     void SetUp() override { WriteDeviceFixture(); }
 
@@ -54,7 +54,7 @@ class Part_5_1 : public ::testing::Test {
     }
 };
 
-TEST_F(Part_5_1, AnIPodWithNoPlaylistsGivesTheRefreshButtonAloneWithAnEmptyPid) {
+TEST_F(IPodNodes, AnIPodWithNoPlaylistsGivesTheRefreshButtonAloneWithAnEmptyPid) {
     AttachIPod({});
     ASSERT_TRUE(Exists(IPodDatabasePath(kDefaultIPodMountpoint)));
     const Json::Value children = Children();
@@ -62,7 +62,7 @@ TEST_F(Part_5_1, AnIPodWithNoPlaylistsGivesTheRefreshButtonAloneWithAnEmptyPid) 
     ExpectRefreshButton(children[0]);
 }
 
-TEST_F(Part_5_1, TwoPlaylistsComeAfterTheButtonInTheLibrarysOrder) {
+TEST_F(IPodNodes, TwoPlaylistsComeAfterTheButtonInTheLibrarysOrder) {
     // Not in name order, so that any sorting would show.
     const auto ids = AttachIPod({"Zebra songs", "Abba hits"});
     const Json::Value children = Children();
@@ -72,7 +72,7 @@ TEST_F(Part_5_1, TwoPlaylistsComeAfterTheButtonInTheLibrarysOrder) {
     ExpectPlaylist(children[2], ids[1], "Abba hits");
 }
 
-TEST_F(Part_5_1, ManyPlaylistsKeepTheDatabaseOrder) {
+TEST_F(IPodNodes, ManyPlaylistsKeepTheDatabaseOrder) {
     std::vector<std::string> names;
     for (int i = 0; i < 60; ++i)
         names.push_back("List " + std::to_string((i * 37) % 60));
@@ -83,7 +83,7 @@ TEST_F(Part_5_1, ManyPlaylistsKeepTheDatabaseOrder) {
         ExpectPlaylist(children[static_cast<Json::ArrayIndex>(i + 1)], ids[i], names[i]);
 }
 
-TEST_F(Part_5_1, TheKeyIsTheIdInSixteenLowercaseHexDigits) {
+TEST_F(IPodNodes, TheKeyIsTheIdInSixteenLowercaseHexDigits) {
     WriteIPodDatabaseWithIds(kDefaultIPodMountpoint,
                              {{"Small id", 0xab}, {"Large id", 0xFEDCBA9876543210ull}});
     WriteIPodMountpointFile(std::string(kDefaultIPodMountpoint) + "\n");
@@ -93,7 +93,7 @@ TEST_F(Part_5_1, TheKeyIsTheIdInSixteenLowercaseHexDigits) {
     EXPECT_EQ(Text(children[2], "id"), "ipod_fedcba9876543210");
 }
 
-TEST_F(Part_5_1, HtmlSpecialCharactersAreEncodedInTheTextButNotInTheId) {
+TEST_F(IPodNodes, HtmlSpecialCharactersAreEncodedInTheTextButNotInTheId) {
     const auto ids = AttachIPod({"Rock & <Roll> \"live\" 'n' more"});
     const Json::Value children = Children();
     ASSERT_EQ(children.size(), 2u);
@@ -102,7 +102,7 @@ TEST_F(Part_5_1, HtmlSpecialCharactersAreEncodedInTheTextButNotInTheId) {
     EXPECT_EQ(Text(children[1], "id").find('&'), std::string::npos);
 }
 
-TEST_F(Part_5_1, NonAsciiNamesArriveUnchanged) {
+TEST_F(IPodNodes, NonAsciiNamesArriveUnchanged) {
     const std::string name = "Grüße aus Köln · 東京の夜 · 🎵";
     const auto ids = AttachIPod({name});
     const Json::Value children = Children();
@@ -110,7 +110,7 @@ TEST_F(Part_5_1, NonAsciiNamesArriveUnchanged) {
     ExpectPlaylist(children[1], ids[0], name);
 }
 
-TEST_F(Part_5_1, ANameOf300BytesIsCutTo254BytesOnACharacterBoundary) {
+TEST_F(IPodNodes, ANameOf300BytesIsCutTo254BytesOnACharacterBoundary) {
     // "x" and 100 three-byte characters: 301 bytes. 254 bytes would split the 85th character, so
     // the name keeps 1 + 84 * 3 = 253 bytes.
     std::string euros;
@@ -126,7 +126,7 @@ TEST_F(Part_5_1, ANameOf300BytesIsCutTo254BytesOnACharacterBoundary) {
     ExpectPlaylist(children[2], ids[1], std::string(254, 'a'));
 }
 
-TEST_F(Part_5_1, TheMasterPlaylistIsNotListed) {
+TEST_F(IPodNodes, TheMasterPlaylistIsNotListed) {
     const auto ids = AttachIPod({"Only list"});
     const Json::Value children = Children();
     ASSERT_EQ(children.size(), 2u);
@@ -135,7 +135,7 @@ TEST_F(Part_5_1, TheMasterPlaylistIsNotListed) {
         EXPECT_NE(Text(node, "text"), kIPodMasterPlaylistName);
 }
 
-TEST_F(Part_5_1, TheRefreshActionForIPodGetsThePlaylistNodesOnly) {
+TEST_F(IPodNodes, TheRefreshActionForIPodGetsThePlaylistNodesOnly) {
     const auto ids = AttachIPod({"First", "Second"});
     Json::Value items(Json::arrayValue);
     auto handler = MakeHandler();
@@ -145,7 +145,7 @@ TEST_F(Part_5_1, TheRefreshActionForIPodGetsThePlaylistNodesOnly) {
     ExpectPlaylist(items[1], ids[1], "Second");
 }
 
-TEST_F(Part_5_1, ListingAppendsAfterWhatTheArrayHolds) {
+TEST_F(IPodNodes, ListingAppendsAfterWhatTheArrayHolds) {
     const auto ids = AttachIPod({"Appended"});
     Json::Value items(Json::arrayValue);
     items.append("earlier");
@@ -156,7 +156,7 @@ TEST_F(Part_5_1, ListingAppendsAfterWhatTheArrayHolds) {
     ExpectPlaylist(items[1], ids[0], "Appended");
 }
 
-TEST_F(Part_5_1, ListingAnIPodWithNoPlaylistsCountsZero) {
+TEST_F(IPodNodes, ListingAnIPodWithNoPlaylistsCountsZero) {
     AttachIPod({});
     Json::Value items(Json::arrayValue);
     EXPECT_EQ(MakeHandler()->ListIPodPlaylists(items), 0);
@@ -164,7 +164,7 @@ TEST_F(Part_5_1, ListingAnIPodWithNoPlaylistsCountsZero) {
 }
 
 // The failures of the library: no playlist node, no error, the button alone.
-class Part_5_1_Failures : public Part_5_1 {
+class IPodNodeFailures : public IPodNodes {
   protected:
     void ExpectButtonAlone() {
         const Json::Value children = Children();
@@ -173,22 +173,22 @@ class Part_5_1_Failures : public Part_5_1 {
         Json::Value items(Json::arrayValue);
         EXPECT_EQ(MakeHandler()->ListIPodPlaylists(items), 0);
         EXPECT_EQ(items.size(), 0u);
-        EXPECT_TRUE(TakeLogLines(50).empty()) << "nothing is logged (Part 5.1)";
+        EXPECT_TRUE(TakeLogLines(50).empty()) << "a library failure is not logged";
     }
 };
 
-TEST_F(Part_5_1_Failures, AMissingMountpointFileGivesTheRefreshButtonAlone) {
+TEST_F(IPodNodeFailures, AMissingMountpointFileGivesTheRefreshButtonAlone) {
     WriteIPodDatabase(kDefaultIPodMountpoint, {"Unreachable"});
     ExpectButtonAlone();
 }
 
-TEST_F(Part_5_1_Failures, AMissingDatabaseGivesTheRefreshButtonAlone) {
+TEST_F(IPodNodeFailures, AMissingDatabaseGivesTheRefreshButtonAlone) {
     MakeDirs(std::string(kDefaultIPodMountpoint) + "/iPod_Control/iTunes");
     WriteIPodMountpointFile(std::string(kDefaultIPodMountpoint) + "\n");
     ExpectButtonAlone();
 }
 
-TEST_F(Part_5_1_Failures, ACorruptDatabaseGivesTheRefreshButtonAlone) {
+TEST_F(IPodNodeFailures, ACorruptDatabaseGivesTheRefreshButtonAlone) {
     AttachIPod({"Lost"});
     std::string garbage;
     for (int i = 0; i < 4096; ++i)
@@ -197,7 +197,7 @@ TEST_F(Part_5_1_Failures, ACorruptDatabaseGivesTheRefreshButtonAlone) {
     ExpectButtonAlone();
 }
 
-TEST_F(Part_5_1_Failures, ATruncatedDatabaseGivesTheRefreshButtonAlone) {
+TEST_F(IPodNodeFailures, ATruncatedDatabaseGivesTheRefreshButtonAlone) {
     AttachIPod({"Half", "Gone"});
     const std::string path = IPodDatabasePath(kDefaultIPodMountpoint);
     const std::string whole = ReadFile(path);
@@ -206,19 +206,19 @@ TEST_F(Part_5_1_Failures, ATruncatedDatabaseGivesTheRefreshButtonAlone) {
     ExpectButtonAlone();
 }
 
-TEST_F(Part_5_1_Failures, AnEmptyDatabaseFileGivesTheRefreshButtonAlone) {
+TEST_F(IPodNodeFailures, AnEmptyDatabaseFileGivesTheRefreshButtonAlone) {
     AttachIPod({"Empty"});
     WriteFile(IPodDatabasePath(kDefaultIPodMountpoint), "");
     ExpectButtonAlone();
 }
 
-TEST_F(Part_5_1_Failures, ARelativeMountpointGivesTheRefreshButtonAlone) {
+TEST_F(IPodNodeFailures, ARelativeMountpointGivesTheRefreshButtonAlone) {
     AttachIPod({"Relative"});
     WriteIPodMountpointFile("tmp/ipod\n");
     ExpectButtonAlone();
 }
 
-TEST_F(Part_5_1_Failures, AMountpointWithoutAnIPodGivesTheRefreshButtonAlone) {
+TEST_F(IPodNodeFailures, AMountpointWithoutAnIPodGivesTheRefreshButtonAlone) {
     MakeDirs("/tmp/not-an-ipod");
     WriteIPodMountpointFile("/tmp/not-an-ipod\n");
     ExpectButtonAlone();

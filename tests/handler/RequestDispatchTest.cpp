@@ -1,4 +1,4 @@
-// Part 1.1: request entry and action dispatch, through the real CGI.
+// Request entry (the caller's name and permission) and action dispatch, through the real CGI.
 #include <gtest/gtest.h>
 
 #include "CgiRunner.h"
@@ -8,12 +8,12 @@ using namespace harmona::test;
 
 namespace {
 
-class Part_1_1 : public ::testing::Test {
+class RequestDispatch : public ::testing::Test {
   protected:
     void SetUp() override { StandardFixture(); }
 };
 
-TEST_F(Part_1_1, AvoidTimeoutPrintsSuccessAndExitsWithOne) {
+TEST_F(RequestDispatch, AvoidTimeoutPrintsSuccessAndExitsWithOne) {
     const CgiResult r = Get("action=avoid_timeout");
     ASSERT_TRUE(r.exited) << r.errors;
     EXPECT_EQ(r.exitStatus, 1);
@@ -21,7 +21,7 @@ TEST_F(Part_1_1, AvoidTimeoutPrintsSuccessAndExitsWithOne) {
     EXPECT_EQ(r.body, "{\"success\":true}\n");
 }
 
-TEST_F(Part_1_1, UnknownActionPrintsSuccessAndExitsWithZero) {
+TEST_F(RequestDispatch, UnknownActionPrintsSuccessAndExitsWithZero) {
     for (const char* action : {"dance", "AVOID_TIMEOUT", "", "avoid_timeout "}) {
         const CgiResult r = Get(Query({{"action", action}}));
         ASSERT_TRUE(r.exited) << action;
@@ -30,7 +30,7 @@ TEST_F(Part_1_1, UnknownActionPrintsSuccessAndExitsWithZero) {
     }
 }
 
-TEST_F(Part_1_1, PermissionZeroGetsNoReplyBody) {
+TEST_F(RequestDispatch, PermissionZeroGetsNoReplyBody) {
     AddUser("admin", 0);
     const CgiResult r = Get("action=avoid_timeout");
     ASSERT_TRUE(r.exited);
@@ -38,21 +38,21 @@ TEST_F(Part_1_1, PermissionZeroGetsNoReplyBody) {
     EXPECT_EQ(r.output, "");
 }
 
-TEST_F(Part_1_1, UnknownUserHasPermissionZero) {
+TEST_F(RequestDispatch, UnknownUserHasPermissionZero) {
     const CgiResult r = Get("action=avoid_timeout", "nobody");
     ASSERT_TRUE(r.exited);
     EXPECT_EQ(r.exitStatus, 0);
     EXPECT_EQ(r.output, "");
 }
 
-TEST_F(Part_1_1, MissingActionPrintsNothing) {
+TEST_F(RequestDispatch, MissingActionPrintsNothing) {
     const CgiResult r = Get("node=audiotree_root");
     ASSERT_TRUE(r.exited);
     EXPECT_EQ(r.exitStatus, 0);
     EXPECT_EQ(r.output, "");
 }
 
-TEST_F(Part_1_1, RefusedCallerGetsOnly401Header) {
+TEST_F(RequestDispatch, RefusedCallerGetsOnly401Header) {
     const std::string tooLong(65, 'a');
     for (const std::string& user :
          {std::string(""), std::string("a/b"), std::string(".."), std::string("."),
@@ -73,7 +73,7 @@ TEST_F(Part_1_1, RefusedCallerGetsOnly401Header) {
     EXPECT_EQ(r.output, "Status: 401 Unauthorized\r\n\r\n");
 }
 
-TEST_F(Part_1_1, LongestValidUserNameIsAuthorized) {
+TEST_F(RequestDispatch, LongestValidUserNameIsAuthorized) {
     const std::string name(64, 'u');
     AddUser(name, 8);
     const CgiResult r = Get("action=avoid_timeout", name);
@@ -83,7 +83,7 @@ TEST_F(Part_1_1, LongestValidUserNameIsAuthorized) {
 
 // The dispatch of "gettreenode" and "refresh" to their builders.
 
-TEST_F(Part_1_1, AudiotreeRootRunsTheRootBuilder) {
+TEST_F(RequestDispatch, AudiotreeRootRunsTheRootBuilder) {
     const CgiResult r = Get("action=gettreenode&node=audiotree_root");
     EXPECT_EQ(r.exitStatus, 1);
     ASSERT_TRUE(r.json.isArray()) << r.output;
@@ -94,28 +94,28 @@ TEST_F(Part_1_1, AudiotreeRootRunsTheRootBuilder) {
     EXPECT_TRUE(radio) << r.body;
 }
 
-TEST_F(Part_1_1, UpperCaseRootIsRoutedToChildNodes) {
+TEST_F(RequestDispatch, UpperCaseRootIsRoutedToChildNodes) {
     const CgiResult r = Get("action=gettreenode&node=AUDIOTREE_ROOT");
-    // "AUDIOTREE_ROOT" is a family "AUDIOTREE" with rest "ROOT": Part 2.2 answers with an empty
-    // reply.
+    // "AUDIOTREE_ROOT" is a family "AUDIOTREE" with rest "ROOT": the child node routing knows no
+    // such family and answers with an empty reply.
     EXPECT_EQ(r.exitStatus, 1);
     EXPECT_EQ(r.body, "[]\n");
 }
 
-TEST_F(Part_1_1, RefreshMediaserverRunsTheMediaServerRefresh) {
+TEST_F(RequestDispatch, RefreshMediaserverRunsTheMediaServerRefresh) {
     const CgiResult r = Get("action=refresh&target=mediaserver");
     EXPECT_EQ(r.exitStatus, 1);
     EXPECT_EQ(r.json["success"], true);
     EXPECT_TRUE(r.json.isMember("items"));
 }
 
-TEST_F(Part_1_1, RefreshIPodGoesToRefreshNodeAndExitsWithOne) {
+TEST_F(RequestDispatch, RefreshIPodGoesToRefreshNodeAndExitsWithOne) {
     const CgiResult r = Get("action=refresh&target=ipod");
     EXPECT_EQ(r.exitStatus, 1);
     EXPECT_EQ(r.json["success"], true);
 }
 
-TEST_F(Part_1_1, GettreenodeWithoutNodePrintsNothing) {
+TEST_F(RequestDispatch, GettreenodeWithoutNodePrintsNothing) {
     const CgiResult r = Get("action=gettreenode");
     EXPECT_EQ(r.exitStatus, 0);
     EXPECT_EQ(r.output, "");

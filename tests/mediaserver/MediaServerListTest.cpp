@@ -1,6 +1,6 @@
-// Part 3.2: Media server list. "refresh" with target "mediaserver" through the real CGI against a
+// The media server list: "refresh" with target "mediaserver" through the real CGI against a
 // scripted daemon on /tmp/vanuaudiod.sock; GetMediaServerNodes through a HarmonaHandler built in
-// the test process (the root tree that shows it to the browser is Part 2.1).
+// the test process (the root tree that shows it to the browser is tested in tests/tree).
 #include <gtest/gtest.h>
 #include <stdlib.h>
 
@@ -55,7 +55,7 @@ DaemonScript Pages(std::function<DaemonAnswer(int offset)> page) {
     };
 }
 
-class Part_3_2 : public ::testing::Test {
+class MediaServerList : public ::testing::Test {
   protected:
     void SetUp() override {
         WriteFile(std::string(kTextsDir) + "enu/strings",
@@ -100,7 +100,7 @@ class Part_3_2 : public ::testing::Test {
     }
 };
 
-TEST_F(Part_3_2, TotalOf25AsksThreeTimesWithOffsets0_10_20AndCount10) {
+TEST_F(MediaServerList, TotalOf25AsksThreeTimesWithOffsets0_10_20AndCount10) {
     ScriptedDaemon daemon(ServeMediaServers(MakeMediaServers(25)));
     const CgiResult r = Refresh();
     EXPECT_EQ(daemon.Commands(), (std::vector<std::int32_t>{14, 16, 16, 16}));
@@ -114,7 +114,7 @@ TEST_F(Part_3_2, TotalOf25AsksThreeTimesWithOffsets0_10_20AndCount10) {
     EXPECT_TRUE(r.LogMessages().empty());
 }
 
-TEST_F(Part_3_2, HundredServersArePagedInTenRequests) {
+TEST_F(MediaServerList, HundredServersArePagedInTenRequests) {
     ScriptedDaemon daemon(ServeMediaServers(MakeMediaServers(100)));
     const CgiResult r = Refresh();
     std::vector<std::string> expected;
@@ -129,7 +129,7 @@ TEST_F(Part_3_2, HundredServersArePagedInTenRequests) {
     EXPECT_EQ(std::count(commands.begin(), commands.end(), 14), 1);
 }
 
-TEST_F(Part_3_2, TotalOfTenOrLessGivesExactlyOnePageRequest) {
+TEST_F(MediaServerList, TotalOfTenOrLessGivesExactlyOnePageRequest) {
     for (int n : {10, 3, 0}) {
         ScriptedDaemon daemon(ServeMediaServers(MakeMediaServers(n)));
         const CgiResult r = Refresh();
@@ -138,7 +138,7 @@ TEST_F(Part_3_2, TotalOfTenOrLessGivesExactlyOnePageRequest) {
     }
 }
 
-TEST_F(Part_3_2, AbsentOrNonIntegerTotalGivesExactlyOnePageRequest) {
+TEST_F(MediaServerList, AbsentOrNonIntegerTotalGivesExactlyOnePageRequest) {
     for (const Json::Value& total :
          {Json::Value(), Json::Value("25"), Json::Value(25.5), Json::Value(1e12)}) {
         ScriptedDaemon daemon(
@@ -149,7 +149,7 @@ TEST_F(Part_3_2, AbsentOrNonIntegerTotalGivesExactlyOnePageRequest) {
     }
 }
 
-TEST_F(Part_3_2, TotalIsTakenAnewFromEveryPage) {
+TEST_F(MediaServerList, TotalIsTakenAnewFromEveryPage) {
     ScriptedDaemon daemon(Pages([](int offset) {
         return DaemonAnswer::Reply(Page(MakeMediaServers(10), offset == 0 ? 40 : 15));
     }));
@@ -159,7 +159,7 @@ TEST_F(Part_3_2, TotalIsTakenAnewFromEveryPage) {
     EXPECT_EQ(Ids(r).size(), 20u);
 }
 
-TEST_F(Part_3_2, ServerWithEmptyOrAbsentFriendlyNameShowsItsIp) {
+TEST_F(MediaServerList, ServerWithEmptyOrAbsentFriendlyNameShowsItsIp) {
     std::vector<MediaServer> servers = {
         {"http://a/ctl", "", "192.168.1.10"},
         {"http://b/ctl", Json::Value(), "192.168.1.11"},
@@ -177,7 +177,7 @@ TEST_F(Part_3_2, ServerWithEmptyOrAbsentFriendlyNameShowsItsIp) {
     EXPECT_EQ(items[3]["text"], "192.168.1.13");
 }
 
-TEST_F(Part_3_2, ControlUrlLongerThan1011CharactersIsCutTo1023InTheId) {
+TEST_F(MediaServerList, ControlUrlLongerThan1011CharactersIsCutTo1023InTheId) {
     const std::string exact(1011, 'e');
     const std::string longer(1012, 'l');
     const std::string huge(5000, 'h');
@@ -192,13 +192,13 @@ TEST_F(Part_3_2, ControlUrlLongerThan1011CharactersIsCutTo1023InTheId) {
     EXPECT_EQ(ids[2].size(), 1023u);
 }
 
-TEST_F(Part_3_2, ControlUrlGoesIntoTheIdUnescaped) {
+TEST_F(MediaServerList, ControlUrlGoesIntoTheIdUnescaped) {
     const std::string url = "http://10.0.0.9:8200/ctl?x=<1>&y=\"2\"";
     ScriptedDaemon daemon(ServeMediaServers({{url, "S", "10.0.0.9"}}));
     EXPECT_EQ(Ids(Refresh()), std::vector<std::string>{"mediaserver_" + url});
 }
 
-TEST_F(Part_3_2, SecondPageNotJsonKeepsTheFirstTenLogsOneParseErrorAndAsksNoThirdPage) {
+TEST_F(MediaServerList, SecondPageNotJsonKeepsTheFirstTenLogsOneParseErrorAndAsksNoThirdPage) {
     ScriptedDaemon daemon(Pages([](int offset) {
         return DaemonAnswer::Reply(offset == 0 ? Page(MakeMediaServers(10), 30)
                                                : "this is not JSON");
@@ -209,7 +209,7 @@ TEST_F(Part_3_2, SecondPageNotJsonKeepsTheFirstTenLogsOneParseErrorAndAsksNoThir
     EXPECT_EQ(PageArguments(daemon), (std::vector<std::string>{"0 10", "10 10"}));
 }
 
-TEST_F(Part_3_2, FailedPageRequestKeepsEarlierNodesAndStopsWithoutParseError) {
+TEST_F(MediaServerList, FailedPageRequestKeepsEarlierNodesAndStopsWithoutParseError) {
     ScriptedDaemon daemon(Pages([](int offset) {
         return offset == 0 ? DaemonAnswer::Reply(Page(MakeMediaServers(10), 30))
                            : DaemonAnswer::Close();
@@ -222,7 +222,7 @@ TEST_F(Part_3_2, FailedPageRequestKeepsEarlierNodesAndStopsWithoutParseError) {
     EXPECT_EQ(log[0].rfind("ctrl:90 Failed to read action [", 0), 0u) << log[0];
 }
 
-TEST_F(Part_3_2, WithTheDaemonDownRefreshIsASuccessWithNullItems) {
+TEST_F(MediaServerList, WithTheDaemonDownRefreshIsASuccessWithNullItems) {
     const CgiResult r = Refresh();
     EXPECT_EQ(r.body, "{\"items\":null,\"success\":true}\n");
     EXPECT_EQ(
@@ -231,7 +231,7 @@ TEST_F(Part_3_2, WithTheDaemonDownRefreshIsASuccessWithNullItems) {
             "ctrl:27 Failed to connect to /tmp/vanuaudiod.sock. [No such file or directory]"});
 }
 
-TEST_F(Part_3_2, WithTheDaemonDownTheMediaServerNodeHasOnlyTheScanButton) {
+TEST_F(MediaServerList, WithTheDaemonDownTheMediaServerNodeHasOnlyTheScanButton) {
     setenv("REMOTE_USER", "admin", 1);
     HarmonaHandler handler;
     Json::Value children(Json::arrayValue);
@@ -250,7 +250,7 @@ TEST_F(Part_3_2, WithTheDaemonDownTheMediaServerNodeHasOnlyTheScanButton) {
     EXPECT_EQ(children[0], scan) << Compact(children);
 }
 
-TEST_F(Part_3_2, MediaServerNodeListsTheScanButtonThenTheServers) {
+TEST_F(MediaServerList, MediaServerNodeListsTheScanButtonThenTheServers) {
     ScriptedDaemon daemon(ServeMediaServers(MakeMediaServers(12)));
     setenv("REMOTE_USER", "admin", 1);
     HarmonaHandler handler;
@@ -275,7 +275,7 @@ TEST_F(Part_3_2, MediaServerNodeListsTheScanButtonThenTheServers) {
     EXPECT_EQ(children[13], server);
 }
 
-TEST_F(Part_3_2, AppendMediaServersReturnsTheLastTotalOrZeroOnFailure) {
+TEST_F(MediaServerList, AppendMediaServersReturnsTheLastTotalOrZeroOnFailure) {
     setenv("REMOTE_USER", "admin", 1);
     HarmonaHandler handler;
     Json::Value children;
@@ -293,7 +293,7 @@ TEST_F(Part_3_2, AppendMediaServersReturnsTheLastTotalOrZeroOnFailure) {
     }
 }
 
-TEST_F(Part_3_2, ServerNamesAreHtmlEncodedInTextAndQtip) {
+TEST_F(MediaServerList, ServerNamesAreHtmlEncodedInTextAndQtip) {
     ScriptedDaemon daemon(
         ServeMediaServers({{"http://x/ctl", "Tom & Jerry's <\"NAS\">", "1.2.3.4"}}));
     const CgiResult r = Refresh();
@@ -303,7 +303,7 @@ TEST_F(Part_3_2, ServerNamesAreHtmlEncodedInTextAndQtip) {
     EXPECT_EQ(r.json["items"][0]["qtip"], encoded);
 }
 
-TEST_F(Part_3_2, AnswerAfterSevenTenthsOfASecondGivesNoServersNoLogLineAndEndsPromptly) {
+TEST_F(MediaServerList, AnswerAfterSevenTenthsOfASecondGivesNoServersNoLogLineAndEndsPromptly) {
     ScriptedDaemon daemon([](const DaemonRequest&) {
         return DaemonAnswer::Reply(Page(MakeMediaServers(5), 5), 700);
     });
@@ -315,7 +315,7 @@ TEST_F(Part_3_2, AnswerAfterSevenTenthsOfASecondGivesNoServersNoLogLineAndEndsPr
     EXPECT_EQ(daemon.Commands(), std::vector<std::int32_t>{14});
 }
 
-TEST_F(Part_3_2, LatePageAnswerKeepsEarlierPagesWithoutLogLine) {
+TEST_F(MediaServerList, LatePageAnswerKeepsEarlierPagesWithoutLogLine) {
     ScriptedDaemon daemon(Pages([](int offset) {
         return DaemonAnswer::Reply(Page(MakeMediaServers(10), 30), offset == 0 ? 0 : 700);
     }));
@@ -325,7 +325,7 @@ TEST_F(Part_3_2, LatePageAnswerKeepsEarlierPagesWithoutLogLine) {
     EXPECT_EQ(PageArguments(daemon).size(), 2u);
 }
 
-TEST_F(Part_3_2, UnansweredPrepareAsksForNoPage) {
+TEST_F(MediaServerList, UnansweredPrepareAsksForNoPage) {
     for (const DaemonAnswer& answer : {DaemonAnswer::Never(), DaemonAnswer::Close()}) {
         ScriptedDaemon daemon([&](const DaemonRequest&) { return answer; });
         const CgiResult r = Refresh();
@@ -334,7 +334,7 @@ TEST_F(Part_3_2, UnansweredPrepareAsksForNoPage) {
     }
 }
 
-TEST_F(Part_3_2, ReplyThatFillsTheWholeBufferIsAParseFailureNeverAnOverread) {
+TEST_F(MediaServerList, ReplyThatFillsTheWholeBufferIsAParseFailureNeverAnOverread) {
     // Valid JSON padded with spaces to the buffer's size and beyond: no NUL fits, so no parse.
     for (size_t size : {size_t(kReplySize), size_t(kReplySize) + 1, size_t(100000)}) {
         std::string reply = Page(MakeMediaServers(3), 3);
@@ -346,7 +346,7 @@ TEST_F(Part_3_2, ReplyThatFillsTheWholeBufferIsAParseFailureNeverAnOverread) {
     }
 }
 
-TEST_F(Part_3_2, ReplyOneByteShorterThanTheBufferIsParsed) {
+TEST_F(MediaServerList, ReplyOneByteShorterThanTheBufferIsParsed) {
     std::string reply = Page(MakeMediaServers(3), 3);
     reply.append(size_t(kReplySize) - 1 - reply.size(), ' ');
     ScriptedDaemon daemon(Pages([&](int) { return DaemonAnswer::Reply(reply); }));
@@ -355,13 +355,13 @@ TEST_F(Part_3_2, ReplyOneByteShorterThanTheBufferIsParsed) {
     EXPECT_TRUE(r.LogMessages().empty());
 }
 
-TEST_F(Part_3_2, ReplyIsReadUpToItsFirstNul) {
+TEST_F(MediaServerList, ReplyIsReadUpToItsFirstNul) {
     const std::string reply = Page(MakeMediaServers(2), 2) + std::string(1, '\0') + "garbage";
     ScriptedDaemon daemon(Pages([&](int) { return DaemonAnswer::Reply(reply); }));
     EXPECT_EQ(Ids(Refresh()).size(), 2u);
 }
 
-TEST_F(Part_3_2, ReplyWithCommentsIsParsed) {
+TEST_F(MediaServerList, ReplyWithCommentsIsParsed) {
     const std::string reply = "/* vanuaudiod */ {\"list\": [ // one server\n" +
                               Compact(MediaServerElement(MakeMediaServers(1)[0])) +
                               "], \"total\": 1}";
@@ -371,7 +371,7 @@ TEST_F(Part_3_2, ReplyWithCommentsIsParsed) {
     EXPECT_TRUE(r.LogMessages().empty());
 }
 
-TEST_F(Part_3_2, ReplyInPiecesIsCutToTheFirstPieceAndFailsToParse) {
+TEST_F(MediaServerList, ReplyInPiecesIsCutToTheFirstPieceAndFailsToParse) {
     ScriptedDaemon daemon(
         Pages([](int) { return DaemonAnswer::InPieces(Page(MakeMediaServers(5), 5), {20}, 200); }));
     const CgiResult r = Refresh();
@@ -379,7 +379,7 @@ TEST_F(Part_3_2, ReplyInPiecesIsCutToTheFirstPieceAndFailsToParse) {
     EXPECT_EQ(r.LogMessages(), std::vector<std::string>{kParseError});
 }
 
-TEST_F(Part_3_2, JsonThatIsNoObjectGivesNoNodesAndNoCrash) {
+TEST_F(MediaServerList, JsonThatIsNoObjectGivesNoNodesAndNoCrash) {
     for (const char* reply :
          {"[1, 2, 3]", "42", "\"text\"", "null", "true",
           "{\"list\": {\"a\": {\"control_url\": \"x\", \"ip\": \"1\"}}}",
@@ -391,7 +391,7 @@ TEST_F(Part_3_2, JsonThatIsNoObjectGivesNoNodesAndNoCrash) {
     }
 }
 
-TEST_F(Part_3_2, DeeplyNestedReplyIsAParseFailureNotACrash) {
+TEST_F(MediaServerList, DeeplyNestedReplyIsAParseFailureNotACrash) {
     for (const std::string& open : {std::string("["), std::string("{\"a\":")}) {
         std::string reply;
         for (int i = 0; i < 5000; ++i)
@@ -403,7 +403,7 @@ TEST_F(Part_3_2, DeeplyNestedReplyIsAParseFailureNotACrash) {
     }
 }
 
-TEST_F(Part_3_2, ElementsWithoutTextualControlUrlOrTextAreSkipped) {
+TEST_F(MediaServerList, ElementsWithoutTextualControlUrlOrTextAreSkipped) {
     const std::string reply =
         "{\"list\": ["
         "{\"friendly_name\": \"no url\", \"ip\": \"1\"},"
@@ -421,7 +421,7 @@ TEST_F(Part_3_2, ElementsWithoutTextualControlUrlOrTextAreSkipped) {
     EXPECT_EQ(r.json["items"][1]["text"], "10.1.1.1");
 }
 
-TEST_F(Part_3_2, RealDaemonsUnsupportedAnswerGivesNoNodes) {
+TEST_F(MediaServerList, RealDaemonsUnsupportedAnswerGivesNoNodes) {
     ScriptedDaemon daemon(Pages([](int) {
         return DaemonAnswer::Reply("{\"success\": false, \"error\": \"unsupported\"}");
     }));

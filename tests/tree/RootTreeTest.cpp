@@ -1,4 +1,4 @@
-// Part 2.1: root tree, through the real CGI over real fixtures for every child builder.
+// The root tree, through the real CGI over real fixtures for every child builder.
 #include <gtest/gtest.h>
 
 #include <sys/stat.h>
@@ -20,7 +20,7 @@ const std::string kRootQuery = "action=gettreenode&node=audiotree_root";
 const Strings kAllCategories = {"musiclib_root", "musiclib_music_personal", "musiclib_music_shared",
                                 "ipod_root",     "inetradio_root",          "mediaserver_root"};
 
-CgiResult RootTree(const TreeWorld& world) {
+CgiResult RootTreeFor(const TreeWorld& world) {
     TreeFixture fixture(world);
     return Get(kRootQuery, world.user);
 }
@@ -34,16 +34,16 @@ const Json::Value& Category(const CgiResult& r, const std::string& id) {
     return none;
 }
 
-TEST(Part_2_1, ServiceStoppedGivesNoLibraryCategories) {
+TEST(RootTree, ServiceStoppedGivesNoLibraryCategories) {
     TreeWorld world;
     world.serviceRunning = false;
-    const CgiResult r = RootTree(world);
+    const CgiResult r = RootTreeFor(world);
     ASSERT_TRUE(r.jsonOk) << r.output;
     EXPECT_EQ(r.exitStatus, 1);
     EXPECT_EQ(Ids(r.json), (Strings{"ipod_root", "inetradio_root", "mediaserver_root"}));
 }
 
-TEST(Part_2_1, NoServicePidFileGivesNoLibraryCategories) {
+TEST(RootTree, NoServicePidFileGivesNoLibraryCategories) {
     TreeWorld world;
     world.permission = 8;
     TreeFixture fixture(world);
@@ -52,14 +52,14 @@ TEST(Part_2_1, NoServicePidFileGivesNoLibraryCategories) {
     EXPECT_EQ(Ids(r.json), (Strings{"inetradio_root", "mediaserver_root"}));
 }
 
-TEST(Part_2_1, NoAudioShareGivesNoLibraryCategories) {
+TEST(RootTree, NoAudioShareGivesNoLibraryCategories) {
     TreeWorld world;
     world.share = false;
-    const CgiResult r = RootTree(world);
+    const CgiResult r = RootTreeFor(world);
     EXPECT_EQ(Ids(r.json), (Strings{"ipod_root", "inetradio_root", "mediaserver_root"}));
 }
 
-TEST(Part_2_1, AudioSharePathFromAudioConfCounts) {
+TEST(RootTree, AudioSharePathFromAudioConfCounts) {
     TreeWorld world;
     world.share = false;
     TreeFixture fixture(world);
@@ -72,17 +72,17 @@ TEST(Part_2_1, AudioSharePathFromAudioConfCounts) {
               (Strings{"ipod_root", "inetradio_root", "mediaserver_root"}));
 }
 
-TEST(Part_2_1, PermissionEightOnlyNoIPodLibraryOn) {
+TEST(RootTree, PermissionEightOnlyNoIPodLibraryOn) {
     TreeWorld world;
     world.permission = 8;
     world.ipod = false;
-    const CgiResult r = RootTree(world);
+    const CgiResult r = RootTreeFor(world);
     EXPECT_EQ(Ids(r.json),
               (Strings{"musiclib_root", "musiclib_music_personal", "musiclib_music_shared",
                        "inetradio_root", "mediaserver_root"}));
 }
 
-TEST(Part_2_1, IPodPathThatIsARegularFileShowsNoIPod) {
+TEST(RootTree, IPodPathThatIsARegularFileShowsNoIPod) {
     TreeWorld world;
     world.permission = 1;
     world.ipod = false;
@@ -92,28 +92,28 @@ TEST(Part_2_1, IPodPathThatIsARegularFileShowsNoIPod) {
                                                   "musiclib_music_shared", "inetradio_root"}));
 }
 
-TEST(Part_2_1, IPodDirectoryWithoutPermissionBitShowsNoIPod) {
+TEST(RootTree, IPodDirectoryWithoutPermissionBitShowsNoIPod) {
     TreeWorld world;
     world.permission = 4 | 8;
-    EXPECT_EQ(Ids(RootTree(world).json),
+    EXPECT_EQ(Ids(RootTreeFor(world).json),
               (Strings{"musiclib_root", "musiclib_music_personal", "musiclib_music_shared",
                        "inetradio_root", "mediaserver_root"}));
 }
 
-TEST(Part_2_1, RadioCategoryIsPresentWhateverTheBits) {
+TEST(RootTree, RadioCategoryIsPresentWhateverTheBits) {
     for (int permission : {1, 4, 8, 13, 16, 2, -1, 0x40000000}) {
         TreeWorld world;
         world.permission = permission;
         world.serviceRunning = permission % 2 == 0;
-        const CgiResult r = RootTree(world);
+        const CgiResult r = RootTreeFor(world);
         const Strings ids = Ids(r.json);
         EXPECT_NE(std::find(ids.begin(), ids.end(), "inetradio_root"), ids.end()) << permission;
         ResetSandbox();
     }
 }
 
-TEST(Part_2_1, OnlyMusicLibraryAndRadioAreExpandedAndAllHideTheirIcon) {
-    const CgiResult r = RootTree(TreeWorld());
+TEST(RootTree, OnlyMusicLibraryAndRadioAreExpandedAndAllHideTheirIcon) {
+    const CgiResult r = RootTreeFor(TreeWorld());
     ASSERT_EQ(Ids(r.json), kAllCategories);
     for (const Json::Value& node : r.json) {
         const std::string id = node["id"].asString();
@@ -127,7 +127,7 @@ TEST(Part_2_1, OnlyMusicLibraryAndRadioAreExpandedAndAllHideTheirIcon) {
     }
 }
 
-TEST(Part_2_1, WholeTreeForEveryPermission) {
+TEST(RootTree, WholeTreeForEveryPermission) {
     TreeFixture fixture(TreeWorld{});
     const CgiResult r = Get(kRootQuery);
     ASSERT_EQ(r.exitStatus, 1);
@@ -161,58 +161,58 @@ TEST(Part_2_1, WholeTreeForEveryPermission) {
     EXPECT_EQ(fixture.Daemon()->Commands(), (std::vector<std::int32_t>{14, 16}));
 }
 
-TEST(Part_2_1, PermissionOneShowsIPodButNoMediaServerAndNoSharedNewButton) {
+TEST(RootTree, PermissionOneShowsIPodButNoMediaServerAndNoSharedNewButton) {
     TreeWorld world;
     world.permission = 1;
-    const CgiResult r = RootTree(world);
+    const CgiResult r = RootTreeFor(world);
     EXPECT_EQ(Ids(r.json), (Strings{"musiclib_root", "musiclib_music_personal",
                                     "musiclib_music_shared", "ipod_root", "inetradio_root"}));
     EXPECT_EQ(Ids(Category(r, "musiclib_music_shared")["children"])[1],
               "musiclib_music_shared/playlist/3");
 }
 
-TEST(Part_2_1, PermissionFourAddsOnlyTheSharedNewButton) {
+TEST(RootTree, PermissionFourAddsOnlyTheSharedNewButton) {
     TreeWorld world;
     world.permission = 4;
-    const CgiResult r = RootTree(world);
+    const CgiResult r = RootTreeFor(world);
     EXPECT_EQ(Ids(r.json), (Strings{"musiclib_root", "musiclib_music_personal",
                                     "musiclib_music_shared", "inetradio_root"}));
     EXPECT_EQ(Ids(Category(r, "musiclib_music_shared")["children"])[1],
               "musiclib_music_shared_new");
 }
 
-TEST(Part_2_1, NoOptionalBitsWithServiceStoppedGivesRadioAlone) {
+TEST(RootTree, NoOptionalBitsWithServiceStoppedGivesRadioAlone) {
     TreeWorld world;
     world.permission = 16;
     world.serviceRunning = false;
-    const CgiResult r = RootTree(world);
+    const CgiResult r = RootTreeFor(world);
     EXPECT_EQ(r.exitStatus, 1);
     EXPECT_EQ(Ids(r.json), (Strings{"inetradio_root"}));
 }
 
-TEST(Part_2_1, DaemonDownLeavesTheScanButtonAlone) {
+TEST(RootTree, DaemonDownLeavesTheScanButtonAlone) {
     TreeWorld world;
     world.daemon = false;
-    const CgiResult r = RootTree(world);
+    const CgiResult r = RootTreeFor(world);
     EXPECT_EQ(r.exitStatus, 1);
     EXPECT_EQ(Ids(Category(r, "mediaserver_root")["children"]), (Strings{"mediaserver_refresh"}));
 }
 
-TEST(Part_2_1, TextsInTheUsersLanguage) {
+TEST(RootTree, TextsInTheUsersLanguage) {
     TreeWorld world;
     world.language = "ger";
-    const CgiResult r = RootTree(world);
+    const CgiResult r = RootTreeFor(world);
     EXPECT_EQ(Category(r, "musiclib_root")["text"], "Mediathek");
     EXPECT_EQ(Category(r, "inetradio_root")["text"], "Internetradio");
     EXPECT_EQ(Category(r, "mediaserver_root")["text"], "Medienserver");
 }
 
-TEST(Part_2_1, FailingPersonalPlaylistsEndTheTreeWithTheErrorPair) {
+TEST(RootTree, FailingPersonalPlaylistsEndTheTreeWithTheErrorPair) {
     TreeWorld world;
     world.personal = {};
     world.personalSmart = {};
     TreeFixture fixture(world);
-    // A playlists path that cannot be read as a folder: the listing fails (platform.md section 7).
+    // A playlists path that cannot be read as a folder: the personal playlist listing fails.
     WriteFile(PersonalPlaylistDir(world.user), "not a folder");
     const CgiResult r = Get(kRootQuery);
     ASSERT_TRUE(r.jsonOk) << r.output;
@@ -224,7 +224,7 @@ TEST(Part_2_1, FailingPersonalPlaylistsEndTheTreeWithTheErrorPair) {
     EXPECT_EQ(r.LogMessages(), (Strings{"audio:642 Failed to enum user's playlist!"}));
 }
 
-TEST(Part_2_1, SharedLibraryThatIsNotADatabaseEndsTheTree) {
+TEST(RootTree, SharedLibraryThatIsNotADatabaseEndsTheTree) {
     TreeFixture fixture(TreeWorld{});
     WriteFile(kLibraryDb, std::string(4096, 'x'));
     const CgiResult r = Get(kRootQuery);
@@ -233,9 +233,9 @@ TEST(Part_2_1, SharedLibraryThatIsNotADatabaseEndsTheTree) {
     EXPECT_EQ(Ids(r.json["items"]), (Strings{"musiclib_root", "musiclib_music_personal"}));
 }
 
-// The radio builder cannot fail from outside (Part 5.2 always returns 1): its failure is made here,
-// on the root tree's own table, with a radio builder that fails.
-TEST(Part_2_1, RadioBuilderFailureAfterFourCategoriesKeepsThemAndReportsTheError) {
+// The radio builder cannot fail from outside (it always returns 1): its failure is made here, on
+// the root tree's own table, with a radio builder that fails.
+TEST(RootTree, RadioBuilderFailureAfterFourCategoriesKeepsThemAndReportsTheError) {
     TreeFixture fixture(TreeWorld{});
     setenv("REMOTE_USER", "admin", 1);
     unsetenv("HTTP_ACCEPT_LANGUAGE");
@@ -260,12 +260,12 @@ TEST(Part_2_1, RadioBuilderFailureAfterFourCategoriesKeepsThemAndReportsTheError
     EXPECT_EQ(output.find("mediaserver_root"), std::string::npos);
 }
 
-TEST(Part_2_1, TextsAreLoadedEvenWhenOnlyRadioIsShown) {
+TEST(RootTree, TextsAreLoadedEvenWhenOnlyRadioIsShown) {
     TreeWorld world;
     world.permission = 16;
     world.serviceRunning = false;
     world.language = "jpn";
-    const CgiResult r = RootTree(world);
+    const CgiResult r = RootTreeFor(world);
     EXPECT_EQ(Category(r, "inetradio_root")["text"], "インターネットラジオ");
 }
 

@@ -1,4 +1,5 @@
-// Part 2.2: Child node routing, through the real CGI against a scripted ContentDirectory.
+// Child node routing by the node id's family, through the real CGI against a scripted
+// ContentDirectory.
 #include <gtest/gtest.h>
 
 #include "CgiRunner.h"
@@ -9,7 +10,7 @@ using namespace harmona::test;
 
 namespace {
 
-class Part_2_2 : public ::testing::Test {
+class ChildNodeRouting : public ::testing::Test {
   protected:
     void SetUp() override {
         AddUser("admin", 1 | 4 | 8 | 16);
@@ -46,23 +47,23 @@ class Part_2_2 : public ::testing::Test {
     ScriptedHttpServer server;
 };
 
-TEST_F(Part_2_2, Musiclib4HandsObjectId4ToTheMusicLibraryBuilder) {
+TEST_F(ChildNodeRouting, Musiclib4HandsObjectId4ToTheMusicLibraryBuilder) {
     ExpectBrowsed("musiclib_4", "4");
 }
 
-TEST_F(Part_2_2, MusiclibMusicPersonalHandsMusicPersonalToTheBuilder) {
+TEST_F(ChildNodeRouting, MusiclibMusicPersonalHandsMusicPersonalToTheBuilder) {
     ExpectBrowsed("musiclib_music_personal", "music_personal");
 }
 
-TEST_F(Part_2_2, MusiclibraryXHandsXToTheBuilder) {
+TEST_F(ChildNodeRouting, MusiclibraryXHandsXToTheBuilder) {
     ExpectBrowsed("musiclibrary_x", "x");
 }
 
-TEST_F(Part_2_2, OnlyTheFirstUnderscoreSplitsTheId) {
+TEST_F(ChildNodeRouting, OnlyTheFirstUnderscoreSplitsTheId) {
     ExpectBrowsed("musiclib_a_b__c_", "a_b__c_");
 }
 
-TEST_F(Part_2_2, IpodRootAndInetradioRootGiveResultOneWithAnEmptyReply) {
+TEST_F(ChildNodeRouting, IpodRootAndInetradioRootGiveResultOneWithAnEmptyReply) {
     for (const char* node : {"ipod_root", "inetradio_root", "mediaserver_x", "MUSICLIB_4", "x_y"}) {
         const CgiResult r = Node(node);
         ASSERT_TRUE(r.exited) << node;
@@ -73,7 +74,7 @@ TEST_F(Part_2_2, IpodRootAndInetradioRootGiveResultOneWithAnEmptyReply) {
     EXPECT_TRUE(server.Requests().empty());
 }
 
-TEST_F(Part_2_2, MalformedIdsGiveResultZeroAnEmptyReplyAndNoBuilderCall) {
+TEST_F(ChildNodeRouting, MalformedIdsGiveResultZeroAnEmptyReplyAndNoBuilderCall) {
     for (const char* node : {"musiclib_", "musiclib", "", "_", "ipod_", "noseparator"}) {
         const CgiResult r = Node(node);
         ASSERT_TRUE(r.exited) << node;
@@ -83,7 +84,7 @@ TEST_F(Part_2_2, MalformedIdsGiveResultZeroAnEmptyReplyAndNoBuilderCall) {
     EXPECT_TRUE(server.Requests().empty());
 }
 
-TEST_F(Part_2_2, FailingMusicLibraryBuilderPrintsTheEmptyReplyWithoutErrorEnvelope) {
+TEST_F(ChildNodeRouting, FailingMusicLibraryBuilderPrintsTheEmptyReplyWithoutErrorEnvelope) {
     server.Stop();  // connection refused
     const CgiResult r = Node("musiclib_music_album");
     ASSERT_TRUE(r.exited);
@@ -91,7 +92,7 @@ TEST_F(Part_2_2, FailingMusicLibraryBuilderPrintsTheEmptyReplyWithoutErrorEnvelo
     EXPECT_EQ(r.body, "[]\n");
 }
 
-TEST_F(Part_2_2, GettreenodeWithoutNodePrintsNothing) {
+TEST_F(ChildNodeRouting, GettreenodeWithoutNodePrintsNothing) {
     const CgiResult r = Get("action=gettreenode");
     ASSERT_TRUE(r.exited);
     EXPECT_EQ(r.exitStatus, 0);

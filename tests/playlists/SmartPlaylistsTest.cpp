@@ -1,4 +1,4 @@
-// Part 4.3: smart playlists, built in the test process (see InProcess.h) over real smart playlist
+// Smart playlist listing, built in the test process (see InProcess.h) over real smart playlist
 // files.
 #include <gtest/gtest.h>
 
@@ -13,7 +13,7 @@ namespace {
 
 constexpr const char* kSmartIcon = "3rdparty/Harmona/images/files_class/icon_smartpls.png";
 
-class Part_4_3 : public ::testing::Test {
+class SmartPlaylists : public ::testing::Test {
   protected:
     void SetUp() override { StandardFixture(); }
     InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
@@ -27,29 +27,29 @@ class Part_4_3 : public ::testing::Test {
     }
 };
 
-TEST_F(Part_4_3, NamesBADAreListedAsAbd) {
+TEST_F(SmartPlaylists, NamesBADAreListedAsAbd) {
     EXPECT_EQ(PersonalTexts({"b", "A", "d"}), (std::vector<std::string>{"A", "b", "d"}));
 }
 
-TEST_F(Part_4_3, RockAndrockBothAppearInEnumerationOrder) {
+TEST_F(SmartPlaylists, RockAndrockBothAppearInEnumerationOrder) {
     EXPECT_EQ(PersonalTexts({"Rock", "pop", "rock"}),
               (std::vector<std::string>{"pop", "Rock", "rock"}));
     EXPECT_EQ(PersonalTexts({"rock", "pop", "Rock"}),
               (std::vector<std::string>{"pop", "rock", "Rock"}));
 }
 
-TEST_F(Part_4_3, NoNameIsListedFewerTimesThanEnumerated) {
+TEST_F(SmartPlaylists, NoNameIsListedFewerTimesThanEnumerated) {
     EXPECT_EQ(PersonalTexts({"Jazz", "jazz", "Jazz", "JAZZ", "blues", "jAzz"}),
               (std::vector<std::string>{"blues", "Jazz", "jazz", "Jazz", "JAZZ", "jAzz"}));
 }
 
-TEST_F(Part_4_3, OrderFoldsAsciiLettersOnlyDigitsAndUnderscoreFirst) {
+TEST_F(SmartPlaylists, OrderFoldsAsciiLettersOnlyDigitsAndUnderscoreFirst) {
     EXPECT_EQ(
         PersonalTexts({"cherry", "_under", "Banana", "9lives", "apple", "Zed", "[x]"}),
         (std::vector<std::string>{"9lives", "[x]", "_under", "apple", "Banana", "cherry", "Zed"}));
 }
 
-TEST_F(Part_4_3, NameOrderIsCaseInsensitiveStrictComparison) {
+TEST_F(SmartPlaylists, NameOrderIsCaseInsensitiveStrictComparison) {
     SmartPlaylistNameOrder before;
     EXPECT_TRUE(before("apple", "Banana"));
     EXPECT_FALSE(before("Banana", "apple"));
@@ -58,7 +58,7 @@ TEST_F(Part_4_3, NameOrderIsCaseInsensitiveStrictComparison) {
     EXPECT_TRUE(before("_", "a"));
 }
 
-TEST_F(Part_4_3, PersonalNodesCarryIdParentIconAndLeafFlagOnly) {
+TEST_F(SmartPlaylists, PersonalNodesCarryIdParentIconAndLeafFlagOnly) {
     WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"Best of <80s>"});
     ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
     ASSERT_EQ(children.size(), 1u);
@@ -72,7 +72,7 @@ TEST_F(Part_4_3, PersonalNodesCarryIdParentIconAndLeafFlagOnly) {
         EXPECT_FALSE(node[flag].asBool()) << flag;
 }
 
-TEST_F(Part_4_3, SharedCategoryReadsTheSharedFileAndAddressesByName) {
+TEST_F(SmartPlaylists, SharedCategoryReadsTheSharedFileAndAddressesByName) {
     WriteSmartPlaylistFile(kSharedSmartPlaylistFile, {"party", "Ambient"});
     WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"not shared"});
     ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_shared"), 1);
@@ -82,7 +82,7 @@ TEST_F(Part_4_3, SharedCategoryReadsTheSharedFileAndAddressesByName) {
     EXPECT_EQ(children[0]["icon"].asString(), kSmartIcon);
 }
 
-TEST_F(Part_4_3, PersonalUserWithoutTheFileGetsButtonsAndOrdinaryPlaylistsOnlyAndNoError) {
+TEST_F(SmartPlaylists, PersonalUserWithoutTheFileGetsButtonsAndOrdinaryPlaylistsOnlyAndNoError) {
     WritePersonalPlaylistFile("admin", "one.m3u");
     WriteSmartPlaylistFile(kSharedSmartPlaylistFile, {"shared smart"});  // not the user's
     EXPECT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
@@ -96,7 +96,7 @@ TEST_F(Part_4_3, PersonalUserWithoutTheFileGetsButtonsAndOrdinaryPlaylistsOnlyAn
     EXPECT_TRUE(LoggedErrors().empty());
 }
 
-TEST_F(Part_4_3, NameWithSlashIsPutIntoTheIdUnescaped) {
+TEST_F(SmartPlaylists, NameWithSlashIsPutIntoTheIdUnescaped) {
     WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"rock/80s/live"});
     ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
     ASSERT_EQ(children.size(), 1u);
@@ -104,7 +104,7 @@ TEST_F(Part_4_3, NameWithSlashIsPutIntoTheIdUnescaped) {
     EXPECT_EQ(children[0]["text"].asString(), "rock/80s/live");
 }
 
-TEST_F(Part_4_3, IdLongerThan4095BytesIsCutTextKeepsTheWholeName) {
+TEST_F(SmartPlaylists, IdLongerThan4095BytesIsCutTextKeepsTheWholeName) {
     const std::string name(5000, 'L');
     WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {name});
     ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
@@ -115,7 +115,7 @@ TEST_F(Part_4_3, IdLongerThan4095BytesIsCutTextKeepsTheWholeName) {
     EXPECT_EQ(children[0]["text"].asString(), name);
 }
 
-TEST_F(Part_4_3, UnknownCategoryGivesNothingResultOneAndNoLog) {
+TEST_F(SmartPlaylists, UnknownCategoryGivesNothingResultOneAndNoLog) {
     WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"a"});
     WriteSmartPlaylistFile(kSharedSmartPlaylistFile, {"b"});
     for (const char* category : {"MUSIC_PERSONAL", "music_Shared", "ipod", ""})
@@ -124,7 +124,7 @@ TEST_F(Part_4_3, UnknownCategoryGivesNothingResultOneAndNoLog) {
     EXPECT_TRUE(LoggedErrors().empty());
 }
 
-TEST_F(Part_4_3, EmptyOrUnreadableFilesGiveNoNodesAndSuccess) {
+TEST_F(SmartPlaylists, EmptyOrUnreadableFilesGiveNoNodesAndSuccess) {
     WriteFile(UserSmartPlaylistFile("admin"), "# no sections\nkey=value\n[]\n");
     EXPECT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
     MakeDirs(kSharedSmartPlaylistFile);  // a folder where the file should be
@@ -133,7 +133,7 @@ TEST_F(Part_4_3, EmptyOrUnreadableFilesGiveNoNodesAndSuccess) {
     EXPECT_TRUE(LoggedErrors().empty());
 }
 
-TEST_F(Part_4_3, SmartNodesAreAppendedAfterWhatTheArrayHolds) {
+TEST_F(SmartPlaylists, SmartNodesAreAppendedAfterWhatTheArrayHolds) {
     children.append("ordinary");
     WriteSmartPlaylistFile(kSharedSmartPlaylistFile, {"s"});
     ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_shared"), 1);

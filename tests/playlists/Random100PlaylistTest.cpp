@@ -1,4 +1,4 @@
-// Part 4.4: the random-100 playlist, through the real CGI ("rerandom100") over a real library.db.
+// The random-100 playlist, through the real CGI ("rerandom100") over a real library.db.
 #include <dirent.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
@@ -28,7 +28,7 @@ std::string RandomFile(const std::string& user) {
     return "/tmp/==DynaRandom100==." + user;
 }
 
-class Part_4_4 : public ::testing::Test {
+class Random100Playlist : public ::testing::Test {
   protected:
     void SetUp() override { StandardFixture(); }
 };
@@ -64,7 +64,7 @@ std::set<std::int64_t> ExpectGeneratedPlaylist(const std::string& text, std::siz
     return numbers;
 }
 
-TEST_F(Part_4_4, GuestGetsTheFileNamedWithTheUserNameAsItIs) {
+TEST_F(Random100Playlist, GuestGetsTheFileNamedWithTheUserNameAsItIs) {
     WriteUsersConf({{"guest", {"8", ""}}, {"Guest", {"8", ""}}});
     MakeGeneratedLibrary(30);
     for (const std::string user : {"guest", "Guest"}) {
@@ -78,7 +78,7 @@ TEST_F(Part_4_4, GuestGetsTheFileNamedWithTheUserNameAsItIs) {
     EXPECT_NE(ReadFile(RandomFile("guest")), "");
 }
 
-TEST_F(Part_4_4, SuccessfulDrawIsAPlainSuccessReplyOf100DistinctTracksOf1000) {
+TEST_F(Random100Playlist, SuccessfulDrawIsAPlainSuccessReplyOf100DistinctTracksOf1000) {
     MakeGeneratedLibrary(1000);
     const CgiResult r = Get("action=rerandom100");
     ASSERT_TRUE(r.exited) << r.errors;
@@ -93,7 +93,7 @@ TEST_F(Part_4_4, SuccessfulDrawIsAPlainSuccessReplyOf100DistinctTracksOf1000) {
     EXPECT_EQ(st.st_mode & 07777, 0600u);
 }
 
-TEST_F(Part_4_4, EveryRequestDrawsAgain) {
+TEST_F(Random100Playlist, EveryRequestDrawsAgain) {
     MakeGeneratedLibrary(1000);
     std::set<std::set<std::int64_t>> draws;
     for (int i = 0; i < 3; ++i) {
@@ -103,14 +103,14 @@ TEST_F(Part_4_4, EveryRequestDrawsAgain) {
     EXPECT_EQ(draws.size(), 3u);  // three equal draws of 100 of 1000 would be a broken generator
 }
 
-TEST_F(Part_4_4, LibraryOf30GivesAll30) {
+TEST_F(Random100Playlist, LibraryOf30GivesAll30) {
     MakeGeneratedLibrary(30);
     const CgiResult r = Get("action=rerandom100");
     EXPECT_EQ(r.body, "{\"success\":true}\n");
     EXPECT_EQ(ExpectGeneratedPlaylist(ReadFile(RandomFile("admin")), 30, 30).size(), 30u);
 }
 
-TEST_F(Part_4_4, FailedDrawGivesExactlyOneErrorReply) {
+TEST_F(Random100Playlist, FailedDrawGivesExactlyOneErrorReply) {
     // Missing library.
     CgiResult r = Get("action=rerandom100");
     ASSERT_TRUE(r.exited);
@@ -128,14 +128,14 @@ TEST_F(Part_4_4, FailedDrawGivesExactlyOneErrorReply) {
     EXPECT_FALSE(Exists(RandomFile("admin")));
 }
 
-TEST_F(Part_4_4, LibraryThatIsNotADatabaseGivesTheError) {
+TEST_F(Random100Playlist, LibraryThatIsNotADatabaseGivesTheError) {
     WriteFile("/var/packages/Harmona/var/library.db", std::string(8192, '\x5a'));
     const CgiResult r = Get("action=rerandom100");
     EXPECT_EQ(r.exitStatus, 1);
     EXPECT_EQ(r.body, kErrorReply);
 }
 
-TEST_F(Part_4_4, ErrorTextIsLookedUpInTheUserLanguage) {
+TEST_F(Random100Playlist, ErrorTextIsLookedUpInTheUserLanguage) {
     // The envelope names the section and key; the browser looks the text up. The pair exists in
     // the shipped tables.
     const CgiResult r = Get("action=rerandom100");
@@ -147,7 +147,7 @@ TEST_F(Part_4_4, ErrorTextIsLookedUpInTheUserLanguage) {
               std::string::npos);
 }
 
-TEST_F(Part_4_4, DatabaseLockedByAWriterForASecondStillGivesAPlaylist) {
+TEST_F(Random100Playlist, DatabaseLockedByAWriterForASecondStillGivesAPlaylist) {
     MakeGeneratedLibrary(200);
     DatabaseWriterLock writer(kLibraryDb, 1000);
     ASSERT_TRUE(writer.Locked());
@@ -177,7 +177,7 @@ pid_t StartRerandom(const std::string& program) {
     return failed == 0 ? pid : -1;
 }
 
-TEST_F(Part_4_4, TwoConcurrentRequestsLeaveOneWholePlaylist) {
+TEST_F(Random100Playlist, TwoConcurrentRequestsLeaveOneWholePlaylist) {
     MakeGeneratedLibrary(1000);
     for (int round = 0; round < 5; ++round) {
         const pid_t first = StartRerandom(CgiProgram());
@@ -202,7 +202,7 @@ TEST_F(Part_4_4, TwoConcurrentRequestsLeaveOneWholePlaylist) {
     EXPECT_EQ(names, std::vector<std::string>{"==DynaRandom100==.admin"});
 }
 
-TEST_F(Part_4_4, SymbolicLinkPlantedAtThePathIsReplacedAndItsTargetUntouched) {
+TEST_F(Random100Playlist, SymbolicLinkPlantedAtThePathIsReplacedAndItsTargetUntouched) {
     MakeGeneratedLibrary(50);
     WriteFile("/tmp/precious", "do not overwrite\n", 0644);
     ASSERT_EQ(symlink("/tmp/precious", RandomFile("admin").c_str()), 0);
@@ -215,7 +215,7 @@ TEST_F(Part_4_4, SymbolicLinkPlantedAtThePathIsReplacedAndItsTargetUntouched) {
     ExpectGeneratedPlaylist(ReadFile(RandomFile("admin")), 50, 50);
 }
 
-TEST_F(Part_4_4, DanglingSymbolicLinkCreatesNothingAtItsTarget) {
+TEST_F(Random100Playlist, DanglingSymbolicLinkCreatesNothingAtItsTarget) {
     MakeGeneratedLibrary(10);
     MakeDirs("/run/elsewhere");
     ASSERT_EQ(symlink("/run/elsewhere/planted", RandomFile("admin").c_str()), 0);
@@ -224,7 +224,7 @@ TEST_F(Part_4_4, DanglingSymbolicLinkCreatesNothingAtItsTarget) {
     ExpectGeneratedPlaylist(ReadFile(RandomFile("admin")), 10, 10);
 }
 
-TEST_F(Part_4_4, FolderAtThePathGivesTheErrorAndNoLeftovers) {
+TEST_F(Random100Playlist, FolderAtThePathGivesTheErrorAndNoLeftovers) {
     MakeGeneratedLibrary(10);
     MakeDirs(RandomFile("admin"));
     WriteFile(RandomFile("admin") + "/inside", "x");

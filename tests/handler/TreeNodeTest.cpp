@@ -1,23 +1,23 @@
-// Part 1.2: tree node record.
+// The tree node record that every builder fills: encoded text and tip, optional members, flags.
 #include <gtest/gtest.h>
 
 #include "HarmonaHandler.h"
 
 namespace {
 
-class Part_1_2 : public ::testing::Test {
+class TreeNode : public ::testing::Test {
   protected:
     HarmonaHandler handler;
     Json::Value node;
 };
 
-TEST_F(Part_1_2, AmpersandOrAngleBracketIsStoredEncodedInTextAndQtip) {
+TEST_F(TreeNode, AmpersandOrAngleBracketIsStoredEncodedInTextAndQtip) {
     handler.FillTreeNode(node, "id", "pid", "Rock & <Roll>", "icon.png", 0);
     EXPECT_EQ(node["text"], "Rock &amp; &lt;Roll&gt;");
     EXPECT_EQ(node["qtip"], "Rock &amp; &lt;Roll&gt;");
 }
 
-TEST_F(Part_1_2, EmptyPidOrIconIsLeftOutButEmptyIdIsWritten) {
+TEST_F(TreeNode, EmptyPidOrIconIsLeftOutButEmptyIdIsWritten) {
     handler.FillTreeNode(node, "", "", "t", "", 0);
     EXPECT_FALSE(node.isMember("pid"));
     EXPECT_FALSE(node.isMember("icon"));
@@ -28,7 +28,7 @@ TEST_F(Part_1_2, EmptyPidOrIconIsLeftOutButEmptyIdIsWritten) {
     EXPECT_EQ(node["icon"], "i.png");
 }
 
-TEST_F(Part_1_2, FlagsZeroWriteAllFiveBooleansFalse) {
+TEST_F(TreeNode, FlagsZeroWriteAllFiveBooleansFalse) {
     handler.FillTreeNode(node, "x", "", "t", "", 0);
     for (const char* name : {"allowDrag", "allowDrop", "draggable", "expanded", "leaf"}) {
         ASSERT_TRUE(node[name].isBool()) << name;
@@ -37,7 +37,7 @@ TEST_F(Part_1_2, FlagsZeroWriteAllFiveBooleansFalse) {
     EXPECT_EQ(node.size(), 8u);  // text, qtip, id and the five booleans
 }
 
-TEST_F(Part_1_2, Flags24WriteExpandedAndLeafOnly) {
+TEST_F(TreeNode, Flags24WriteExpandedAndLeafOnly) {
     handler.FillTreeNode(node, "x", "", "t", "", NODE_EXPANDED | NODE_LEAF);
     EXPECT_EQ(node["expanded"], true);
     EXPECT_EQ(node["leaf"], true);
@@ -46,7 +46,7 @@ TEST_F(Part_1_2, Flags24WriteExpandedAndLeafOnly) {
     EXPECT_EQ(node["draggable"], false);
 }
 
-TEST_F(Part_1_2, EachFlagBitSetsItsAttribute) {
+TEST_F(TreeNode, EachFlagBitSetsItsAttribute) {
     const std::pair<unsigned, const char*> bits[] = {{NODE_ALLOW_DRAG, "allowDrag"},
                                                      {NODE_ALLOW_DROP, "allowDrop"},
                                                      {NODE_DRAGGABLE, "draggable"},
@@ -59,14 +59,14 @@ TEST_F(Part_1_2, EachFlagBitSetsItsAttribute) {
     }
 }
 
-TEST_F(Part_1_2, BitsAbove16AreIgnored) {
+TEST_F(TreeNode, BitsAbove16AreIgnored) {
     handler.FillTreeNode(node, "x", "", "t", "", 32u | 64u | 0x80000000u);
     for (const char* name : {"allowDrag", "allowDrop", "draggable", "expanded", "leaf"})
         EXPECT_FALSE(node[name].asBool());
     EXPECT_EQ(node.size(), 8u);
 }
 
-TEST_F(Part_1_2, SecondCallLeavesOnlyTheSecondNodesAttributes) {
+TEST_F(TreeNode, SecondCallLeavesOnlyTheSecondNodesAttributes) {
     handler.FillTreeNode(node, "first", "parent", "One", "one.png", 31);
     node["children"] = Json::Value(Json::arrayValue);
     node["iconCls"] = "x-tree-hide-icon";
@@ -80,13 +80,13 @@ TEST_F(Part_1_2, SecondCallLeavesOnlyTheSecondNodesAttributes) {
     EXPECT_EQ(node["leaf"], false);
 }
 
-TEST_F(Part_1_2, QtipIsACopyOfTheStoredText) {
+TEST_F(TreeNode, QtipIsACopyOfTheStoredText) {
     handler.FillTreeNode(node, "x", "", "\"quoted\" 'single'", "", 0);
     EXPECT_EQ(node["text"], "&quot;quoted&quot; &#39;single&#39;");
     EXPECT_EQ(node["qtip"], node["text"]);
 }
 
-TEST_F(Part_1_2, ReusedScalarValueBecomesAnObject) {
+TEST_F(TreeNode, ReusedScalarValueBecomesAnObject) {
     node = "not an object";
     handler.FillTreeNode(node, "x", "", "t", "", 0);
     EXPECT_TRUE(node.isObject());

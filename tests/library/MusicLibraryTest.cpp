@@ -1,4 +1,4 @@
-// Part 3.1: Music library subtree, through the real CGI against a scripted ContentDirectory on
+// The music library subtree, through the real CGI against a scripted ContentDirectory on
 // 127.0.0.1:50003 (and the builder in-process where only that can reach a case).
 #include <gtest/gtest.h>
 #include <stdlib.h>
@@ -11,7 +11,7 @@ using namespace harmona::test;
 
 namespace {
 
-class Part_3_1 : public ::testing::Test {
+class MusicLibrary : public ::testing::Test {
   protected:
     void SetUp() override { LibraryFixture(); }
     ScriptedHttpServer server;
@@ -33,9 +33,9 @@ void ExpectLeafNode(const Json::Value& node, const std::string& id, const std::s
     EXPECT_EQ(node.size(), 10u) << id;
 }
 
-TEST_F(Part_3_1, RootYieldsTheSevenCategoriesInTableOrderWithoutAServerRequest) {
+TEST_F(MusicLibrary, RootYieldsTheSevenCategoriesInTableOrderWithoutAServerRequest) {
     ASSERT_TRUE(server.Start());
-    // Part 2.2 hands "root" to this Part for the node id "musiclib_root".
+    // The child node routing hands the object id "root" to the builder for "musiclib_root".
     const CgiResult r = GetTreeNode("musiclib_root");
     ASSERT_TRUE(r.exited) << r.errors;
     EXPECT_EQ(r.exitStatus, 1);
@@ -56,7 +56,7 @@ TEST_F(Part_3_1, RootYieldsTheSevenCategoriesInTableOrderWithoutAServerRequest) 
     EXPECT_TRUE(server.Requests().empty());
 }
 
-TEST_F(Part_3_1, MissingTextKeyLeavesTheCategoryTextEmpty) {
+TEST_F(MusicLibrary, MissingTextKeyLeavesTheCategoryTextEmpty) {
     WriteFile(std::string(kTextsDir) + "enu/strings", "[common]\nclass_music_album=Albums\n");
     const CgiResult r = GetTreeNode("musiclib_root");
     ASSERT_TRUE(r.jsonOk);
@@ -65,7 +65,7 @@ TEST_F(Part_3_1, MissingTextKeyLeavesTheCategoryTextEmpty) {
     EXPECT_EQ(r.json[2]["text"].asString(), "Albums");
 }
 
-TEST_F(Part_3_1, CategoryNodeIdReachesTheServerAsObjectIdAndBecomesTheParentId) {
+TEST_F(MusicLibrary, CategoryNodeIdReachesTheServerAsObjectIdAndBecomesTheParentId) {
     ContentTree tree;
     tree.AddContainer("music_album", "album$1", "First Album");
     tree.AddContainer("music_album", "album$2", "Second Album");
@@ -95,7 +95,7 @@ TEST_F(Part_3_1, CategoryNodeIdReachesTheServerAsObjectIdAndBecomesTheParentId) 
               "\"urn:schemas-upnp-org:service:ContentDirectory:1#Browse\"");
 }
 
-TEST_F(Part_3_1, ItemIdIsTakenUnchangedWhateverItsCharacters) {
+TEST_F(MusicLibrary, ItemIdIsTakenUnchangedWhateverItsCharacters) {
     const std::string strange = "a&b<c>\"d'e f/%20\xC3\xA9\xE2\x9C\x93$_x";
     ContentTree tree;
     tree.AddContainer("music_all", strange, "Strange");
@@ -107,7 +107,7 @@ TEST_F(Part_3_1, ItemIdIsTakenUnchangedWhateverItsCharacters) {
     EXPECT_EQ(r.json[0]["id"].asString(), "musiclib_" + strange);
 }
 
-TEST_F(Part_3_1, ParseWithoutResultYieldsOneNestedEmptyArray) {
+TEST_F(MusicLibrary, ParseWithoutResultYieldsOneNestedEmptyArray) {
     server.Enqueue(Reply(BrowseResponseBody("", 0, 0, /*withResult=*/false)));
     ASSERT_TRUE(server.Start());
     const CgiResult r = GetTreeNode("musiclib_music_genre");
@@ -116,7 +116,7 @@ TEST_F(Part_3_1, ParseWithoutResultYieldsOneNestedEmptyArray) {
     EXPECT_EQ(r.body, "[[]]\n");
 }
 
-TEST_F(Part_3_1, EmptyResultElementAlsoYieldsTheNestedEmptyArray) {
+TEST_F(MusicLibrary, EmptyResultElementAlsoYieldsTheNestedEmptyArray) {
     server.Enqueue(Reply(BrowseResponseBody("", 0, 0, /*withResult=*/true)));
     ASSERT_TRUE(server.Start());
     const CgiResult r = GetTreeNode("musiclib_music_genre");
@@ -124,7 +124,7 @@ TEST_F(Part_3_1, EmptyResultElementAlsoYieldsTheNestedEmptyArray) {
     EXPECT_EQ(r.body, "[[]]\n");
 }
 
-TEST_F(Part_3_1, EmptyItemListYieldsNoNodesAndResultOne) {
+TEST_F(MusicLibrary, EmptyItemListYieldsNoNodesAndResultOne) {
     ContentTree tree;
     tree.AddContainer("0", "random", "Random");  // "random" exists and is empty
     server.ServeTree(tree);
@@ -137,7 +137,7 @@ TEST_F(Part_3_1, EmptyItemListYieldsNoNodesAndResultOne) {
     EXPECT_EQ(server.Requests()[0].objectId, "random");
 }
 
-TEST_F(Part_3_1, FailedParseYieldsNoNodesAndResultZero) {
+TEST_F(MusicLibrary, FailedParseYieldsNoNodesAndResultZero) {
     ContentTree tree;  // every object unknown: UPnP error 701 with HTTP 500
     server.ServeTree(tree);
     ASSERT_TRUE(server.Start());
@@ -148,8 +148,8 @@ TEST_F(Part_3_1, FailedParseYieldsNoNodesAndResultZero) {
     EXPECT_EQ(server.Requests().size(), 1u);
 }
 
-TEST_F(Part_3_1, FailedPrepareYieldsNoNodesAndResultZero) {
-    // Part 2.2 never passes an empty object id; the builder itself is called here.
+TEST_F(MusicLibrary, FailedPrepareYieldsNoNodesAndResultZero) {
+    // The child node routing never passes an empty object id; the builder itself is called here.
     setenv("REMOTE_USER", "admin", 1);
     ASSERT_TRUE(server.Start());
     HarmonaHandler handler;
@@ -159,7 +159,7 @@ TEST_F(Part_3_1, FailedPrepareYieldsNoNodesAndResultZero) {
     EXPECT_TRUE(server.Requests().empty());
 }
 
-TEST_F(Part_3_1, BuilderAppendsToTheCallersArray) {
+TEST_F(MusicLibrary, BuilderAppendsToTheCallersArray) {
     setenv("REMOTE_USER", "admin", 1);
     ContentTree tree;
     tree.AddContainer("music_aa", "aa1", "Artist One");
@@ -175,7 +175,7 @@ TEST_F(Part_3_1, BuilderAppendsToTheCallersArray) {
     EXPECT_EQ(children[1]["pid"].asString(), "musiclib_music_aa");
 }
 
-TEST_F(Part_3_1, TitlesAreHtmlEncodedInTextAndQtip) {
+TEST_F(MusicLibrary, TitlesAreHtmlEncodedInTextAndQtip) {
     ContentTree tree;
     tree.AddContainer("music_all", "1", "Rock & Roll <Live> \"Best\" 'of'");
     tree.AddContainer("music_all", "2", "");
@@ -192,7 +192,7 @@ TEST_F(Part_3_1, TitlesAreHtmlEncodedInTextAndQtip) {
     EXPECT_EQ(r.json[1]["id"].asString(), "musiclib_2");
 }
 
-TEST_F(Part_3_1, ItemsKeepTheServersOrder) {
+TEST_F(MusicLibrary, ItemsKeepTheServersOrder) {
     ContentTree tree;
     for (const char* title : {"Zeta", "alpha", "Mu", "beta"})
         tree.AddItem("music_file", std::string("id-") + title, title);

@@ -1,9 +1,7 @@
-// Part 6.2: Audio file type and equalizer profile helpers, in the test process, with real profile
-// files and a real audio.conf at their fixed paths inside the sandbox.
+// The equalizer profile lookup, in the test process, with real profile files and a real
+// audio.conf at their fixed paths inside the sandbox.
 #include <gtest/gtest.h>
 
-#include <algorithm>
-#include <cctype>
 #include <cstdio>
 #include <cstring>
 #include <string>
@@ -23,7 +21,7 @@ const std::string kSystemFailed =
     "ctrl:603 Failed to open the system EQ profile "
     "[/var/packages/Harmona/target/etc/equalizer.system].";
 
-class Part_6_2 : public ::testing::Test {
+class EqualizerProfile : public ::testing::Test {
   protected:
     void SetUp() override { TakeLogLines(); }
 
@@ -37,147 +35,78 @@ class Part_6_2 : public ::testing::Test {
     char value[1024];
 };
 
-// ---- IsSupportedAudioFile ----
-
-TEST_F(Part_6_2, UpperCaseExtensionIsAcceptedWithSelectorOne) {
-    EXPECT_EQ(IsSupportedAudioFile(1, "/volume1/music/Song.MP3"), 1);
-}
-
-TEST_F(Part_6_2, OnlyTheLastDotCounts) {
-    EXPECT_EQ(IsSupportedAudioFile(1, "song.mp3.part"), 0);
-    // The extension of a.dir/noext is "dir/noext".
-    EXPECT_EQ(IsSupportedAudioFile(1, "a.dir/noext"), 0);
-    EXPECT_EQ(IsSupportedAudioFile(1, "a.dir/song.flac"), 1);
-    EXPECT_EQ(IsSupportedAudioFile(1, "noext"), 0);
-    EXPECT_EQ(IsSupportedAudioFile(1, "trailingdot."), 0);
-    EXPECT_EQ(IsSupportedAudioFile(1, ""), 0);
-}
-
-TEST_F(Part_6_2, HttpPrefixIsAcceptedWithAnySelector) {
-    for (int selector : {1, 2, 3, 7, -1}) {
-        EXPECT_EQ(IsSupportedAudioFile(selector, "http://radio.example/stream"), 1) << selector;
-        EXPECT_EQ(IsSupportedAudioFile(selector, "https://radio.example/live.pls"), 1);
-        EXPECT_EQ(IsSupportedAudioFile(selector, "httpnothing"), 1) << selector;
-    }
-}
-
-TEST_F(Part_6_2, UpperCaseHttpPrefixIsJudgedByItsExtension) {
-    EXPECT_EQ(IsSupportedAudioFile(1, "HTTP://radio.example/stream"), 0);
-    EXPECT_EQ(IsSupportedAudioFile(1, "HTTP://radio.example/a.mp3"), 1);
-    EXPECT_EQ(IsSupportedAudioFile(2, "Http://radio.example/a.ogg"), 0);
-}
-
-TEST_F(Part_6_2, SelectorTwoRejectsFlacSelectorThreeAcceptsIt) {
-    EXPECT_EQ(IsSupportedAudioFile(2, "x.flac"), 0);
-    EXPECT_EQ(IsSupportedAudioFile(3, "x.flac"), 1);
-}
-
-TEST_F(Part_6_2, SelectorZeroAcceptsANullPathAndAnything) {
-    EXPECT_EQ(IsSupportedAudioFile(0, nullptr), 1);
-    EXPECT_EQ(IsSupportedAudioFile(0, "readme.txt"), 1);
-    EXPECT_EQ(IsSupportedAudioFile(1, nullptr), 0);
-    EXPECT_EQ(IsSupportedAudioFile(2, nullptr), 0);
-}
-
-TEST_F(Part_6_2, EachSelectorAcceptsExactlyItsList) {
-    const std::vector<std::string> all = {"mp3",  "m4a", "m4b", "aac", "aif", "aiff", "ape",
-                                          "flac", "ogg", "wav", "wma", "mp1", "mp2",  "mpa",
-                                          "ac3",  "ra",  "ram", "m4p", "txt", "mp4",  "m3u"};
-    const std::vector<std::string> two = {"mp3", "m4a", "m4b"};
-    const std::vector<std::string> three = {"aac", "aif", "aiff", "ape", "flac", "m4a",
-                                            "m4b", "mp3", "ogg",  "wav", "wma"};
-    const std::vector<std::string> other = {"mp3",  "m4a", "ogg", "aac", "wma", "flac",
-                                            "aiff", "aif", "mp1", "mp2", "mpa", "wav",
-                                            "ac3",  "ra",  "ram", "m4p", "m4b", "ape"};
-    auto in = [](const std::vector<std::string>& list, const std::string& e) {
-        return std::find(list.begin(), list.end(), e) != list.end() ? 1 : 0;
-    };
-    for (const std::string& e : all) {
-        std::string upper = e;
-        for (char& c : upper)
-            c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
-        for (const std::string& ext : {e, upper}) {
-            const std::string path = "/music/track." + ext;
-            EXPECT_EQ(IsSupportedAudioFile(2, path.c_str()), in(two, e)) << path;
-            EXPECT_EQ(IsSupportedAudioFile(3, path.c_str()), in(three, e)) << path;
-            for (int selector : {1, 4, -3})
-                EXPECT_EQ(IsSupportedAudioFile(selector, path.c_str()), in(other, e)) << path;
-        }
-    }
-}
-
 // ---- LoadEqualizerProfile ----
 
-TEST_F(Part_6_2, EmptyLineBeforeTheWantedProfileFailsWithTheIllegalMessage) {
+TEST_F(EqualizerProfile, EmptyLineBeforeTheWantedProfileFailsWithTheIllegalMessage) {
     EXPECT_EQ(Lookup("Pop:1 1\n\nRock:1.0 2.0\n", "Rock"), -1);
     EXPECT_EQ(LoggedMessages(),
               std::vector<std::string>{"ctrl:546 The EQ profile [\n] is illegal."});
 }
 
-TEST_F(Part_6_2, LineWithoutColonIsLoggedAsReadWithItsNewline) {
+TEST_F(EqualizerProfile, LineWithoutColonIsLoggedAsReadWithItsNewline) {
     EXPECT_EQ(Lookup("Jazz 1 2 3\nRock:1\n", "Rock"), -1);
     EXPECT_EQ(LoggedMessages(),
               std::vector<std::string>{"ctrl:546 The EQ profile [Jazz 1 2 3\n] is illegal."});
 }
 
-TEST_F(Part_6_2, RockLineYieldsItsValueWithoutTheNewline) {
+TEST_F(EqualizerProfile, RockLineYieldsItsValueWithoutTheNewline) {
     EXPECT_EQ(Lookup("Pop:0 0\nRock:1.0 2.0\n", "Rock"), 1);
     EXPECT_STREQ(value, "1.0 2.0");
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_2, LongerLabelBeginningWithTheLinesLabelMatchesToo) {
+TEST_F(EqualizerProfile, LongerLabelBeginningWithTheLinesLabelMatchesToo) {
     EXPECT_EQ(Lookup("Rock:1.0 2.0\n", "Rockabilly"), 1);
     EXPECT_STREQ(value, "1.0 2.0");
 }
 
-TEST_F(Part_6_2, ShorterLabelDoesNotMatchALongerLineLabel) {
+TEST_F(EqualizerProfile, ShorterLabelDoesNotMatchALongerLineLabel) {
     EXPECT_EQ(Lookup("Rockabilly:9 9\nRock:1 1\n", "Rock"), 1);
     EXPECT_STREQ(value, "1 1");
     EXPECT_EQ(Lookup("Rockabilly:9 9\n", "Rock"), 0);
 }
 
-TEST_F(Part_6_2, EmptyLabelOfALineMatchesAnyLabel) {
+TEST_F(EqualizerProfile, EmptyLabelOfALineMatchesAnyLabel) {
     EXPECT_EQ(Lookup(":5 5\nRock:1 1\n", "Rock"), 1);
     EXPECT_STREQ(value, "5 5");
 }
 
-TEST_F(Part_6_2, LabelIsEverythingBeforeTheLastColon) {
+TEST_F(EqualizerProfile, LabelIsEverythingBeforeTheLastColon) {
     EXPECT_EQ(Lookup("Live:Concert: 3 4 \n", "Live:Concert"), 1);
     EXPECT_STREQ(value, "3 4");
     // "Live" is compared over the line's label "Live:Concert": no match.
     EXPECT_EQ(Lookup("Live:Concert:3 4\n", "Live"), 0);
 }
 
-TEST_F(Part_6_2, FirstMatchingLineWins) {
+TEST_F(EqualizerProfile, FirstMatchingLineWins) {
     EXPECT_EQ(Lookup("Rock:1\nRock:2\n", "Rock"), 1);
     EXPECT_STREQ(value, "1");
 }
 
-TEST_F(Part_6_2, LabelNotInTheFileGivesZero) {
+TEST_F(EqualizerProfile, LabelNotInTheFileGivesZero) {
     EXPECT_EQ(Lookup("Pop:1\nRock:2", "Jazz"), 0);
     EXPECT_EQ(Lookup("", "Jazz"), 0);
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_2, LastLineWithoutNewlineIsRead) {
+TEST_F(EqualizerProfile, LastLineWithoutNewlineIsRead) {
     EXPECT_EQ(Lookup("Pop:1\nRock:  7 8", "Rock"), 1);
     EXPECT_STREQ(value, "7 8");
 }
 
-TEST_F(Part_6_2, MissingFileGivesMinusOneWithoutLogLine) {
+TEST_F(EqualizerProfile, MissingFileGivesMinusOneWithoutLogLine) {
     char out[16];
     EXPECT_EQ(LoadEqualizerProfile("/tmp/no-such-file", "Rock", out, sizeof(out)), -1);
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_2, ValueIsCutToTheBufferSizeThenTrimmed) {
+TEST_F(EqualizerProfile, ValueIsCutToTheBufferSizeThenTrimmed) {
     EXPECT_EQ(Lookup("Rock: 1.0 2.0 3.0\n", "Rock", 6), 1);
     EXPECT_STREQ(value, "1.0");  // " 1.0 " cut to 5 characters, then trimmed
     EXPECT_EQ(value[6], 'x');    // nothing written beyond the size
 }
 
-TEST_F(Part_6_2, LinesAreReadIn1023CharacterPieces) {
+TEST_F(EqualizerProfile, LinesAreReadIn1023CharacterPieces) {
     // A line longer than the buffer: its first 1023 characters hold no colon, so it is illegal.
     const std::string longLine = std::string(1100, 'a') + ":1\n";
     EXPECT_EQ(Lookup(longLine, "a"), -1);
@@ -190,7 +119,7 @@ TEST_F(Part_6_2, LinesAreReadIn1023CharacterPieces) {
     EXPECT_EQ(std::string(value), std::string(1017, 'v'));
 }
 
-TEST_F(Part_6_2, BadArgumentsFailWithoutTouchingAnything) {
+TEST_F(EqualizerProfile, BadArgumentsFailWithoutTouchingAnything) {
     WriteFile("/tmp/profiles", "Rock:1\n");
     char out[8] = "keep";
     EXPECT_EQ(LoadEqualizerProfile(nullptr, "Rock", out, sizeof(out)), -1);
@@ -202,7 +131,7 @@ TEST_F(Part_6_2, BadArgumentsFailWithoutTouchingAnything) {
 
 // ---- GetDefaultEqualizerProfile ----
 
-TEST_F(Part_6_2, EnableSetToCapitalYesReadsNoProfileAndGivesZero) {
+TEST_F(EqualizerProfile, EnableSetToCapitalYesReadsNoProfileAndGivesZero) {
     WriteFile(kAudioConf, "audio_enable_equalizer=Yes\naudio_default_equalizer=Rock\n");
     // No profile file exists: reading the system file would fail and log.
     char out[64];
@@ -210,7 +139,7 @@ TEST_F(Part_6_2, EnableSetToCapitalYesReadsNoProfileAndGivesZero) {
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_2, EqualizerOffOrUnsetGivesZero) {
+TEST_F(EqualizerProfile, EqualizerOffOrUnsetGivesZero) {
     char out[64];
     EXPECT_EQ(GetDefaultEqualizerProfile(out, sizeof(out)), 0);  // no audio.conf at all
     WriteFile(kAudioConf, "audio_default_equalizer=Rock\n");
@@ -222,7 +151,7 @@ TEST_F(Part_6_2, EqualizerOffOrUnsetGivesZero) {
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_2, SystemProfileIsFoundAndShadowsTheUserProfile) {
+TEST_F(EqualizerProfile, SystemProfileIsFoundAndShadowsTheUserProfile) {
     WriteFile(kAudioConf, "audio_enable_equalizer=yes\naudio_default_equalizer=Rock\n");
     WriteFile(kSystemProfiles, "Pop:0 0\nRock:1 2 3\n");
     WriteFile(kUserProfiles, "Rock:9 9 9\n");
@@ -231,7 +160,7 @@ TEST_F(Part_6_2, SystemProfileIsFoundAndShadowsTheUserProfile) {
     EXPECT_STREQ(out, "1 2 3");
 }
 
-TEST_F(Part_6_2, UserProfileIsReadWhenTheSystemFileLacksTheLabel) {
+TEST_F(EqualizerProfile, UserProfileIsReadWhenTheSystemFileLacksTheLabel) {
     WriteFile(kAudioConf, "audio_enable_equalizer=\"yes\"\naudio_default_equalizer=Mine\n");
     WriteFile(kSystemProfiles, "Pop:0 0\n");
     WriteFile(kUserProfiles, "Other:1\nMine: 4 5 6\n");
@@ -245,7 +174,7 @@ TEST_F(Part_6_2, UserProfileIsReadWhenTheSystemFileLacksTheLabel) {
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_2, MissingSystemFileIsLoggedAndTheUserFileIsNotRead) {
+TEST_F(EqualizerProfile, MissingSystemFileIsLoggedAndTheUserFileIsNotRead) {
     WriteFile(kAudioConf, "audio_enable_equalizer=yes\naudio_default_equalizer=Rock\n");
     WriteFile(kUserProfiles, "Rock:1\n");
     char out[64];
@@ -253,7 +182,7 @@ TEST_F(Part_6_2, MissingSystemFileIsLoggedAndTheUserFileIsNotRead) {
     EXPECT_EQ(LoggedMessages(), std::vector<std::string>{kSystemFailed});
 }
 
-TEST_F(Part_6_2, IllegalSystemFileIsLoggedWithTheSameWords) {
+TEST_F(EqualizerProfile, IllegalSystemFileIsLoggedWithTheSameWords) {
     WriteFile(kAudioConf, "audio_enable_equalizer=yes\naudio_default_equalizer=Rock\n");
     WriteFile(kSystemProfiles, "garbage\n");
     char out[64];

@@ -1,4 +1,4 @@
-// Part 5.1 over a scripted iPod library: keys longer than any real iPod's, and a library that
+// iPod nodes over a scripted iPod library: keys longer than any real iPod's, and a library that
 // fails after building a list. (Under AddressSanitizer a list that is not freed fails the run.)
 #include <gtest/gtest.h>
 
@@ -9,7 +9,7 @@ using namespace harmona::test;
 
 namespace {
 
-class Part_5_1 : public ::testing::Test {
+class IPodLibraryResults : public ::testing::Test {
   protected:
     void SetUp() override {
         WriteDeviceFixture();
@@ -17,7 +17,7 @@ class Part_5_1 : public ::testing::Test {
     }
 };
 
-TEST_F(Part_5_1, AKeyLongerThan4090CharactersIsCutToAnIdOf4095) {
+TEST_F(IPodLibraryResults, AKeyLongerThan4090CharactersIsCutToAnIdOf4095) {
     const std::string longKey(4300, 'k');
     const std::string fitting(4090, 'f');
     Script().records = {{"Long", longKey}, {"Fitting", fitting}, {"Over by one", fitting + "o"}};
@@ -31,7 +31,7 @@ TEST_F(Part_5_1, AKeyLongerThan4090CharactersIsCutToAnIdOf4095) {
     EXPECT_EQ(Text(items[2], "text"), "Over by one");
 }
 
-TEST_F(Part_5_1, AFailingLibraryGivesNoPlaylistNodesAndItsListIsFreed) {
+TEST_F(IPodLibraryResults, AFailingLibraryGivesNoPlaylistNodesAndItsListIsFreed) {
     Script().result = -1;
     Script().records = {{"Left behind", "0000000000000001"}};
     Json::Value children(Json::arrayValue);
@@ -44,7 +44,7 @@ TEST_F(Part_5_1, AFailingLibraryGivesNoPlaylistNodesAndItsListIsFreed) {
     EXPECT_EQ(items.size(), 0u);
 }
 
-TEST_F(Part_5_1, AnyNonZeroResultIsAFailure) {
+TEST_F(IPodLibraryResults, AnyNonZeroResultIsAFailure) {
     Script().result = 1;
     Script().records = {{"Not listed", "00000000000000ff"}};
     Json::Value items(Json::arrayValue);
@@ -52,7 +52,7 @@ TEST_F(Part_5_1, AnyNonZeroResultIsAFailure) {
     EXPECT_EQ(items.size(), 0u);
 }
 
-TEST_F(Part_5_1, TheLibrarysOrderIsKeptWithoutSorting) {
+TEST_F(IPodLibraryResults, TheLibrarysOrderIsKeptWithoutSorting) {
     Script().records = {{"b", "2"}, {"A", "10"}, {"a", "1"}};
     Json::Value children(Json::arrayValue);
     EXPECT_EQ(MakeHandler()->AddIPodChildren(children), 1);

@@ -1,4 +1,5 @@
-// Part 1.3: UI text lookup (the error envelope of a refresh is tested with Part 2.3).
+// UI text lookup in the user's language (the error envelope of a failing refresh is tested with
+// the refresh action).
 #include <gtest/gtest.h>
 
 #include <cstdlib>
@@ -10,7 +11,7 @@ using namespace harmona::test;
 
 namespace {
 
-class Part_1_3 : public ::testing::Test {
+class UITexts : public ::testing::Test {
   protected:
     void SetUp() override {
         setenv("REMOTE_USER", "alice", 1);
@@ -18,7 +19,7 @@ class Part_1_3 : public ::testing::Test {
     }
 };
 
-TEST_F(Part_1_3, LanguageCodeIsAppendedToThePrefixAsItStands) {
+TEST_F(UITexts, LanguageCodeIsAppendedToThePrefixAsItStands) {
     // A table right at "<prefix>ger/strings": no separator beyond the code, no file name but the
     // platform's own "strings".
     WriteFile(std::string(kTextsDir) + "ger/strings", "[radio]\nradio=Internetradio (Test)\n");
@@ -29,7 +30,7 @@ TEST_F(Part_1_3, LanguageCodeIsAppendedToThePrefixAsItStands) {
     EXPECT_EQ(texts["radio"]["radio"], "Internetradio (Test)");
 }
 
-TEST_F(Part_1_3, LanguageFromAcceptLanguageSelectsTheTable) {
+TEST_F(UITexts, LanguageFromAcceptLanguageSelectsTheTable) {
     InstallTexts();
     AddUser("alice", 1);
     setenv("HTTP_ACCEPT_LANGUAGE", "zh-TW,zh;q=0.9", 1);
@@ -37,7 +38,7 @@ TEST_F(Part_1_3, LanguageFromAcceptLanguageSelectsTheTable) {
     EXPECT_EQ(handler.LoadUITexts()["radio"]["radio"], "網路電台");
 }
 
-TEST_F(Part_1_3, MissingSectionOrKeyYieldsEmptyText) {
+TEST_F(UITexts, MissingSectionOrKeyYieldsEmptyText) {
     WriteFile(std::string(kTextsDir) + "enu/strings", "[radio]\nradio=Radio\n");
     AddUser("alice", 1);
     HarmonaHandler handler;
@@ -46,7 +47,7 @@ TEST_F(Part_1_3, MissingSectionOrKeyYieldsEmptyText) {
     EXPECT_EQ(texts["nosection"]["nope"].asString(), "");
 }
 
-TEST_F(Part_1_3, MissingTableYieldsEmptyObject) {
+TEST_F(UITexts, MissingTableYieldsEmptyObject) {
     AddUser("alice", 1, "fre");
     HarmonaHandler handler;
     const Json::Value texts = handler.LoadUITexts();

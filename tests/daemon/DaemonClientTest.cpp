@@ -1,5 +1,6 @@
-// Part 6.1: Daemon control socket protocol. The client runs in the test process against a
-// scripted daemon on the real socket path /tmp/vanuaudiod.sock inside the sandbox.
+// The audio daemon client on the control socket: one fixed-size record per command, on a
+// connection of its own, and a reply read within a budget. The client runs in the test process
+// against a scripted daemon on the real socket path /tmp/vanuaudiod.sock inside the sandbox.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/socket.h>
@@ -23,6 +24,8 @@ using namespace harmona::test;
 
 namespace {
 
+// Log lines begin with a fixed unit and line number ("ctrl:27") that log readers match on; they do
+// not follow the source lines.
 const std::string kConnectFailed =
     "ctrl:27 Failed to connect to /tmp/vanuaudiod.sock. [No such file or directory]";
 
@@ -85,12 +88,12 @@ std::string NativeCode(std::int32_t code) {
     return std::string(bytes, 4);
 }
 
-class Part_6_1 : public ::testing::Test {
+class DaemonClient : public ::testing::Test {
   protected:
     void SetUp() override { TakeLogLines(); }
 };
 
-TEST_F(Part_6_1, EveryWrapperSendsItsExact8196ByteRecord) {
+TEST_F(DaemonClient, EveryWrapperSendsItsExact8196ByteRecord) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("{}"); });
     const std::vector<Wrapper> wrappers = AllWrappers();
     for (const Wrapper& w : wrappers) {
@@ -108,14 +111,14 @@ TEST_F(Part_6_1, EveryWrapperSendsItsExact8196ByteRecord) {
         EXPECT_EQ(r.command, wrappers[i].code);
         EXPECT_TRUE(r.argumentsTerminated);
         EXPECT_EQ(r.arguments, wrappers[i].arguments);
-        // This client zeroes the bytes after the text (the spec allows it): nothing else leaks.
+        // This client zeroes the bytes after the text: nothing else of the process leaks.
         const std::string area = r.ArgumentArea();
         EXPECT_EQ(area.find_first_not_of('\0', r.arguments.size()), std::string::npos);
     }
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_1, CommandCodeIsInNativeByteOrderOnThisLittleEndianHost) {
+TEST_F(DaemonClient, CommandCodeIsInNativeByteOrderOnThisLittleEndianHost) {
     if (NativeCode(1) != std::string("\x01\0\0\0", 4))
         GTEST_SKIP() << "big-endian host";
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("{}"); });
@@ -126,7 +129,7 @@ TEST_F(Part_6_1, CommandCodeIsInNativeByteOrderOnThisLittleEndianHost) {
               std::string("\x26\0\0\0x", 5));
 }
 
-TEST_F(Part_6_1, Command35WithOneAndMinusTwoPointFiveBeginsWithThoseAndTheThirdValue) {
+TEST_F(DaemonClient, Command35WithOneAndMinusTwoPointFiveBeginsWithThoseAndTheThirdValue) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("ok"); });
     const float values[10] = {1, -2.5f, 7, 8, 9, 10, 11, 12, 13, 14};
     ASSERT_EQ(AudioDaemonCommand35(values), 0);
@@ -136,7 +139,7 @@ TEST_F(Part_6_1, Command35WithOneAndMinusTwoPointFiveBeginsWithThoseAndTheThirdV
     EXPECT_EQ(requests[0].arguments, "1.0 -2.5 7.0 8.0 9.0 10.0 11.0 12.0 13.0 14.0");
 }
 
-TEST_F(Part_6_1, Command35WithHugeValuesStillFitsTheArgumentArea) {
+TEST_F(DaemonClient, Command35WithHugeValuesStillFitsTheArgumentArea) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("ok"); });
     float values[10];
     for (float& v : values)
@@ -149,7 +152,7 @@ TEST_F(Part_6_1, Command35WithHugeValuesStillFitsTheArgumentArea) {
     EXPECT_EQ(std::count(requests[0].arguments.begin(), requests[0].arguments.end(), ' '), 9);
 }
 
-TEST_F(Part_6_1, TextLongerThanTheArgumentAreaIsCutAndTerminated) {
+TEST_F(DaemonClient, TextLongerThanTheArgumentAreaIsCutAndTerminated) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("ok"); });
     const std::string text(10000, 'a');
     ASSERT_EQ(AudioDaemonCommand37(text.c_str()), 0);
@@ -160,7 +163,7 @@ TEST_F(Part_6_1, TextLongerThanTheArgumentAreaIsCutAndTerminated) {
     EXPECT_EQ(requests[0].arguments, std::string(8191, 'a'));
 }
 
-TEST_F(Part_6_1, WithNoDaemonListeningEveryWrapperFailsAndLogsOneConnectLine) {
+TEST_F(DaemonClient, WithNoDaemonListeningEveryWrapperFailsAndLogsOneConnectLine) {
     for (const Wrapper& w : AllWrappers()) {
         std::memset(gReply, 'x', sizeof(gReply));
         EXPECT_EQ(w.call(gReply, sizeof(gReply)), -1) << "command " << w.code;
@@ -171,7 +174,7 @@ TEST_F(Part_6_1, WithNoDaemonListeningEveryWrapperFailsAndLogsOneConnectLine) {
     }
 }
 
-TEST_F(Part_6_1, SocketPathThatIsNoSocketFailsToConnect) {
+TEST_F(DaemonClient, SocketPathThatIsNoSocketFailsToConnect) {
     ASSERT_EQ(mkdir("/tmp/vanuaudiod.sock", 0755), 0);
     EXPECT_EQ(AudioDaemonCommand1(), -1);
     const std::vector<std::string> log = LoggedMessages();
@@ -180,7 +183,7 @@ TEST_F(Part_6_1, SocketPathThatIsNoSocketFailsToConnect) {
         << log[0];
 }
 
-TEST_F(Part_6_1, AnswerAfterMoreThanHalfASecondGivesMinusOneAndNoLogLine) {
+TEST_F(DaemonClient, AnswerAfterMoreThanHalfASecondGivesMinusOneAndNoLogLine) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("late", 700); });
     char reply[64];
     std::memset(reply, 'x', sizeof(reply));
@@ -193,7 +196,7 @@ TEST_F(Part_6_1, AnswerAfterMoreThanHalfASecondGivesMinusOneAndNoLogLine) {
     EXPECT_EQ(daemon.Requests().size(), 1u);
 }
 
-TEST_F(Part_6_1, AnswerWithinTheBudgetIsRead) {
+TEST_F(DaemonClient, AnswerWithinTheBudgetIsRead) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("soon", 250); });
     char reply[64];
     EXPECT_EQ(AudioDaemonCommand19(reply, sizeof(reply)), 0);
@@ -201,7 +204,7 @@ TEST_F(Part_6_1, AnswerWithinTheBudgetIsRead) {
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_1, DaemonThatNeverAnswersGivesMinusOneWithinTheBudget) {
+TEST_F(DaemonClient, DaemonThatNeverAnswersGivesMinusOneWithinTheBudget) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Never(); });
     const Stopwatch watch;
     EXPECT_EQ(AudioDaemonPrepareMediaServerList(), -1);
@@ -209,7 +212,7 @@ TEST_F(Part_6_1, DaemonThatNeverAnswersGivesMinusOneWithinTheBudget) {
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_1, DaemonThatNeverAcceptsGivesMinusOneWithinTheBudget) {
+TEST_F(DaemonClient, DaemonThatNeverAcceptsGivesMinusOneWithinTheBudget) {
     DaemonOptions options;
     options.accept = false;
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("x"); }, options);
@@ -219,7 +222,7 @@ TEST_F(Part_6_1, DaemonThatNeverAcceptsGivesMinusOneWithinTheBudget) {
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_1, DaemonWithAFullListenQueueFailsTheConnectAtOnce) {
+TEST_F(DaemonClient, DaemonWithAFullListenQueueFailsTheConnectAtOnce) {
     DaemonOptions options;
     options.accept = false;
     options.backlog = 0;
@@ -248,7 +251,7 @@ TEST_F(Part_6_1, DaemonWithAFullListenQueueFailsTheConnectAtOnce) {
         close(fd);
 }
 
-TEST_F(Part_6_1, DaemonThatClosesWithoutAnsweringGivesMinusOneAndTheReadLine) {
+TEST_F(DaemonClient, DaemonThatClosesWithoutAnsweringGivesMinusOneAndTheReadLine) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Close(); });
     char reply[64];
     std::memset(reply, 'x', sizeof(reply));
@@ -260,7 +263,7 @@ TEST_F(Part_6_1, DaemonThatClosesWithoutAnsweringGivesMinusOneAndTheReadLine) {
     EXPECT_EQ(std::string(reply, sizeof(reply)), std::string(sizeof(reply), '\0'));
 }
 
-TEST_F(Part_6_1, DaemonThatHangsUpBeforeReadingNeverKillsTheClient) {
+TEST_F(DaemonClient, DaemonThatHangsUpBeforeReadingNeverKillsTheClient) {
     // A bare listener that accepts and closes at once: the client's write may meet a closed peer
     // (EPIPE, which must not raise SIGPIPE) or its read the end of stream.
     const int listener = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
@@ -284,7 +287,7 @@ TEST_F(Part_6_1, DaemonThatHangsUpBeforeReadingNeverKillsTheClient) {
         << log[0];
 }
 
-TEST_F(Part_6_1, ReplyAsLongAsTheBufferFillsItWithoutTerminator) {
+TEST_F(DaemonClient, ReplyAsLongAsTheBufferFillsItWithoutTerminator) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("0123456789"); });
     char reply[12];
     std::memset(reply, 'x', sizeof(reply));
@@ -293,7 +296,7 @@ TEST_F(Part_6_1, ReplyAsLongAsTheBufferFillsItWithoutTerminator) {
     EXPECT_EQ(std::string(reply + 10, 2), "xx");  // nothing written beyond the given size
 }
 
-TEST_F(Part_6_1, LongerReplyIsCutToTheBufferSize) {
+TEST_F(DaemonClient, LongerReplyIsCutToTheBufferSize) {
     ScriptedDaemon daemon(
         [](const DaemonRequest&) { return DaemonAnswer::Reply(std::string(100000, 'r')); });
     char reply[40];
@@ -305,7 +308,7 @@ TEST_F(Part_6_1, LongerReplyIsCutToTheBufferSize) {
     EXPECT_EQ(AudioDaemonCommand5(), 0);
 }
 
-TEST_F(Part_6_1, ShorterReplyIsTerminatedByTheZeroing) {
+TEST_F(DaemonClient, ShorterReplyIsTerminatedByTheZeroing) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("abc"); });
     char reply[16];
     std::memset(reply, 'x', sizeof(reply));
@@ -313,7 +316,7 @@ TEST_F(Part_6_1, ShorterReplyIsTerminatedByTheZeroing) {
     EXPECT_EQ(std::string(reply, sizeof(reply)), std::string("abc") + std::string(13, '\0'));
 }
 
-TEST_F(Part_6_1, ReplyInPiecesIsCutToTheFirstPiece) {
+TEST_F(DaemonClient, ReplyInPiecesIsCutToTheFirstPiece) {
     ScriptedDaemon daemon(
         [](const DaemonRequest&) { return DaemonAnswer::InPieces("{\"list\": []}", {3}, 200); });
     char reply[64];
@@ -321,7 +324,7 @@ TEST_F(Part_6_1, ReplyInPiecesIsCutToTheFirstPiece) {
     EXPECT_STREQ(reply, "{\"l");
 }
 
-TEST_F(Part_6_1, Command16WithNullBufferOrSizeZeroLogsBadParametersAndSendsNothing) {
+TEST_F(DaemonClient, Command16WithNullBufferOrSizeZeroLogsBadParametersAndSendsNothing) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("{}"); });
     char reply[8];
     EXPECT_EQ(AudioDaemonGetMediaServerList(0, 10, nullptr, 100), -1);
@@ -332,7 +335,7 @@ TEST_F(Part_6_1, Command16WithNullBufferOrSizeZeroLogsBadParametersAndSendsNothi
     EXPECT_TRUE(daemon.Requests().empty());
 }
 
-TEST_F(Part_6_1, EveryBadParametersCheckLogsItsLineAndSendsNothing) {
+TEST_F(DaemonClient, EveryBadParametersCheckLogsItsLineAndSendsNothing) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("{}"); });
     char reply[8];
     EXPECT_EQ(AudioDaemonCommand17(1, 2, nullptr, 8), -1);
@@ -351,7 +354,7 @@ TEST_F(Part_6_1, EveryBadParametersCheckLogsItsLineAndSendsNothing) {
     EXPECT_EQ(daemon.Connections(), 0);
 }
 
-TEST_F(Part_6_1, CallWithoutReplyBufferLogsBadParameterOfCtrl) {
+TEST_F(DaemonClient, CallWithoutReplyBufferLogsBadParameterOfCtrl) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("{}"); });
     AudioDaemonRequest request{};
     request.command = 1;
@@ -362,7 +365,7 @@ TEST_F(Part_6_1, CallWithoutReplyBufferLogsBadParameterOfCtrl) {
     EXPECT_EQ(daemon.Connections(), 0);
 }
 
-TEST_F(Part_6_1, CallSendsTheRecordAsItLies) {
+TEST_F(DaemonClient, CallSendsTheRecordAsItLies) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("ok"); });
     AudioDaemonRequest request;
     std::memset(&request, 0x5a, sizeof(request));  // not terminated: the call does not check
@@ -376,7 +379,7 @@ TEST_F(Part_6_1, CallSendsTheRecordAsItLies) {
     EXPECT_FALSE(requests[0].argumentsTerminated);
 }
 
-TEST_F(Part_6_1, ConnectGivesADescriptorThatTheCallerCloses) {
+TEST_F(DaemonClient, ConnectGivesADescriptorThatTheCallerCloses) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Never(); });
     const int fd = AudioDaemonConnect();
     ASSERT_GE(fd, 0);
@@ -385,7 +388,8 @@ TEST_F(Part_6_1, ConnectGivesADescriptorThatTheCallerCloses) {
     EXPECT_TRUE(LoggedMessages().empty());
 }
 
-TEST_F(Part_6_1, DescriptorZeroIsLeftOpenAsTheSpecKeepsIt) {
+// The client closes a connection only when its descriptor is above 0: descriptor 0 stays open.
+TEST_F(DaemonClient, DescriptorZeroIsNeverClosed) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("ok"); });
     const int savedStdin = dup(0);
     ASSERT_GE(savedStdin, 0);
@@ -403,7 +407,7 @@ TEST_F(Part_6_1, DescriptorZeroIsLeftOpenAsTheSpecKeepsIt) {
     EXPECT_EQ(type, SOCK_STREAM);
 }
 
-TEST_F(Part_6_1, EachCommandUsesAConnectionOfItsOwn) {
+TEST_F(DaemonClient, EachCommandUsesAConnectionOfItsOwn) {
     ScriptedDaemon daemon([](const DaemonRequest&) { return DaemonAnswer::Reply("ok"); });
     for (int i = 0; i < 3; ++i)
         EXPECT_EQ(AudioDaemonCommand1(), 0);

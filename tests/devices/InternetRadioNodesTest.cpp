@@ -1,5 +1,5 @@
-// Part 5.2: Internet radio nodes. The builder runs in the test process (Part 2.1 shows it through
-// the root tree request).
+// Internet radio nodes. The builder runs in the test process, where the array it appends to can be
+// seen; the root tree shows it through a request and has tests of its own.
 #include <gtest/gtest.h>
 
 #include "DeviceTestSupport.h"
@@ -9,7 +9,7 @@ using namespace harmona::test;
 
 namespace {
 
-class Part_5_2 : public ::testing::Test {
+class InternetRadioNodes : public ::testing::Test {
   protected:
     void SetUp() override { WriteDeviceFixture(); }
 
@@ -20,7 +20,7 @@ class Part_5_2 : public ::testing::Test {
     }
 };
 
-TEST_F(Part_5_2, TheRadioCategoryAlwaysHasFiveLeafChildrenInOrderUnderInetradioRoot) {
+TEST_F(InternetRadioNodes, TheRadioCategoryAlwaysHasFiveLeafChildrenInOrderUnderInetradioRoot) {
     const Json::Value children = Children();
     const std::vector<std::string> ids = {"inetradio_new", "inetradio_sc", "inetradio_rio",
                                           "inetradio_userdefined", "inetradio_favorite"};
@@ -37,7 +37,7 @@ TEST_F(Part_5_2, TheRadioCategoryAlwaysHasFiveLeafChildrenInOrderUnderInetradioR
     }
 }
 
-TEST_F(Part_5_2, TheSourcesCarryTheirTextsAndTheInetradioIcon) {
+TEST_F(InternetRadioNodes, TheSourcesCarryTheirTextsAndTheInetradioIcon) {
     const Json::Value children = Children();
     ASSERT_EQ(children.size(), 5u);
     const char* texts[] = {kShoutcastText, kRadioIoText, kUserDefinedText, kFavoriteText};
@@ -50,7 +50,7 @@ TEST_F(Part_5_2, TheSourcesCarryTheirTextsAndTheInetradioIcon) {
     EXPECT_EQ(Text(children[0], "icon"), "3rdparty/Harmona/images/button/btn_new_station.png");
 }
 
-TEST_F(Part_5_2, TheFavouritesTakeTheirTextFromDefRadioStation) {
+TEST_F(InternetRadioNodes, TheFavouritesTakeTheirTextFromDefRadioStation) {
     // The fixture also holds "player_source_favorite" with another text: it must not be used.
     const Json::Value children = Children();
     ASSERT_EQ(children.size(), 5u);
@@ -58,7 +58,7 @@ TEST_F(Part_5_2, TheFavouritesTakeTheirTextFromDefRadioStation) {
     EXPECT_EQ(Text(children[4], "text"), kFavoriteText);
 }
 
-TEST_F(Part_5_2, TheButtonsTextComesFromSectionRadioAndTheSourcesFromSectionPlayer) {
+TEST_F(InternetRadioNodes, TheButtonsTextComesFromSectionRadioAndTheSourcesFromSectionPlayer) {
     // Each section also holds the other's keys with a wrong text.
     const Json::Value children = Children();
     ASSERT_EQ(children.size(), 5u);
@@ -67,7 +67,7 @@ TEST_F(Part_5_2, TheButtonsTextComesFromSectionRadioAndTheSourcesFromSectionPlay
     EXPECT_EQ(Text(children[4], "text"), kFavoriteText);
 }
 
-TEST_F(Part_5_2, MissingTextsGiveEmptyTextsAndStillFiveChildren) {
+TEST_F(InternetRadioNodes, MissingTextsGiveEmptyTextsAndStillFiveChildren) {
     WriteFile(std::string(kTextsDir) + "enu/strings", "[other]\nkey=value\n");
     const Json::Value children = Children();
     ASSERT_EQ(children.size(), 5u);
@@ -77,7 +77,7 @@ TEST_F(Part_5_2, MissingTextsGiveEmptyTextsAndStillFiveChildren) {
     }
 }
 
-TEST_F(Part_5_2, TextsAreHtmlEncodedAndTakenInTheUsersLanguage) {
+TEST_F(InternetRadioNodes, TextsAreHtmlEncodedAndTakenInTheUsersLanguage) {
     WriteFile(std::string(kTextsDir) + "ger/strings",
               "[radio]\nnew_radio_title=Neuer Sender & mehr\n[player]\n"
               "player_source_shoutcast=<SHOUTcast>\n");
@@ -89,7 +89,7 @@ TEST_F(Part_5_2, TextsAreHtmlEncodedAndTakenInTheUsersLanguage) {
     EXPECT_EQ(Text(children[2], "text"), "");
 }
 
-TEST_F(Part_5_2, ChildrenAreAppendedAfterWhatTheArrayHolds) {
+TEST_F(InternetRadioNodes, ChildrenAreAppendedAfterWhatTheArrayHolds) {
     Json::Value children(Json::arrayValue);
     children.append("earlier");
     EXPECT_EQ(MakeHandler()->AddRadioChildren(children), 1);
