@@ -1,7 +1,7 @@
-// Fuzzes Part 3.2's handling of the audio daemon's replies: AppendMediaServers runs over pages
-// taken from the input (split at each 0xFF byte), served by stand-ins of the two daemon wrappers
-// that copy a page into the caller's buffer exactly as AudioDaemonCall would (zero-filled, one
-// read of at most the buffer's size).
+// Fuzzes the media server list's handling of the audio daemon's replies: AppendMediaServers runs
+// over pages taken from the input (split at each 0xFF byte), served by test doubles of the two
+// daemon wrappers that copy a page into the caller's buffer exactly as AudioDaemonCall would
+// (zero-filled, one read of at most the buffer's size).
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>

@@ -1,5 +1,5 @@
-// Fuzzes the equalizer profile reader (Part 6.2) over a profile file of any bytes (an in-memory
-// file, so that nothing is written to disk). The first input line is the label looked up.
+// Fuzzes the equalizer profile reader (LoadEqualizerProfile) over a profile file of any bytes (an
+// in-memory file, so that nothing is written to disk). The first input line is the label looked up.
 #include <sys/mman.h>
 #include <unistd.h>
 

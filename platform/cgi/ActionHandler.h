@@ -1,5 +1,5 @@
 // Base class of a CGI handler of the platform: owns the request's WebMan and prints replies
-// (platform.md section 3).
+// (platform/README.md, "Requests, users and permissions").
 #pragma once
 
 #include <json/value.h>

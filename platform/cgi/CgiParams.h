@@ -1,4 +1,4 @@
-// Decoding of CGI parameters: application/x-www-form-urlencoded text (platform.md section 3).
+// Decoding of CGI parameters: application/x-www-form-urlencoded text.
 #pragma once
 
 #include <string>

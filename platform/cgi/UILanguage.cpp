@@ -14,7 +14,8 @@ struct LanguageTag {
     const char* code;
 };
 
-// platform.md section 3; a longer tag is listed so that it wins over its primary subtag.
+// The platform's language codes and the tags that map to them; the longest matching tag wins, so
+// "zh-TW" is not read as "zh".
 constexpr LanguageTag kTags[] = {
     {"en", "enu"},      {"de", "ger"},      {"fr", "fre"}, {"it", "ita"},    {"es", "spn"},
     {"ja", "jpn"},      {"da", "dan"},      {"nb", "nor"}, {"nn", "nor"},    {"no", "nor"},

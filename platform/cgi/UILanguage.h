@@ -1,5 +1,5 @@
-// The UI language codes of the platform and their choice from Accept-Language (platform.md section
-// 3).
+// The UI language codes of the platform and their choice from Accept-Language (platform/README.md,
+// "Requests, users and permissions").
 #pragma once
 
 #include <string>

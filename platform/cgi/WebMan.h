@@ -1,5 +1,5 @@
-// The request's CGI state: parameters, login user, UI language, preference directory
-// (platform.md section 3). One object per request, owned by ActionHandler.
+// The request's CGI state: parameters, login user, UI language, preference directory. One object
+// per request, owned by ActionHandler.
 #pragma once
 
 #include <string>
@@ -27,7 +27,8 @@ class WebMan {
     std::string GetLoginUserName() const;
 
     // The user's language from users.conf when it is a known code, else the first mappable language
-    // of Accept-Language, else "enu". Only the codes of platform.md can come out.
+    // of Accept-Language, else "enu". Only the platform's language codes can come out, so the
+    // result is safe in a path.
     std::string GetUILanguage();
 
     // "/usr/vanu/etc/preference/" followed by the user name.

@@ -1,4 +1,4 @@
-// HTML encoding of display texts (platform.md section 3).
+// HTML encoding of display texts.
 #pragma once
 
 #include <string>

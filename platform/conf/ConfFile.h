@@ -1,6 +1,6 @@
 // The "conf" line syntax shared by users.conf, audio.conf, the UI text tables and the smart
-// playlist files (platform.md section 2). The reader streams the file line by line with bounded
-// buffers, so a huge or binary file costs bounded memory and time.
+// playlist files (platform/README.md, "Conf files"). The reader streams the file line by line with
+// bounded buffers, so a huge or binary file costs bounded memory and time.
 #pragma once
 
 #include <cstddef>

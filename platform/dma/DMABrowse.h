@@ -1,4 +1,4 @@
-// A ContentDirectory:1 Browse request (platform.md section 9): what to browse and where.
+// A ContentDirectory:1 Browse request: what to browse and where.
 #pragma once
 
 #include <string>

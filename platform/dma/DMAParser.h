@@ -1,5 +1,6 @@
-// Sends a ContentDirectory:1 Browse and parses its reply (platform.md section 9). The HTTP client
-// lives in the on-demand plugin of HttpPost.h, loaded only here.
+// Sends a ContentDirectory:1 Browse and parses its reply
+// (platform/README.md, "Local media server and browse library"). The HTTP client lives in the
+// on-demand plugin of HttpPost.h, loaded only here.
 #pragma once
 
 #include <string>
@@ -18,7 +19,9 @@ class DMAParser {
     DMAParser& operator=(const DMAParser&) = delete;
 
     // Sends the prepared browse (every page of it when requestedCount is 0) and parses the reply;
-    // 0 on a BrowseResponse, non-zero on any failure (see platform.md section 9).
+    // 0 on a BrowseResponse; non-zero on no connection within 2 s, no whole reply within 20 s (all
+    // pages together), an HTTP status other than 200, a SOAP fault, malformed XML, a Result that is
+    // not DIDL-Lite, a reply over 64 MiB or a missing HTTP plugin (Error() says which).
     int Parse(DMABrowse* browse);
 
     // The parse result: null when the reply had no Result (or an empty one), else the DIDL-Lite

@@ -1,4 +1,4 @@
-// One DIDL-Lite object (container or item) of a Browse result (platform.md section 9).
+// One DIDL-Lite object (container or item) of a Browse result.
 #pragma once
 
 #include <array>

@@ -22,7 +22,7 @@ inline constexpr const char* kBrowseSoapAction =
     "SOAPACTION: \"urn:schemas-upnp-org:service:ContentDirectory:1#Browse\"";
 inline constexpr const char* kBrowseContentType = "Content-Type: text/xml; charset=\"utf-8\"";
 
-// Limits of platform.md section 9.
+// A dead or hostile media server costs a request at most these.
 inline constexpr long kConnectTimeoutMs = 2000;
 inline constexpr long kWholeReplyTimeoutMs = 20000;
 inline constexpr std::size_t kMaxReplyBytes = 64u * 1024u * 1024u;

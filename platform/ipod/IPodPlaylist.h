@@ -1,4 +1,4 @@
-// The iPod library of the platform (platform.md section 8; spec Part 5.1).
+// The iPod library of the platform (platform/README.md, "iPod").
 #pragma once
 
 #include <cstddef>

@@ -1,5 +1,5 @@
-// VANUIPodPlaylistGetAll (platform.md section 8): the mountpoint file, then the libgpod reader
-// plugin, loaded here and only here.
+// VANUIPodPlaylistGetAll: the mountpoint file, then the libgpod reader plugin, loaded here and only
+// here.
 #include "IPodPlaylist.h"
 #include "IPodPluginApi.h"
 #include "PlatformPaths.h"

@@ -1,5 +1,6 @@
-// The fixed places of platform.md section 1. Constants of the code: no configuration or environment
-// variable changes them (tests cover them with tmpfs in a private mount namespace).
+// The platform's fixed places (platform/README.md, "Fixed paths"). Constants of the code: no
+// configuration or environment variable changes them (tests cover them with tmpfs in a private
+// mount namespace).
 #pragma once
 
 namespace harmona::paths {

@@ -1,5 +1,5 @@
-// The random playlist generator of the platform's audio file library (platform.md section 6; spec
-// Part 4.4).
+// The random playlist generator of the platform's audio file library
+// (platform/README.md, "Music library database and random-100 playlist").
 #pragma once
 
 class AudioFile {

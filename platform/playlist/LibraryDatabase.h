@@ -1,6 +1,6 @@
-// How every platform call opens library.db (platform.md section 6): read-only, with a busy timeout
-// so that a running indexer never makes a request fail, and only when it is a regular file (a FIFO
-// or device planted there could block or feed the reader endlessly).
+// How every platform call opens library.db: read-only, with a busy timeout so that a running
+// indexer never makes a request fail, and only when it is a regular file (a FIFO or device planted
+// there could block or feed the reader endlessly).
 #pragma once
 
 #include "sqlite/Database.h"

@@ -1,4 +1,5 @@
-// Listing of the personal and the shared playlists (platform.md section 7; spec Part 4.2).
+// Listing of the personal and the shared playlists
+// (platform/README.md, "Playlists and smart playlists").
 #pragma once
 
 #include "PlaylistRecord.h"

@@ -1,5 +1,5 @@
-// The one record type of the playlist and iPod lists (platform.md section 7; spec Parts 4.2, 5.1):
-// a singly linked list allocated by the listing call and released whole by VANUPlayListFree.
+// The one record type of the playlist and iPod lists: a singly linked list allocated by the
+// listing call and released whole by VANUPlayListFree.
 #pragma once
 
 #include <cstdint>

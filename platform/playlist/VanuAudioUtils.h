@@ -1,4 +1,4 @@
-// The smart playlist enumerator of the platform (platform.md section 7; spec Part 4.3).
+// The smart playlist enumerator of the platform.
 #pragma once
 
 #include <string>

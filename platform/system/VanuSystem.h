@@ -1,4 +1,4 @@
-// Configuration, shares, services and small text helpers of the platform (platform.md section 5).
+// Configuration, shares, services and small text helpers of the platform.
 #pragma once
 
 #include <cstddef>

@@ -1,4 +1,4 @@
-// The UI text tables (platform.md section 4).
+// The UI text tables (platform/README.md, "UI texts").
 #pragma once
 
 #include <json/value.h>

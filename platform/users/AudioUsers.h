@@ -1,4 +1,5 @@
-// The audio users of users.conf (platform.md section 3).
+// The audio users of users.conf: one section per user name
+// (platform/README.md, "Requests, users and permissions").
 #pragma once
 
 #include <string>
