@@ -1,19 +1,19 @@
-// The audio daemon client (spec Parts 6.1 and 6.2): the control socket exchange and its command
-// wrappers, the audio file type test and the equalizer profile lookup. Plain functions returning 0
-// for success and -1 for failure (the file type and profile helpers say their own results).
+// The audio daemon client: the control socket exchange and its command wrappers, the audio file
+// type test and the equalizer profile lookup. Plain functions returning 0 for success and -1 for
+// failure (the file type and profile helpers say their own results).
 #pragma once
 
 #include <cstdint>
 
 // The request record, written to the socket as it lies in memory: the command code in the host's
-// native byte order, then 8192 bytes of NUL-terminated argument text (Part 6.1).
+// native byte order, then 8192 bytes of NUL-terminated argument text.
 struct AudioDaemonRequest {
     std::int32_t command;
     char arguments[8192];
 };
 static_assert(sizeof(AudioDaemonRequest) == 8196, "the daemon reads exactly 8196 bytes a request");
 
-// ---- unit ctrl: connection and exchange (Part 6.1) ----
+// ---- unit ctrl: connection and exchange ----
 
 // A connected socket descriptor (>= 0) to /tmp/vanuaudiod.sock, or a negative value on failure.
 int AudioDaemonConnect();
@@ -23,10 +23,11 @@ int AudioDaemonConnect();
 // Both waits share one budget of half a second.
 int AudioDaemonCall(const AudioDaemonRequest* request, char* reply, int replySize);
 
-// ---- unit info: one wrapper per command code (Part 6.1's table) ----
+// ---- unit info: one wrapper per command code ----
 // Each returns AudioDaemonCall's result (0 or -1), or -1 when its own argument check fails. The
 // wrappers without a reply buffer discard the reply: they only say whether the daemon answered.
-// The daemon's meaning of most codes lies outside the spec, so they are named by their code.
+// Only commands 14 and 16 (the media server list) are used by the tree; the others are named by
+// their code.
 
 int AudioDaemonCommand1();
 int AudioDaemonCommand2();
@@ -41,7 +42,7 @@ int AudioDaemonCommand10();
 int AudioDaemonCommand11(int value);
 int AudioDaemonCommand12();
 int AudioDaemonCommand13();
-// Command 14: asks the daemon to prepare its media server list (Part 3.2).
+// Command 14: asks the daemon to prepare its media server list.
 int AudioDaemonPrepareMediaServerList();
 int AudioDaemonCommand15();
 // Command 16: the media servers from `offset`, at most `count` of them, as JSON text in `reply`.
@@ -62,7 +63,7 @@ int AudioDaemonCommand36(int value);
 int AudioDaemonCommand37(const char* text);
 int AudioDaemonCommand38(const char* text);
 
-// ---- unit ctrl: equalizer profiles (Part 6.2) ----
+// ---- unit ctrl: equalizer profiles ----
 
 // Looks `label` up in the profile file at `path`: 1 found (the trimmed value is in `value`), 0 not
 // in the file, -1 failure (unopenable file, an illegal line, a failed trim, bad arguments).
@@ -72,8 +73,8 @@ int LoadEqualizerProfile(const char* path, const char* label, char* value, int s
 // failure.
 int GetDefaultEqualizerProfile(char* value, int size);
 
-// ---- file type (Part 6.2) ----
+// ---- file type ----
 
 // 1 when `path` names an audio file playable for `selector` (0: anything; 2, 3 and any other value:
-// the extension lists of Part 6.2; paths beginning with "http" always), 0 otherwise.
+// the extension lists in FileType.cpp; paths beginning with "http" always), 0 otherwise.
 int IsSupportedAudioFile(int selector, const char* path);

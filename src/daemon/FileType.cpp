@@ -1,4 +1,5 @@
-// Part 6.2: Audio file type and equalizer profile helpers (the file type test).
+// The audio file type test: whether a path names an audio file that the player takes, by its
+// extension.
 #include <strings.h>
 
 #include <cstring>
@@ -8,7 +9,7 @@
 
 namespace {
 
-// The extension lists of Part 6.2, in their order.
+// The accepted extensions of each selector, compared ignoring case.
 constexpr const char* kPortableList[] = {"mp3", "m4a", "m4b"};
 constexpr const char* kLosslessList[] = {"aac", "aif", "aiff", "ape", "flac", "m4a",
                                          "m4b", "mp3", "ogg",  "wav", "wma"};

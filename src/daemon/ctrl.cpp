@@ -1,5 +1,5 @@
-// Part 6.1: Daemon control socket protocol (unit ctrl: connection and exchange).
-// Part 6.2: Audio file type and equalizer profile helpers (unit ctrl: equalizer profiles).
+// Unit ctrl of the audio daemon client: the connection to the daemon's control socket, the
+// request/reply exchange, and the equalizer profile lookup.
 #include <sys/select.h>
 #include <sys/socket.h>
 #include <sys/un.h>
@@ -15,7 +15,8 @@
 
 namespace {
 
-// The unit name and line numbers that the spec gives for this unit's log lines.
+// The unit name and line numbers of this unit's log lines: fixed identifiers that log readers match
+// on, not source lines, so they must not follow the code when it moves.
 constexpr const char* kUnit = "ctrl";
 constexpr int kLineConnectFailed = 27;
 constexpr int kLineBadParameter = 46;
@@ -26,12 +27,12 @@ constexpr int kLineIllegalProfile = 546;
 constexpr int kLineTrimFailed = 552;
 constexpr int kLineSystemProfileFailed = 603;
 
-// The two waits of one exchange share this budget (Part 6.1).
+// The two waits of one exchange (writable, then readable) share this budget.
 constexpr long kBudgetMicroseconds = 500000;
 
-// Lines of a profile file are read with a buffer of this size (Part 6.2).
+// Lines of a profile file are read with a buffer of this size.
 constexpr int kProfileLineSize = 1024;
-// Configuration values are read into buffers of this size (Part 6.2).
+// Configuration values are read into buffers of this size.
 constexpr int kConfValueSize = 1024;
 
 // Waits until `fd` is writable (forWrite) or readable, lowering `budget` by the time waited (Linux
@@ -46,7 +47,8 @@ int WaitFor(int fd, bool forWrite, timeval* budget, bool* ready) {
     return result;
 }
 
-// The exchange on a connected socket; the caller closes it. Steps 3 to 8 of Part 6.1.
+// The exchange on a connected socket: wait until writable, write the record, wait until readable,
+// read one reply. The caller closes the socket.
 int Exchange(int fd, const AudioDaemonRequest* request, char* reply, int replySize) {
     // select() cannot watch a descriptor beyond FD_SETSIZE; such a socket cannot be used.
     if (fd >= FD_SETSIZE)
@@ -108,14 +110,14 @@ int AudioDaemonCall(const AudioDaemonRequest* request, char* reply, int replySiz
     if (fd < 0)
         return -1;
     const int result = Exchange(fd, request, reply, replySize);
-    // A descriptor of 0 is left open: the spec keeps this test as it is.
+    // Only a descriptor above 0 is closed: a descriptor of 0 is deliberately left open.
     if (fd > 0)
         close(fd);
     return result;
 }
 
 int LoadEqualizerProfile(const char* path, const char* label, char* value, int size) {
-    // Not in the spec's steps: arguments the steps would dereference or overflow.
+    // Null pointers and sizes that the lookup below would dereference or overflow.
     if (path == nullptr || label == nullptr || value == nullptr || size <= 0)
         return -1;
     FILE* file = std::fopen(path, "re");
@@ -132,7 +134,7 @@ int LoadEqualizerProfile(const char* path, const char* label, char* value, int s
             break;
         }
         // Compared over the line's label length only: a longer given label that begins with the
-        // line's label matches too, and an empty label matches anything (kept as specified).
+        // line's label matches too, and an empty label matches anything (kept on purpose).
         const size_t labelLength = static_cast<size_t>(colon - line);
         if (std::strncmp(line, label, labelLength) != 0)
             continue;

@@ -1,4 +1,5 @@
-// Part 6.1: Daemon control socket protocol (unit info: the command wrappers).
+// Unit info of the audio daemon client: one wrapper per command code, each sending one request
+// record through AudioDaemonCall.
 #include <syslog.h>
 
 #include <cstdio>
@@ -8,7 +9,8 @@
 
 namespace {
 
-// The unit name and the lines of the "Bad parameters" checks that the spec gives.
+// The unit name and the line numbers of the "Bad parameters" log lines: fixed identifiers that log
+// readers match on, not source lines, so they must not follow the code when it moves.
 constexpr const char* kUnit = "info";
 constexpr int kLineBadParameters16 = 62;
 constexpr int kLineBadParameters17 = 88;
@@ -20,8 +22,8 @@ constexpr int kLineBadParameters38 = 216;
 // Replies that a wrapper discards are read into a local buffer of this size.
 constexpr int kDiscardedReplySize = 8192;
 
-// A record for `command` with an empty argument text. The spec allows zeroing the bytes after the
-// text; doing so keeps stack contents of this process from reaching the daemon.
+// A record for `command` with an empty argument text. The bytes after the text mean nothing to the
+// daemon; zeroing them keeps stack contents of this process from reaching it.
 void Prepare(AudioDaemonRequest& request, int command) {
     std::memset(&request, 0, sizeof(request));
     request.command = command;
@@ -157,12 +159,12 @@ int AudioDaemonCommand34() {
     return CommandWithoutArguments(34);
 }
 int AudioDaemonCommand35(const float values[10]) {
-    if (values == nullptr)  // not in the spec's table: there would be nothing to print
+    if (values == nullptr)  // nothing to print
         return -1;
     AudioDaemonRequest request;
     Prepare(request, 35);
-    // The first value, then a space and the value for each further one. The spec's prints are
-    // unbounded because ten such values always fit; these are bounded all the same.
+    // The first value, then a space and the value for each further one. Ten such values always fit
+    // in the argument text; the prints are bounded all the same.
     size_t used = 0;
     for (int i = 0; i < 10 && used < sizeof(request.arguments); ++i) {
         const int written =

@@ -1,4 +1,4 @@
-// Part 5.1: iPod nodes.
+// The iPod category's children: a refresh button, then one leaf per playlist on the attached iPod.
 #include <cstdio>
 #include <cstring>
 
@@ -7,7 +7,7 @@
 
 namespace {
 
-// The id buffer of a playlist node: "ipod_" and the key, cut to fit (Part 5.1).
+// The id buffer of a playlist node: "ipod_" and the key, cut to fit.
 constexpr std::size_t kIPodIdBufferSize = 4096;
 
 constexpr const char* kIPodRootId = "ipod_root";
@@ -26,7 +26,7 @@ std::string FieldText(const char (&field)[Size]) {
 int HarmonaHandler::AddIPodChildren(Json::Value& children) {
     Json::Value texts = LoadUITexts();
     Json::Value node;
-    // The button's pid is empty on purpose, unlike the playlists' "ipod_root" (Part 5.1).
+    // The button's pid is empty on purpose, unlike the playlists' "ipod_root".
     FillTreeNode(node, kIPodRefreshId, "", texts["player"]["refresh_btn_title"].asString(),
                  kRefreshButtonIcon, NODE_LEAF);
     children.append(node);

@@ -1,4 +1,4 @@
-// Part 5.2: Internet radio nodes.
+// The internet radio category's children: a new-station button, then the radio sources.
 #include "HarmonaHandler.h"
 
 namespace {

@@ -1,4 +1,4 @@
-// Part 1.1: request entry and action dispatch.
+// Request entry: authorizes the caller, reads the permission bits and dispatches on `action`.
 #include "HarmonaHandler.h"
 
 #include <cstring>
@@ -21,7 +21,7 @@ int HarmonaHandler::Process() {
     if (action == nullptr)
         return 0;
 
-    // Part 1.1's dispatch table, tested in its order; every comparison is exact.
+    // The actions are tested in this order; every comparison is exact.
     if (std::strcmp(action, "gettreenode") == 0) {
         const char* node = webMan.In("node", nullptr);
         if (node == nullptr)
@@ -31,8 +31,8 @@ int HarmonaHandler::Process() {
         return built != 0 ? 1 : 0;
     }
     if (std::strcmp(action, "refresh") == 0) {
-        // "refresh" does not test that target is present (Part 1.1); an absent target goes to
-        // RefreshNode, which answers it like an unknown target: an empty reply.
+        // "refresh" does not test that target is present; an absent target goes to RefreshNode,
+        // which answers it like an unknown target: an empty reply.
         const char* target = webMan.In("target", nullptr);
         if (target != nullptr && std::strcmp(target, "mediaserver") == 0)
             RefreshMediaServers();
@@ -41,7 +41,7 @@ int HarmonaHandler::Process() {
         return 1;  // whatever the builder did
     }
     if (std::strcmp(action, "rerandom100") == 0) {
-        CreateRandom100Playlist();  // prints its own reply (Part 4.4)
+        CreateRandom100Playlist();  // prints its own reply
         return 1;
     }
     Json::Value reply(Json::objectValue);

@@ -1,6 +1,6 @@
-// HarmonaHandler: the one handler class of the audio tree CGI (spec Part 1.1). Its builders are
-// non-virtual members returning 1 for success and 0 for failure; each lives in the source unit of
-// its Part (grep the name).
+// HarmonaHandler: the one handler class of the audio tree CGI. Its builders are non-virtual
+// members returning 1 for success and 0 for failure; each lives in the source file of its part of
+// the tree (grep the name).
 #pragma once
 
 #include <json/value.h>
@@ -9,7 +9,7 @@
 
 #include "ActionHandler.h"
 
-// Node flags of the tree node record (Part 1.2).
+// Node flags of the tree node record: each sets the boolean attribute of the same name.
 enum : unsigned int {
     NODE_ALLOW_DRAG = 1,
     NODE_ALLOW_DROP = 2,
@@ -18,14 +18,14 @@ enum : unsigned int {
     NODE_LEAF = 16,
 };
 
-// The user's audio permission bits (Part 1.1).
+// The user's audio permission bits (platform/README.md, "Requests, users and permissions").
 enum : int {
     PERM_IPOD = 1,
     PERM_NEW_SHARED_PLAYLIST = 4,
     PERM_MEDIA_SERVER = 8,
 };
 
-// The content type of every reply (Part 1.1).
+// The content type of every reply.
 inline constexpr const char* kReplyContentType = "text/plain; charset=\"UTF-8\"";
 
 class HarmonaHandler : public ActionHandler {
@@ -33,55 +33,55 @@ class HarmonaHandler : public ActionHandler {
     HarmonaHandler();
     ~HarmonaHandler() override;
 
-    // Part 1.1: authorizes, reads the permission bits and dispatches `action`.
+    // Authorizes, reads the permission bits and dispatches `action`; the result is the exit status.
     int Process() override;
 
-    // Part 1.2: writes the tree node attributes into `node`.
+    // Writes the tree node attributes into `node`.
     void FillTreeNode(Json::Value& node, const std::string& id, const std::string& pid,
                       const std::string& text, const std::string& icon, unsigned int flags);
 
-    // Part 1.3: the UI texts of the request's language.
+    // The UI texts of the request's language.
     Json::Value LoadUITexts();
 
-    // Part 2.1: root tree.
+    // Root tree: the top-level categories with their children.
     int BuildRootTree();
     bool HasIPodDirectory();
     bool IsLibraryServiceRunning();
 
-    // Part 2.2: child node routing.
+    // Child node routing: the children of a node that the browser expands.
     int GetChildNodes(const char* nodeId);
 
-    // Part 2.3: refresh action.
+    // Refresh action: the iPod's or a playlist category's children again.
     void RefreshNode(const char* target);
 
-    // Part 3.1: music library subtree.
+    // Music library subtree: its categories, and containers browsed on the local media server.
     int GetMusicLibraryNodes(Json::Value& children, const char* objectId);
 
-    // Part 3.2: media server list.
+    // Media server list, from the audio daemon.
     int GetMediaServerNodes(Json::Value& children);
     int AppendMediaServers(Json::Value& children);
     void RefreshMediaServers();
 
-    // Part 4.1: playlist category nodes.
+    // Children of the personal and shared playlist categories.
     int AddPersonalPlaylistCategory(Json::Value& children);
     int AddSharedPlaylistCategory(Json::Value& children);
 
-    // Part 4.2: playlist listing.
+    // Playlist listing.
     int ListPlaylists(Json::Value& children, const char* category);
 
-    // Part 4.3: smart playlists.
+    // Smart playlist listing.
     int ListSmartPlaylists(Json::Value& children, const char* category);
 
-    // Part 4.4: random-100 playlist.
+    // Random-100 playlist.
     void CreateRandom100Playlist();
 
-    // Part 5.1: iPod nodes.
+    // iPod nodes.
     int AddIPodChildren(Json::Value& children);
     int ListIPodPlaylists(Json::Value& children);
 
-    // Part 5.2: internet radio nodes.
+    // Internet radio nodes.
     int AddRadioChildren(Json::Value& children);
 
-    // The user's audio permission bits; 0 until Process has read them (Part 1.1).
+    // The user's audio permission bits; 0 until Process has read them.
     int userPermission;
 };

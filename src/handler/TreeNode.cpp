@@ -1,4 +1,4 @@
-// Part 1.2: tree node record.
+// The tree node record: the attributes of one node of a reply, as the tree page reads them.
 #include <array>
 #include <string>
 #include <unordered_set>
@@ -8,7 +8,7 @@
 
 namespace {
 
-// The five flag bits of the node record; higher bits are ignored (Part 1.2).
+// The five flag bits of the node record; higher bits are ignored.
 constexpr unsigned int kNodeFlagMask = 31;
 
 // A node of the given shape, its texts left null (cheaper to copy than "", and every one of them

@@ -1,10 +1,11 @@
-// Part 1.3: UI text lookup. The error and success envelopes are ActionHandler's (platform).
+// UI text lookup: the text tables of the request's language. The error and success envelopes are
+// ActionHandler's (platform).
 #include "HarmonaHandler.h"
 #include "LocalizedStringParser.h"
 #include "PlatformPaths.h"
 
 Json::Value HarmonaHandler::LoadUITexts() {
-    // The language code is appended as it stands: no separator, no file name (Part 1.3).
+    // The language code is appended as it stands: no separator, no file name.
     std::string path = harmona::paths::kTextsPrefix + webMan.GetUILanguage();
     return VANU::ZET::LocalizedStringParser::ParseTexts(path);
 }

@@ -1,4 +1,4 @@
-// Part 1.1: the entry. One handler, one request; Process's result is the exit status (1 served).
+// The entry. One handler, one request; Process's result is the exit status (1 served).
 #include "HarmonaHandler.h"
 
 int main(int /*argc*/, char** /*argv*/) {
@@ -7,7 +7,7 @@ int main(int /*argc*/, char** /*argv*/) {
         return handler.Process();
     } catch (...) {
         // Nothing is handled here: the rethrow only guarantees that the handler was destroyed
-        // before the exception leaves the program (Part 1.1).
+        // before the exception leaves the program.
         throw;
     }
 }

@@ -1,4 +1,5 @@
-// Part 3.2: Media server list.
+// The media server list: a scan button, then one leaf per UPnP media server that the audio daemon
+// knows of, read page by page over its control socket.
 #include <json/reader.h>
 #include <syslog.h>
 
@@ -12,8 +13,9 @@
 
 namespace {
 
-// The unit name and line of the "Parse error" log line. The spec gives neither for this Part; the
-// handler's unit is "audio" (Part 4.2 names it), and the line is this project's own fixed number.
+// The unit name and line number of the "Parse error" log line: the handler's unit "audio" (as in
+// the playlist listing) and a number of this project's own. Both are fixed identifiers that log
+// readers match on, not the source line, so they must not follow the code when it moves.
 constexpr const char* kUnit = "audio";
 constexpr int kLineParseError = 1130;
 
@@ -22,7 +24,7 @@ constexpr const char* kScanButtonId = "mediaserver_refresh";
 constexpr const char* kScanButtonIcon = "3rdparty/Harmona/images/button/btn_search_dms.png";
 constexpr const char* kServerIcon = "3rdparty/Harmona/images/files_class/icon_mediaserver.png";
 
-// Paging and buffers of Part 3.2.
+// Servers asked for per page, the reply buffer and the node id buffer.
 constexpr int kPageSize = 10;
 constexpr int kReplySize = 40960;
 constexpr int kNodeIdSize = 1024;
@@ -61,7 +63,7 @@ int NestingDepth(const char* text, size_t length) {
     return deepest;
 }
 
-// Parses the reply's text up to its first NUL with the Reader, comments collected (Part 3.2). A
+// Parses the reply's text up to its first NUL with the Reader, comments collected. A
 // reply that filled the whole buffer has no NUL and is not read past the buffer: a failure.
 bool ParseReply(Json::Reader& reader, const char* reply, size_t size, Json::Value& root) {
     const void* nul = std::memchr(reply, '\0', size);
@@ -104,7 +106,7 @@ int HarmonaHandler::GetMediaServerNodes(Json::Value& children) {
 int HarmonaHandler::AppendMediaServers(Json::Value& children) {
 #pragma GCC diagnostic push
 #pragma GCC diagnostic ignored "-Wdeprecated-declarations"
-    Json::Reader reader;  // the spec's parser; jsoncpp marks it deprecated
+    Json::Reader reader;  // the classic Reader; jsoncpp marks it deprecated
 #pragma GCC diagnostic pop
     Json::Value root;
     if (AudioDaemonPrepareMediaServerList() != 0)
@@ -126,7 +128,7 @@ int HarmonaHandler::AppendMediaServers(Json::Value& children) {
             const Json::Value& name = Member(server, "friendly_name");
             const Json::Value& ip = Member(server, "ip");
             // An element without a textual control URL has no id to give; one without a name
-            // has no text unless its ip is a string (Part 3.2 lets such elements be skipped).
+            // has no text unless its ip is a string; such elements are skipped.
             const bool named = name.isString() && !name.asString().empty();
             if (!controlUrl.isString() || (!named && !ip.isString()))
                 continue;

@@ -1,4 +1,5 @@
-// Part 3.1: Music library subtree.
+// The music library subtree: the category nodes under "musiclib_root", and the containers of a
+// category, browsed on the local media server.
 #include <cstring>
 #include <memory>
 
@@ -14,7 +15,7 @@ struct MusicLibraryCategory {
     const char* nodeId;
     const char* textKey;
     const char* iconFile;
-    const char* thumbnail;  // part of the table, never emitted (Part 1.2 has no attribute for it)
+    const char* thumbnail;  // part of the table, never emitted: a tree node has no such attribute
 };
 
 // The category table, in reply order, ended by a row whose id is null.
@@ -46,7 +47,7 @@ constexpr const char* kBrowsedIdPrefix = "musiclib_";
 int HarmonaHandler::GetMusicLibraryNodes(Json::Value& children, const char* objectId) {
     DMAParser parser;
     Json::Value node;
-    // Loaded on every call, also when no text is needed (Part 3.1, step 1).
+    // Loaded on every call, also when no text is needed.
     const Json::Value texts = LoadUITexts();
 
     if (std::strcmp(objectId, "root") == 0) {
@@ -72,7 +73,7 @@ int HarmonaHandler::GetMusicLibraryNodes(Json::Value& children, const char* obje
 
     const DMAParser::ItemList* items = parser.GetResult();
     if (items == nullptr) {
-        // No result: one nested empty array is the required output (Part 3.1, step 3.5).
+        // No result: the reply is one nested empty array, which the page reads as an empty folder.
         children.append(Json::Value(Json::arrayValue));
         return 1;
     }

@@ -1,9 +1,12 @@
-// Part 4.1: Playlist category nodes.
+// The children of the two playlist categories, personal and shared: a refresh button, a
+// new-playlist button where the user may create one, then the category's playlists and smart
+// playlists.
 #include "HarmonaHandler.h"
 
 namespace {
 
-// The line numbers that the error replies carry (Part 4.1's table).
+// The line numbers that the error replies carry: fixed identifiers that the browser and log readers
+// match on, not source lines, so they must not follow the code when it moves.
 constexpr int kPersonalPlaylistListingErrorLine = 364;
 constexpr int kPersonalSmartListingErrorLine = 369;
 constexpr int kSharedPlaylistListingErrorLine = 399;
@@ -16,7 +19,7 @@ constexpr const char* kNewPlaylistIcon = "3rdparty/Harmona/images/button/btn_new
 struct CategoryShape {
     const char* refreshId;
     const char* newId;
-    const char* category;  // the category string of Parts 4.2 and 4.3
+    const char* category;  // what ListPlaylists and ListSmartPlaylists take
     int listingErrorLine;
     int smartErrorLine;
 };
@@ -36,7 +39,7 @@ static int AddPlaylistCategory(HarmonaHandler& handler, Json::Value& children,
     Json::Value node;
     Json::Value texts = handler.LoadUITexts();
 
-    // The buttons carry an empty parent id, unlike the playlist nodes (Part 4.1).
+    // The buttons carry an empty parent id, unlike the playlist nodes.
     handler.FillTreeNode(node, shape.refreshId, "", texts["player"]["refresh_btn_title"].asString(),
                          kRefreshIcon, NODE_LEAF);
     children.append(node);
@@ -50,7 +53,7 @@ static int AddPlaylistCategory(HarmonaHandler& handler, Json::Value& children,
         handler.SetError(children, "common", "error_system", shape.listingErrorLine);
         return 0;
     }
-    // Part 4.3 always returns 1; the branch stays as the Part has it.
+    // ListSmartPlaylists always returns 1; the check stays all the same.
     if (!handler.ListSmartPlaylists(children, shape.category)) {
         handler.SetError(children, "common", "error_system", shape.smartErrorLine);
         return 0;

@@ -1,4 +1,4 @@
-// Part 4.2: Playlist listing.
+// The playlist listing: one leaf per ordinary playlist of the personal or the shared category.
 #include <syslog.h>
 
 #include <cstdio>
@@ -9,7 +9,8 @@
 
 namespace {
 
-// The log line's source name and line number (Part 4.2).
+// The log line's unit name and line number: fixed identifiers that log readers match on, not the
+// source line, so they must not follow the code when it moves.
 constexpr const char* kLogUnit = "audio";
 constexpr int kEnumFailedLine = 642;
 
@@ -38,7 +39,7 @@ int HarmonaHandler::ListPlaylists(Json::Value& children, const char* category) {
     if (listed >= 0) {
         char id[kNodeIdSize];
         for (const PLAYLIST_INFO* record = head; record != nullptr; record = record->pNext) {
-            // Personal playlists are addressed by name, shared ones by number (Part 4.2).
+            // Personal playlists are addressed by name, shared ones by number.
             if (which == Category::personal)
                 std::snprintf(id, sizeof id, "musiclib_music_personal/playlist/%s", record->szName);
             else

@@ -1,4 +1,5 @@
-// Part 4.4: Random-100 playlist.
+// The rerandom100 action: makes the user's random-100 playlist afresh and answers success or an
+// error reply.
 #include <cstdio>
 
 #include "AudioFile.h"
@@ -7,6 +8,8 @@
 namespace {
 
 constexpr int kRandomSongCount = 100;
+// The error reply's line number: a fixed identifier that the browser and log readers match on, not
+// the source line, so it must not follow the code when it moves.
 constexpr int kCreateRandomErrorLine = 616;
 constexpr std::size_t kPathSize = 4096;
 

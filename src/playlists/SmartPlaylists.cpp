@@ -1,4 +1,5 @@
-// Part 4.3: Smart playlists.
+// The smart playlist listing: one leaf per smart playlist of the personal or the shared category,
+// sorted by name ignoring case.
 #include "SmartPlaylists.h"
 
 #include <algorithm>
@@ -38,7 +39,7 @@ int HarmonaHandler::ListSmartPlaylists(Json::Value& children, const char* catego
         idFormat = "musiclib_music_shared/smart/%s";
         pid = "musiclib_music_shared";
     } else {
-        return 1;  // an unknown category lists nothing and is no error (Part 4.3)
+        return 1;  // an unknown category lists nothing and is no error
     }
 
     // Every enumerated name gives one node; names equal ignoring case keep their order.

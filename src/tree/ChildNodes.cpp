@@ -1,4 +1,4 @@
-// Part 2.2: Child node routing.
+// Child node routing: the children of a node that the browser expands, by the family of its id.
 #include <cstring>
 #include <utility>
 

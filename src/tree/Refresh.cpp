@@ -1,4 +1,4 @@
-// Part 2.3: Refresh action.
+// Refresh action: the iPod's or a playlist category's children again, in a success reply.
 #include "Refresh.h"
 
 #include <cstring>
@@ -30,7 +30,7 @@ const RefreshListers& DefaultRefreshListers() {
 void RefreshNodeWith(HarmonaHandler& handler, const char* target, const RefreshListers& listers) {
     Json::Value reply;
     Json::Value items;
-    // An absent target is an unknown one (Part 1.1 leaves it to us): an empty reply.
+    // An absent target is answered like an unknown one: an empty reply.
     const char* category = Is(target, "personal") ? "music_personal"
                            : Is(target, "shared") ? "music_shared"
                                                   : nullptr;

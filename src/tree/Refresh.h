@@ -1,5 +1,5 @@
-// Part 2.3: the listings that the refresh action calls, exposed so that a unit test can make the
-// smart playlist listing fail (it always succeeds, Part 4.3).
+// The listings that the refresh action calls, exposed so that a unit test can make the smart
+// playlist listing fail (the real one always succeeds).
 #pragma once
 
 #include <json/value.h>

@@ -1,4 +1,4 @@
-// Part 2.1: Root tree.
+// Root tree: the top-level categories, each with its children, in one reply.
 #include "RootTree.h"
 
 #include <sys/stat.h>
@@ -14,7 +14,7 @@ constexpr int kLibraryService = 3;
 
 namespace {
 
-// Every category node hides its icon this way (Part 1.2).
+// Every category node hides its icon this way: a blank image and a hiding icon class.
 constexpr const char* kBlankIcon = "3rdparty/Harmona/images/s.gif";
 constexpr const char* kHiddenIconClass = "x-tree-hide-icon";
 
@@ -61,8 +61,8 @@ int BuildRootTreeFrom(HarmonaHandler& handler, const std::vector<RootCategory>& 
                 shown = libraryShown;
                 break;
             case RootCondition::ipod:
-                // HasIPodDirectory is called whatever the permission bits (step 4 of the
-                // algorithm).
+                // HasIPodDirectory is called once, whatever the permission bits: the
+                // directory is tested before the permission.
                 if (!ipodChecked) {
                     ipodShown = handler.HasIPodDirectory();
                     ipodChecked = true;

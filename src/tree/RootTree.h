@@ -1,4 +1,4 @@
-// Part 2.1: the category table of the root tree, exposed so that a unit test can make a child
+// The category table of the root tree, exposed so that a unit test can make a child
 // builder fail that no fixture can make fail (the radio builder always succeeds).
 #pragma once
 
@@ -10,7 +10,9 @@ class HarmonaHandler;
 
 namespace harmona::tree {
 
-// When a root category is shown (Part 2.1, column "Shown when").
+// When a root category is shown: library categories when a music share exists and the local media
+// server runs, the iPod when its directory exists and the user may use it, the media servers when
+// the user may see them, radio always.
 enum class RootCondition { library, ipod, always, mediaServer };
 
 using ChildBuilder = int (*)(HarmonaHandler& handler, Json::Value& children);
