@@ -1,4 +1,4 @@
-// Browse benchmark (issue 3): wall time and peak memory of one "gettreenode" request that lists a
+// Browse benchmark: wall time and peak memory of one "gettreenode" request that lists a
 // container of 10,000 and of 100,000 children from a scripted ContentDirectory on 127.0.0.1:50003,
 // beside, in the same run, (a) a trivial C CGI process and (b) the same Browse fetched with curl.
 // Runs inside the test sandbox (private mount + network namespace; needs root).
@@ -201,15 +201,14 @@ int main(int argc, char** argv) {
         std::printf("%zu children (reply %.1f MiB):\n", sizes[i], replyMiB);
         Print("curl Browse (raw fetch)", c, baseline);
         Print("audiotree.cgi gettreenode", b, baseline);
-        Print("spec floor: the nodes alone", f, baseline);
+        Print("nodes alone (JSON model floor)", f, baseline);
         std::printf(
             "  CGI / curl wall: %.2fx (target 1.3x at 10,000)   CGI peak %.1f MiB vs 3x reply + 10 "
             "MiB "
             "= %.1f MiB\n",
             b.wallMs / c.wallMs, b.peakKiB / 1024.0, 3 * replyMiB + 10);
         std::printf(
-            "  spec floor / curl wall: %.2fx; floor peak %.1f MiB (its nodes made with "
-            "FillTreeNode "
+            "  floor / curl wall: %.2fx; floor peak %.1f MiB (its nodes made with FillTreeNode "
             "into Json::Value and printed, nothing fetched or parsed)\n",
             f.wallMs / c.wallMs, f.peakKiB / 1024.0);
     }

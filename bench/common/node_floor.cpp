@@ -1,6 +1,6 @@
-// The floor of a listing request under the spec: a process that makes COUNT tree nodes the way
-// every builder must (Part 1.2: HarmonaHandler::FillTreeNode into a Json::Value,
-// Json::Value::append into the children array) and prints them with ActionHandler::PrintResponse,
+// The floor of a listing request: a process that makes COUNT tree nodes the way every builder of
+// the tree does (HarmonaHandler::FillTreeNode into a Json::Value, Json::Value::append into the
+// children array) and prints them with ActionHandler::PrintResponse,
 // and does nothing else: no request parsing, no fetch, no XML. What a CGI request that lists COUNT
 // children costs beyond this is the part that the code can still win; this much it cannot, while
 // nodes are jsoncpp values.

@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# Benchmark of issue 8: harmona-index over 10,000 tiny files (first run and unchanged re-run), and
+# Benchmark of the indexer and the local media server: harmona-index over 10,000 tiny files (first run and unchanged re-run), and
 # Browse of a container of BROWSE_TRACKS (default 100,000) tracks, whole and a page of 50, against
 # MiniDLNA serving the same files in the same run. Runs in a private mount and network namespace.
 #   bench/mediad/run.sh [BUILD_DIR]      (as root; needs sox, minidlna, python3, curl)

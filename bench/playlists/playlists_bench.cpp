@@ -3,8 +3,8 @@
 // rounds that interleave the programs so that drift of the machine hits all alike.
 //
 // 1. "rerandom100" of the real audiotree.cgi over library.db files of 1,000, 100,000 and 1,000,000
-//    tracks (Part 4.4). Target: at 1,000,000 tracks within 2x its time at 1,000.
-// 2. The playlist listings (Parts 4.2 and 4.3) through the real "refresh" request (Part 2.3) with
+//    tracks. Target: at 1,000,000 tracks within 2x its time at 1,000.
+// 2. The playlist and smart playlist listings through the real "refresh" request with
 //    10,000 personal playlist files, a personal smart playlist file of 10,000 playlists, and 10,000
 //    shared playlists plus 10,000 shared smart playlists.
 //
@@ -54,8 +54,8 @@ void Exec(harmona::sqlite::Database& db, const char* sql) {
     }
 }
 
-// library.db (platform.md section 6) with `tracks` tracks (ids 1..N) and `playlists` shared
-// playlists.
+// library.db with `tracks` tracks (ids 1..N) and `playlists` shared playlists, in the schema of
+// (platform/README.md, "Music library database and random-100 playlist").
 void MakeLibrary(long tracks, int playlists) {
     MakeDirs("/var/packages/Harmona/var");
     unlink(kLibraryDb);

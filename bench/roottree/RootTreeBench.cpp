@@ -1,4 +1,4 @@
-// Root tree benchmark (issue 7): "gettreenode" "audiotree_root" through the real CGI over a
+// Root tree benchmark: "gettreenode" "audiotree_root" through the real CGI over a
 // realistic fixture (1,000 personal playlists, 200 smart playlists, 50 shared playlists, an iPod
 // with 50 playlists, a daemon with 30 media servers), wall time and peak memory beside a trivial C
 // CGI in the same run; and what the UI texts cost, parsed once per builder (up to seven times).
@@ -100,9 +100,9 @@ int main(int argc, char** argv) {
         {"root tree, realistic fixture", cgi, CgiEnvironment(kRootQuery, "admin"), {}},
         {"root tree, no iPod category", cgi, CgiEnvironment(kRootQuery, "noipod"), {}},
         {"root tree, no iPod, no media servers", cgi, CgiEnvironment(kRootQuery, "plain"), {}},
-        // What the spec's node record costs alone: as many jsoncpp nodes as the full reply has,
-        // made with FillTreeNode and printed, nothing listed or read.
-        {"spec floor: the reply's nodes alone",
+        // What the tree nodes cost alone: as many jsoncpp nodes as the full reply has, made with
+        // FillTreeNode and printed, nothing listed or read.
+        {"reply's nodes (JSON model floor)",
          HARMONA_NODE_FLOOR,
          {"NODE_COUNT=" + std::to_string(nodes)},
          {}},
@@ -123,7 +123,7 @@ int main(int argc, char** argv) {
         row.peakKb = PeakMemoryKb(row.program, row.environment);
 
     // The UI texts: the root request parses the table once for the root and once in each child
-    // builder that looks texts up (up to seven times, Part 1.3).
+    // builder that looks texts up (up to seven times).
     const std::string texts = std::string(kTextsDir) + "enu";
     const auto start = std::chrono::steady_clock::now();
     const int parses = 7000;

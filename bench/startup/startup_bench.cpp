@@ -132,7 +132,6 @@ int main(int argc, char** argv) {
 
     const std::string trivial = dir + "bench_trivial_cgi";
     const std::string cgi = dir + "audiotree.cgi";
-    const std::string ipodCgi = dir + "bench_ipod_cgi";
     const std::string ok = "{\"success\":true}";
 
     std::vector<Program> plain = {
@@ -144,10 +143,11 @@ int main(int argc, char** argv) {
     std::vector<Program> ipod = {
         {"trivial C CGI", trivial, "", ok, {}},
         {"audiotree.cgi avoid_timeout", cgi, "action=avoid_timeout", ok, {}},
-        {"iPod children (" + std::to_string(playlists) + " playlists)",
-         ipodCgi,
-         "",
-         playlists > 0 ? "ipod_root" : "ipod_refresh",
+        // The iPod's playlists are children of "ipod_root"; with none the items are null.
+        {"refresh target=ipod (" + std::to_string(playlists) + " playlists)",
+         cgi,
+         "action=refresh&target=ipod",
+         playlists > 0 ? "\"pid\":\"ipod_root\"" : "\"items\":null",
          {}}};
     Measure("iPod attached", ipod, runs);
     return 0;

@@ -158,7 +158,7 @@ int main(int argc, char** argv) {
     Print("50 clients released together x 40", Bursts(50, 40), trivialMs);
     Print("50 clients looping", Sustained(50, seconds), trivialMs);
     std::printf(
-        "\n(\"missed\": not answered within Part 6.1's 0.5 s budget; \"x trivial\": median "
+        "\n(\"missed\": not answered within the CGI client's 0.5 s budget; \"x trivial\": median "
         "over the trivial CGI's median)\n");
     daemon.Stop(SIGTERM, 5000);
     return 0;

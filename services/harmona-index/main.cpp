@@ -1,4 +1,4 @@
-// harmona-index: one scan of the audio share into library.db (issue 8). Run it at start-up and
+// harmona-index: one scan of the audio share into library.db. Run it at start-up and
 // whenever the share changed; it prints one summary line and exits 0, or 1 on failure.
 #include <syslog.h>
 

@@ -1,6 +1,6 @@
 // Makes the media server reachable at 127.0.0.1 on its port. libupnp 1.8 binds its HTTP server to
 // the advertised interface's address only, and it refuses the loopback interface, but the CGI
-// connects to the fixed http://127.0.0.1:50003/ContentDirectory/control (platform.md section 1).
+// connects to the fixed http://127.0.0.1:50003/ContentDirectory/control.
 // The relay listens on 127.0.0.1:<port> and forwards each connection, byte for byte, to the
 // interface address on the same port, where libupnp answers it.
 #pragma once

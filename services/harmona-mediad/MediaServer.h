@@ -13,7 +13,7 @@
 
 namespace harmona::mediad {
 
-// The fixed port of platform.md section 1 (the CGI connects to 127.0.0.1 there).
+// The fixed port the CGI connects to on 127.0.0.1 (platform/README.md, "Fixed paths").
 inline constexpr unsigned short kMediaServerPort = 50003;
 inline constexpr int kAdvertisementSeconds = 1800;
 

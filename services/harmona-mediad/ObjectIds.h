@@ -1,4 +1,5 @@
-// The media server's object ids. The root "0" and the seven categories of spec Part 3.1 are fixed;
+// The media server's object ids. The root "0" and the seven categories the CGI's music library
+// node lists are fixed;
 // the ids below them are stable across restarts and re-indexing (built from names and paths, not
 // from row order) and safe: only ASCII letters, digits and "._~-:/%" ever appear, every other byte
 // of a name is percent-encoded.

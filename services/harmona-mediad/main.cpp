@@ -1,7 +1,7 @@
-// harmona-mediad: the storage server's local UPnP media server over library.db (issue 8).
+// harmona-mediad: the storage server's local UPnP media server over library.db.
 //   harmona-mediad [--interface NAME]
 // It serves ContentDirectory:1 on port 50003 (the CGI connects to 127.0.0.1 there), writes
-// /run/vanu/service/3.pid while it runs (platform.md section 5: service 3 is this server) and
+// /run/vanu/service/3.pid while it runs (service 3 of the system's service list is this server) and
 // removes it on SIGTERM or SIGINT before it says byebye.
 #include <fcntl.h>
 #include <signal.h>

@@ -1,5 +1,6 @@
-// The schema of library.db (platform.md section 6, PRAGMA user_version = 1): the music library
-// index and the shared playlists, plus the indexes the media server's queries use.
+// The schema of library.db (PRAGMA user_version = 1; platform/README.md, "Music library database
+// and random-100 playlist"): the music library index and the shared playlists, plus the indexes
+// the media server's queries use.
 #pragma once
 
 #include "sqlite/Database.h"

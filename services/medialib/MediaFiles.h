@@ -5,11 +5,11 @@
 
 namespace harmona::medialib {
 
-// The audio share: audio_share_path of audio.conf (platform.md section 5), else /volume1/music;
+// The audio share: audio_share_path of audio.conf, else /volume1/music;
 // without a trailing "/".
 std::string AudioSharePath();
 
-// Whether the indexer takes the file: Part 6.2's IsSupportedAudioFile with selector 1.
+// Whether the indexer takes the file: the CGI's IsSupportedAudioFile with selector 1.
 bool IsIndexableAudioFile(const std::string& path);
 
 // The MIME type served for a file, by its extension (any letter case);

@@ -1,4 +1,4 @@
-// The control socket (spec Part 6.1, platform.md section 10): one event loop on one thread that
+// The control socket: one event loop on one thread that
 // accepts clients, gathers each one's 8196-byte record with a time limit, answers it with one
 // write and closes. Every socket is non-blocking, so no client can hold up another, and the
 // answers come from the server list's snapshot, so discovery work never delays them.

@@ -1,5 +1,6 @@
-// The daemon's side of spec Part 6.1 (request record) and Part 3.2 (commands 14 and 16 and their
-// JSON replies), platform.md section 10. Pure functions: no sockets, no discovery state.
+// The daemon's side of the CGI's daemon exchange: the request record, and commands 14 and 16 with
+// their JSON replies (platform/README.md, "Audio daemon"). Pure functions: no sockets, no discovery
+// state.
 #pragma once
 
 #include <cstddef>
@@ -10,18 +11,18 @@
 
 namespace vanuaudiod {
 
-// Part 6.1's record: a native-order int32 command and 8192 bytes of NUL-terminated argument text.
+// The request record: a native-order int32 command and 8192 bytes of NUL-terminated argument text.
 inline constexpr std::size_t kCommandSize = 4;
 inline constexpr std::size_t kArgumentSize = 8192;
 inline constexpr std::size_t kRequestSize = kCommandSize + kArgumentSize;  // 8196
 
-// Part 3.2's client reads the reply of command 16 once into 40960 bytes that must end with a NUL.
+// The CGI reads the reply of command 16 once into 40960 bytes that must end with a NUL.
 inline constexpr std::size_t kMaxReplySize = 40960 - 1;
 
 inline constexpr int32_t kCommandPrepareMediaServerList = 14;
 inline constexpr int32_t kCommandGetMediaServerList = 16;
 
-// Bounds on what one list element may carry, so that a page of Part 3.2's ten servers always fits
+// Bounds on what one list element may carry, so that a page of the CGI's ten servers always fits
 // in kMaxReplySize (each field's JSON form is at most twice its byte length, see JsonString).
 inline constexpr std::size_t kMaxFriendlyNameBytes = 512;
 inline constexpr std::size_t kMaxControlUrlBytes = 1024;
@@ -51,8 +52,7 @@ std::string UnsupportedReply();             // error "unsupported"
 std::string ListReply(const std::vector<MediaServer>& servers, int offset, int count,
                       std::size_t maxBytes = kMaxReplySize);
 
-// Answers one request (the command table of platform.md section 10); `startSearch` is set for
-// command 14.
+// Answers one request (the daemon's command table); `startSearch` is set for command 14.
 std::string Answer(const Request& request, const std::vector<MediaServer>& servers,
                    bool& startSearch);
 

@@ -1,12 +1,12 @@
-// vanuaudiod: the audio daemon's media server discovery and its control socket (spec Parts 3.2 and
-// 6.1, platform.md section 10). Runs in the foreground; logs to the system log (and to standard
+// vanuaudiod: the audio daemon's media server discovery and its control socket, which the CGI asks
+// for the media server list. Runs in the foreground; logs to the system log (and to standard
 // error with --verbose).
 //
 //   vanuaudiod [--interface NAME] [--socket PATH] [--verbose]
 //
 // --interface: the network interface for SSDP (default: libupnp's first suitable one; tests on a
-// private loopback use "lo"). --socket: the control socket (default /tmp/vanuaudiod.sock, the fixed
-// path of platform.md section 1; other paths only for benchmarks).
+// private loopback use "lo"). --socket: the control socket (default /tmp/vanuaudiod.sock, the
+// platform's fixed path; other paths only for benchmarks).
 //
 // The host needs a route for multicast (its default route, or 224.0.0.0/4 on the interface):
 // without one, libupnp's M-SEARCH fails with ENETUNREACH and servers are found only by their

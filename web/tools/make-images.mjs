@@ -1,6 +1,6 @@
 #!/usr/bin/env node
 // Draws the tree's icons, buttons and thumbnails as small real PNG files (and the blank s.gif),
-// at the paths the spec names under 3rdparty/Harmona/images/. Run from the repository root:
+// at the paths the CGI's tree nodes name under 3rdparty/Harmona/images/. Run from the repository root:
 //   node web/tools/make-images.mjs
 // The output is committed (web/site/3rdparty/Harmona/images/); rerun after changing a drawing.
 // Each image is a list of layers, a colour and a shape over the unit square, rendered with 4x4

@@ -1,6 +1,6 @@
 // uilang.cgi: tells the tree page the login user's UI language, chosen exactly as the audio tree
-// CGI chooses it (platform.md section 3: users.conf, then Accept-Language, then "enu"), so that the
-// page speaks the language of the node texts it shows. Read-only; one tiny JSON reply:
+// CGI chooses it (users.conf, then Accept-Language, then "enu"), so that the page speaks the
+// language of the node texts it shows. Read-only; one tiny JSON reply:
 //   {"language": "ger"}
 // A caller that the platform refuses gets the platform's 401 and no body.
 #include <json/value.h>

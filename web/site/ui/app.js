@@ -23,7 +23,7 @@ const nodeData = new WeakMap(); // li -> the node object as the server sent it
 const $ = (id) => document.getElementById(id);
 
 // --- requests --------------------------------------------------------------------------------------
-// One CGI request (urlencoded POST, platform.md section 3). Resolves to parseReply's result, or to
+// One CGI request (urlencoded POST). Resolves to parseReply's result, or to
 // {kind: "http", status} / {kind: "offline"}.
 async function call(params) {
   let response;

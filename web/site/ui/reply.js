@@ -1,10 +1,11 @@
-// The audio tree CGI's replies, read as the spec writes them (no DOM here, so Node's test runner
+// The audio tree CGI's replies, read as the CGI writes them (no DOM here, so Node's test runner
 // checks these functions too):
-//   node arrays of "gettreenode" (Parts 1.2, 2.1, 2.2, 3.1): [node, ...]; [] or [[]] = no children;
-//   refresh replies (Parts 2.3, 3.2): {"items": [...] or null, "success": true};
-//   success envelope (Parts 1.1, 4.4): {"success": true};
-//   error envelope (platform.md section 3): {"success": false, "errinfo": {"sec", "key", "line"}},
-//     possibly with the nodes built before the error under "items" (Part 2.1);
+//   node arrays of "gettreenode" (root tree, child nodes, library listings): [node, ...];
+//     [] or [[]] = no children;
+//   refresh replies (playlists, iPod, media servers): {"items": [...] or null, "success": true};
+//   success envelope ("avoid_timeout", "rerandom100"): {"success": true};
+//   error envelope: {"success": false, "errinfo": {"sec", "key", "line"}}, possibly with the nodes
+//     the root tree built before the error under "items";
 //   a null value prints as [] at the top level.
 
 const isNode = (value) => value !== null && typeof value === "object" && !Array.isArray(value);
@@ -55,8 +56,9 @@ export function decodeEntities(text) {
   });
 }
 
-// UI language codes and their language tags (platform.md section 3), for when the server cannot
-// say: the first tag that maps, by descending q-value, then by order.
+// UI language codes and their language tags, as the CGI maps Accept-Language (platform/README.md,
+// "Requests, users and permissions"), for when the server cannot say: the first tag that maps, by
+// descending q-value, then by order.
 const TAGS = [
   ["enu", ["en"]], ["ger", ["de"]], ["fre", ["fr"]], ["ita", ["it"]], ["spn", ["es"]], ["jpn", ["ja"]],
   ["dan", ["da"]], ["nor", ["nb", "nn", "no"]], ["sve", ["sv"]], ["nld", ["nl"]], ["rus", ["ru"]],
@@ -94,7 +96,7 @@ export function safeIcon(icon) {
   return icon.split("/").includes("..") ? null : icon;
 }
 
-// The buttons among the nodes (Parts 3.2, 4.1, 5.1, 5.2) and what their click sends.
+// The buttons among the nodes (refresh, new playlist and new radio buttons) and what their click sends.
 export const REFRESH_TARGETS = {
   musiclib_music_personal_refresh: "personal",
   musiclib_music_shared_refresh: "shared",
@@ -109,8 +111,8 @@ export const BUTTON_IDS = new Set([
 ]);
 
 // A node whose children the page asks for with "gettreenode" when it is opened: a node that says it
-// is not a leaf, or a music library category or container (Part 3.1 writes those as leaves, but the
-// library is browsed below them: Part 2.2). Playlists, smart playlists and buttons are never opened.
+// is not a leaf, or a music library category or container (the CGI writes those as leaves, but the
+// library is browsed below them with "gettreenode"). Playlists, smart playlists and buttons are never opened.
 export function isLazyContainer(node) {
   if (!isNode(node) || Array.isArray(node.children)) return false;
   const id = typeof node.id === "string" ? node.id : "";

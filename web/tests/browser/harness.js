@@ -55,11 +55,3 @@ export const rootIds = (page) =>
 export async function screenshot(page, name) {
   await page.screenshot({ path: join(artifacts, `${name}.png`), fullPage: true });
 }
-
-// The raw CGI reply for a request, fetched with the page's login (to see what has landed).
-export async function cgi(page, params) {
-  return page.evaluate(async (body) => {
-    const response = await fetch("webapi/audiotree.cgi", { method: "POST", body: new URLSearchParams(body) });
-    return { status: response.status, text: await response.text() };
-  }, params);
-}

@@ -1,6 +1,6 @@
 // The tree page's own behaviour, whatever the CGI's builders answer today: the real lighttpd serves
 // the page (login, headers) and the CGI for the keep-alive, while the tree replies are scripted with
-// Playwright's request routing, to show every reply shape of the spec, hostile texts and faults.
+// Playwright's request routing, to show every reply shape the CGI sends, hostile texts and faults.
 import { test, before, after } from "node:test";
 import assert from "node:assert/strict";
 import { launch, close, openTree, item, childIds, rootIds, screenshot, baseURL, password } from "./harness.js";
@@ -16,7 +16,7 @@ const node = (id, text, extra = {}) => ({
 const category = (id, text, children, extra = {}) =>
   node(id, text, { icon: "3rdparty/Harmona/images/s.gif", iconCls: "x-tree-hide-icon", leaf: false, children, ...extra });
 
-// A root tree as Part 2.1 writes it, with texts as FillTreeNode encodes them.
+// A root tree as the CGI writes it, with texts as FillTreeNode encodes them.
 const ROOT = [
   category("musiclib_root", "Library", [
     node("musiclib_music_album", "Album", { pid: "musiclib", icon: "3rdparty/Harmona/images/files_class/icon_class_album.png" }),

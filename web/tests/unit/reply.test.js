@@ -11,11 +11,11 @@ test("a node array is read as nodes; a null reply prints as [] and is no node", 
   assert.deepEqual(parseReply("null"), { kind: "nodes", nodes: [] });
 });
 
-test("an empty container's [[]] (Part 3.1) means no children", () => {
+test("an empty container's [[]] means no children", () => {
   assert.deepEqual(parseReply("[[]]\n"), { kind: "nodes", nodes: [] });
 });
 
-test("a refresh reply gives its items; null items are an empty list (Parts 2.3, 3.2)", () => {
+test("a refresh reply gives its items; null items are an empty list", () => {
   const reply = parseReply(JSON.stringify({ items: [node("x")], success: true }));
   assert.equal(reply.kind, "success");
   assert.deepEqual(reply.items.map((n) => n.id), ["x"]);
@@ -34,7 +34,7 @@ test("the error envelope gives section, key and line, and the nodes built before
   assert.deepEqual(parseReply('{"success":false}').errinfo, { sec: "", key: "", line: null });
 });
 
-test("bodies that are not the spec's replies are invalid", () => {
+test("bodies that are not the CGI's replies are invalid", () => {
   assert.equal(parseReply("").kind, "invalid");
   assert.equal(parseReply("<html>").kind, "invalid");
   assert.equal(parseReply('"text"').kind, "invalid");
@@ -48,7 +48,7 @@ test("entities of WebUtils::EncodeHtml are decoded once, others stay", () => {
   assert.equal(decodeEntities(undefined), "");
 });
 
-test("the language falls back as platform.md section 3 maps tags", () => {
+test("the language falls back to the tags the CGI maps", () => {
   assert.equal(languageFromTags(["de-DE", "en"]), "ger");
   assert.equal(languageFromTags(["zh-TW"]), "cht");
   assert.equal(languageFromTags(["zh-Hant-HK"]), "cht");
