@@ -93,6 +93,8 @@ bool Process::WaitExit(int timeoutMs, int& status) {
         }
         if (ElapsedMs(start) >= timeoutMs)
             return false;
+        // A program that logs while it stops must not wait on the sandbox's unread log socket.
+        DrainSyslog();
         std::this_thread::sleep_for(std::chrono::milliseconds(10));
     }
 }
@@ -157,6 +159,9 @@ PeerNetwork::PeerNetwork() {
     ok_ = Shell("ip link add va type veth peer name vb netns " + peer) &&
           Shell("echo 0 > /proc/sys/net/ipv6/conf/va/accept_dad") &&
           Shell("ip addr add 10.77.0.1/24 dev va && ip link set va up") &&
+          // More addresses of this host, for scripted servers beyond what one address may
+          // announce.
+          Shell("for n in 11 12 13 14; do ip addr add 10.77.0.$n/24 dev va; done") &&
           // Multicast needs a route (a LAN host has its default route): without one, libupnp's
           // M-SEARCH fails with ENETUNREACH.
           Shell("ip route add 224.0.0.0/4 dev va") &&
@@ -255,7 +260,7 @@ FakeMediaServers::FakeMediaServers() {
     listenFd_ = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
     sockaddr_in address{};
     address.sin_family = AF_INET;
-    inet_pton(AF_INET, kHostAddress, &address.sin_addr);
+    address.sin_addr.s_addr = htonl(INADDR_ANY);  // every address the devices announce
     EXPECT_EQ(bind(listenFd_, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0)
         << std::strerror(errno);
     socklen_t length = sizeof(address);
@@ -263,12 +268,8 @@ FakeMediaServers::FakeMediaServers() {
     port_ = ntohs(address.sin_port);
     listen(listenFd_, 64);
 
-    udpFd_ = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
     in_addr interfaceAddress{};
     inet_pton(AF_INET, kHostAddress, &interfaceAddress);
-    setsockopt(udpFd_, IPPROTO_IP, IP_MULTICAST_IF, &interfaceAddress, sizeof(interfaceAddress));
-    const unsigned char loop = 1;
-    setsockopt(udpFd_, IPPROTO_IP, IP_MULTICAST_LOOP, &loop, sizeof(loop));
 
     ssdpFd_ = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
     const int yes = 1;
@@ -291,8 +292,35 @@ FakeMediaServers::~FakeMediaServers() {
     stop_ = true;
     thread_.join();
     close(listenFd_);
-    close(udpFd_);
+    for (const auto& [address, fd] : udpFds_)
+        close(fd);
     close(ssdpFd_);
+}
+
+int FakeMediaServers::SocketFrom(const std::string& address) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    const auto found = udpFds_.find(address);
+    if (found != udpFds_.end())
+        return found->second;
+    const int fd = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    sockaddr_in local{};
+    local.sin_family = AF_INET;
+    inet_pton(AF_INET, address.c_str(), &local.sin_addr);
+    EXPECT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&local), sizeof(local)), 0)
+        << address << ": " << std::strerror(errno);
+    in_addr interfaceAddress{};
+    inet_pton(AF_INET, kHostAddress, &interfaceAddress);
+    setsockopt(fd, IPPROTO_IP, IP_MULTICAST_IF, &interfaceAddress, sizeof(interfaceAddress));
+    const unsigned char loop = 1;
+    setsockopt(fd, IPPROTO_IP, IP_MULTICAST_LOOP, &loop, sizeof(loop));
+    udpFds_[address] = fd;
+    return fd;
+}
+
+std::string FakeMediaServers::AddressOf(const std::string& udn) const {
+    std::lock_guard<std::mutex> lock(mutex_);
+    const auto found = addresses_.find(udn);
+    return found == addresses_.end() ? kHostAddress : found->second;
 }
 
 void FakeMediaServers::AnswerSearches(const std::string& udn, int maxAgeSeconds) {
@@ -325,8 +353,8 @@ void FakeMediaServers::AnswerSearch() {
             "\r\nEXT:\r\nLOCATION: " + Location(udn) +
             "\r\nSERVER: Linux/6 UPnP/1.0 fake/1\r\nST: " + kType + "\r\nUSN: " + udn +
             "::" + kType + "\r\n\r\n";
-        sendto(udpFd_, reply.data(), reply.size(), 0, reinterpret_cast<sockaddr*>(&from),
-               fromLength);
+        sendto(SocketFrom(AddressOf(udn)), reply.data(), reply.size(), 0,
+               reinterpret_cast<sockaddr*>(&from), fromLength);
     }
 }
 
@@ -345,8 +373,14 @@ std::string FakeMediaServers::DescriptionXml(const std::string& udn,
 
 std::string FakeMediaServers::Add(const std::string& udn, const std::string& descriptionXml) {
     std::lock_guard<std::mutex> lock(mutex_);
-    const std::string path = "/" + std::to_string(paths_.size()) + ".xml";
+    const std::size_t index = paths_.size();
+    const std::string path = "/" + std::to_string(index) + ".xml";
     paths_[udn] = path;
+    // Sixteen devices per address, as one host may announce: the first on the host's own
+    // address, the next ones on its further addresses.
+    addresses_[udn] = index < kDevicesPerAddress
+                          ? kHostAddress
+                          : "10.77.0." + std::to_string(10 + index / kDevicesPerAddress);
     descriptions_[path] = descriptionXml;
     return path;
 }
@@ -354,8 +388,9 @@ std::string FakeMediaServers::Add(const std::string& udn, const std::string& des
 std::string FakeMediaServers::Location(const std::string& udn) const {
     std::lock_guard<std::mutex> lock(mutex_);
     const auto found = paths_.find(udn);
-    return "http://" + std::string(kHostAddress) + ":" + std::to_string(port_) +
-           (found == paths_.end() ? "/none.xml" : found->second);
+    const auto address = addresses_.find(udn);
+    return "http://" + (address == addresses_.end() ? kHostAddress : address->second) + ":" +
+           std::to_string(port_) + (found == paths_.end() ? "/none.xml" : found->second);
 }
 
 void FakeMediaServers::Alive(const std::string& udn, int maxAgeSeconds) {
@@ -378,8 +413,8 @@ void FakeMediaServers::Notify(const std::string& udn, const char* nts, int maxAg
     group.sin_family = AF_INET;
     group.sin_port = htons(1900);
     inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
-    EXPECT_EQ(sendto(udpFd_, message.data(), message.size(), 0, reinterpret_cast<sockaddr*>(&group),
-                     sizeof(group)),
+    EXPECT_EQ(sendto(SocketFrom(AddressOf(udn)), message.data(), message.size(), 0,
+                     reinterpret_cast<sockaddr*>(&group), sizeof(group)),
               static_cast<ssize_t>(message.size()))
         << std::strerror(errno);
 }

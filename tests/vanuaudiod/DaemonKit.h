@@ -17,6 +17,7 @@
 #include <vector>
 
 #include "CgiRunner.h"
+#include "Sandbox.h"
 
 namespace harmona::test {
 
@@ -101,9 +102,10 @@ std::string WaitForList(Predicate accept, int timeoutMs);
 // disappearance within seconds can only be its byebye).
 Process StartMiniDlna(PeerNetwork& peer, const std::string& friendlyName, int port);
 
-// A media server played by the test: its descriptions are served over HTTP on this host
-// (10.77.0.1, an ephemeral port) and its SSDP NOTIFY datagrams are sent to the multicast group
-// on va (looped back to this host's listeners), for as many devices as the test adds.
+// A media server played by the test: its descriptions are served over HTTP on this host (an
+// ephemeral port) and its SSDP NOTIFY datagrams are sent to the multicast group on va (looped
+// back to this host's listeners), for as many devices as the test adds. The first 16 devices
+// announce from 10.77.0.1, the next ones from the host's further addresses 10.77.0.11 to .14.
 class FakeMediaServers {
   public:
     FakeMediaServers();
@@ -132,16 +134,22 @@ class FakeMediaServers {
     void Notify(const std::string& udn, const char* nts, int maxAgeSeconds);
     void AnswerSearch();
 
+    static constexpr std::size_t kDevicesPerAddress = 16;
+    // The datagram socket that sends from `address` (made on first use).
+    int SocketFrom(const std::string& address);
+    std::string AddressOf(const std::string& udn) const;
+
     int ssdpFd_ = -1;  // bound to port 1900, member of the SSDP group on va
     std::atomic<int> searchesSeen_{0};
     std::map<std::string, int> searchAnswers_;  // udn -> max-age
 
     int listenFd_ = -1;
-    int udpFd_ = -1;
+    std::map<std::string, int> udpFds_;  // source address -> socket
     unsigned short port_ = 0;
     std::atomic<bool> stop_{false};
     mutable std::mutex mutex_;
     std::map<std::string, std::string> paths_;         // udn -> path
+    std::map<std::string, std::string> addresses_;     // udn -> address it announces from
     std::map<std::string, std::string> descriptions_;  // path -> xml
     std::thread thread_;
 };
@@ -158,6 +166,9 @@ std::string WaitForList(Predicate accept, int timeoutMs) {
             return last;
         if (std::chrono::steady_clock::now() >= deadline)
             return last;
+        // The daemon logs each server it finds; the sandbox's log socket holds only a few lines
+        // until read, and a daemon whose log is full waits for it as it would for a slow syslog.
+        DrainSyslog();
         std::this_thread::sleep_for(std::chrono::milliseconds(100));
     }
 }

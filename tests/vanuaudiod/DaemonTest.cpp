@@ -1,6 +1,7 @@
 // The real vanuaudiod (platform/README.md, "Audio daemon") in the test's private network: its
 // control socket, its robustness against bad clients, its concurrency, and the discovery of real
 // (MiniDLNA) and scripted media servers over a veth link.
+#include <grp.h>
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/socket.h>
@@ -14,9 +15,10 @@
 
 #include "DMABrowse.h"
 #include "DMAParser.h"
+#include "DaemonAccount.h"
 #include "DaemonKit.h"
 #include "Fixtures.h"
-#include "HttpGet.h"
+#include "gupnp/HttpFetch.h"
 
 using namespace harmona::test;
 
@@ -107,7 +109,11 @@ TEST_F(Vanuaudiod, SocketIsOpenToTheCgiUserAndAStaleOneIsReplaced) {
     struct stat info {};
     ASSERT_EQ(stat(kSocket, &info), 0);
     EXPECT_TRUE(S_ISSOCK(info.st_mode));
-    EXPECT_EQ(info.st_mode & 0777, 0666u);
+    // Owner and group only: the web server's group, whose CGI is the one client.
+    EXPECT_EQ(info.st_mode & 0777, 0660u);
+    const group* web = getgrnam(harmona::paths::kDaemonSocketGroup);
+    ASSERT_NE(web, nullptr);
+    EXPECT_EQ(info.st_gid, web->gr_gid);
     EXPECT_TRUE(Call(16, "0 10").answered);
 }
 
@@ -452,8 +458,10 @@ TEST_F(Vanuaudiod, AServerAlreadyRunningIsFoundByTheSearchAtStart) {
     // next ones are a minute away: only the daemon's own M-SEARCH can find it.
     Process minidlna = StartMiniDlna(peer_, "Early MiniDLNA", 8203);
     const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(5);
-    while (!vanuaudiod::HttpGet("http://10.77.0.2:8203/rootDesc.xml", 500, 65536).ok &&
-           std::chrono::steady_clock::now() < deadline)
+    while (
+        !harmona::gupnp::HttpFetcher::GetAndWait("http://10.77.0.2:8203/rootDesc.xml", {500, 65536})
+             .ok &&
+        std::chrono::steady_clock::now() < deadline)
         std::this_thread::sleep_for(std::chrono::milliseconds(50));
     std::this_thread::sleep_for(std::chrono::milliseconds(300));
     daemon_ = StartDaemon();
