@@ -70,17 +70,16 @@ std::string BroadcastOf(GSSDPClient* client) {
     return text;
 }
 
-// Whether an M-SEARCH from `address` can leave: a datagram socket on it connects to the SSDP group
-// only when the host has a route for multicast.
+// Why the host has no route for the SSDP group from `address` ("" when it has one). GSSDP
+// binds its searches to the interface, so they leave all the same; but a host without the
+// route is misconfigured for SSDP (other programs' announcements and searches fail), which the
+// log should say.
 std::string MulticastRouteProblem(GInetAddress* address) {
     if (g_inet_address_get_family(address) != G_SOCKET_FAMILY_IPV4)
         return "";  // IPv6 SSDP uses the link-scope group, which needs no route
     const int fd = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, IPPROTO_UDP);
     if (fd < 0)
         return "";
-    in_addr local{};
-    std::memcpy(&local, g_inet_address_to_bytes(address), 4);
-    setsockopt(fd, IPPROTO_IP, IP_MULTICAST_IF, &local, sizeof(local));
     sockaddr_in group{};
     group.sin_family = AF_INET;
     group.sin_port = htons(1900);
@@ -136,7 +135,6 @@ class Discovery::Worker {
         std::string address;
         std::string broadcast;
         bool linkLocal = false;
-        bool routeMissing = false;
         SignalConnection messages;
         ObjectRef<GSSDPResourceBrowser> browser;
         Source searchWindow;
@@ -207,19 +205,23 @@ class Discovery::Worker {
         });
     }
 
+    // The route is the host's, not the address's: one line when it goes missing, one when it
+    // is back.
     void CheckMulticastRoute(Address& address) {
         GInetAddress* local = gssdp_client_get_address(GSSDP_CLIENT(address.context.get()));
         const std::string problem = MulticastRouteProblem(local);
+        const bool ipv4 = g_inet_address_get_family(local) == G_SOCKET_FAMILY_IPV4;
         g_object_unref(local);
-        if (!problem.empty() && !address.routeMissing)
+        if (!ipv4)
+            return;
+        if (!problem.empty() && !routeMissing_)
             syslog(LOG_WARNING,
-                   "network: searches cannot leave %s (%s): no multicast route (%s); servers are "
-                   "found by their own announcements only",
-                   address.interfaceName.c_str(), address.address.c_str(), problem.c_str());
-        else if (problem.empty() && address.routeMissing)
-            syslog(LOG_INFO, "network: searches leave %s (%s) again", address.interfaceName.c_str(),
-                   address.address.c_str());
-        address.routeMissing = !problem.empty();
+                   "network: no multicast route (%s): searches are sent on %s (%s) only, bound "
+                   "to it; add a default route or 224.0.0.0/4 for SSDP",
+                   problem.c_str(), address.interfaceName.c_str(), address.address.c_str());
+        else if (problem.empty() && routeMissing_)
+            syslog(LOG_INFO, "network: multicast route present again");
+        routeMissing_ = !problem.empty();
     }
 
     static void MessageReceived(GSSDPClient* client, const char* fromIp, guint /*fromPort*/,
@@ -356,6 +358,7 @@ class Discovery::Worker {
     std::deque<FetchJob> queue_;
     std::map<GUPnPContext*, std::unique_ptr<Address>> addresses_;
     Clock::time_point lastSearch_{};
+    bool routeMissing_ = false;
     Clock::time_point refusalWindowStart_{};
     int refusalLines_ = 0;
     int refusalsUnlogged_ = 0;

@@ -149,8 +149,10 @@ int main(int argc, char** argv) {
         return Fail("control socket: " + error);
     if (!DropPrivileges(account, error))
         return Fail(error);
-    discovery.Start();
+    // Logged before discovery starts: from here on this thread logs nothing until it stops, so
+    // that a slow system log can hold up discovery but never the answers on the socket.
     syslog(LOG_INFO, "listening on %s", arguments.socketPath.c_str());
+    discovery.Start();
     control.Run();
     syslog(LOG_INFO, "stopping");
     discovery.Stop();

@@ -162,8 +162,8 @@ PeerNetwork::PeerNetwork() {
           // More addresses of this host, for scripted servers beyond what one address may
           // announce.
           Shell("for n in 11 12 13 14; do ip addr add 10.77.0.$n/24 dev va; done") &&
-          // Multicast needs a route (a LAN host has its default route): without one, libupnp's
-          // M-SEARCH fails with ENETUNREACH.
+          // A route for multicast, as a LAN host has with its default route (without one the
+          // daemon warns).
           Shell("ip route add 224.0.0.0/4 dev va") &&
           Shell("nsenter -t " + peer +
                 " -n sh -c 'echo 0 > /proc/sys/net/ipv6/conf/vb/accept_dad && ip link set lo up && "
@@ -184,16 +184,90 @@ Process PeerNetwork::SpawnOnPeer(const std::vector<std::string>& argv, const std
     return Spawn(argv, logPath, holder_.pid());
 }
 
+bool RunCommand(const std::string& command) {
+    return Shell(command);
+}
+
+void SendNotify(const std::string& fromAddress, const std::string& udn, const std::string& location,
+                int maxAgeSeconds) {
+    static const std::string kType = "urn:schemas-upnp-org:device:MediaServer:1";
+    const std::string message =
+        "NOTIFY * HTTP/1.1\r\nHOST: 239.255.255.250:1900\r\nCACHE-CONTROL: "
+        "max-age=" +
+        std::to_string(maxAgeSeconds) + "\r\nLOCATION: " + location +
+        "\r\nSERVER: Linux/6 UPnP/1.0 forged/1\r\nNT: " + kType +
+        "\r\nNTS: ssdp:alive\r\nUSN: " + udn + "::" + kType + "\r\n\r\n";
+    const int fd = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    sockaddr_in local{};
+    local.sin_family = AF_INET;
+    inet_pton(AF_INET, fromAddress.c_str(), &local.sin_addr);
+    EXPECT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&local), sizeof(local)), 0) << fromAddress;
+    in_addr interfaceAddress{};
+    inet_pton(AF_INET, kHostAddress, &interfaceAddress);
+    setsockopt(fd, IPPROTO_IP, IP_MULTICAST_IF, &interfaceAddress, sizeof(interfaceAddress));
+    const unsigned char loop = 1;
+    setsockopt(fd, IPPROTO_IP, IP_MULTICAST_LOOP, &loop, sizeof(loop));
+    sockaddr_in group{};
+    group.sin_family = AF_INET;
+    group.sin_port = htons(1900);
+    inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
+    EXPECT_EQ(sendto(fd, message.data(), message.size(), 0, reinterpret_cast<sockaddr*>(&group),
+                     sizeof(group)),
+              static_cast<ssize_t>(message.size()));
+    close(fd);
+}
+
+ConnectionCounter::ConnectionCounter(const std::string& address) {
+    listenFd_ = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    sockaddr_in local{};
+    local.sin_family = AF_INET;
+    inet_pton(AF_INET, address.c_str(), &local.sin_addr);
+    EXPECT_EQ(bind(listenFd_, reinterpret_cast<sockaddr*>(&local), sizeof(local)), 0)
+        << address << ": " << std::strerror(errno);
+    socklen_t length = sizeof(local);
+    getsockname(listenFd_, reinterpret_cast<sockaddr*>(&local), &length);
+    port_ = ntohs(local.sin_port);
+    listen(listenFd_, 256);
+    thread_ = std::thread([this] {
+        std::vector<int> held;
+        while (!stop_) {
+            pollfd entry{listenFd_, POLLIN, 0};
+            if (poll(&entry, 1, 50) != 1)
+                continue;
+            const int client = accept4(listenFd_, nullptr, nullptr, SOCK_CLOEXEC);
+            if (client >= 0) {
+                ++accepted_;
+                held.push_back(client);  // never answered
+            }
+        }
+        for (int fd : held)
+            close(fd);
+    });
+}
+
+ConnectionCounter::~ConnectionCounter() {
+    stop_ = true;
+    thread_.join();
+    close(listenFd_);
+}
+
 std::string DaemonProgram() {
     return HARMONA_VANUAUDIOD_PATH;
 }
 
-Process StartDaemon(const char* interfaceName) {
+Process StartDaemon(const char* interfaceName, bool waitForDiscovery) {
     Process daemon =
         Spawn({DaemonProgram(), "--interface", interfaceName, "--verbose"}, "/tmp/vanuaudiod.log");
     const auto start = SteadyClock::now();
+    // The socket answers at once; discovery listens once the interface's address has its SSDP
+    // client, which its log line tells.
+    const std::string discovering =
+        "searching for media servers on " + std::string(interfaceName) + " (" + kHostAddress + ")";
+    bool answered = false;
     while (ElapsedMs(start) < 5000) {
-        if (Call(3).answered)
+        answered = answered || Call(3).answered;
+        if (answered && (!waitForDiscovery ||
+                         ReadFile("/tmp/vanuaudiod.log").find(discovering) != std::string::npos))
             return daemon;
         int status = 0;
         if (daemon.WaitExit(0, status)) {
@@ -201,9 +275,11 @@ Process StartDaemon(const char* interfaceName) {
                           << "): " << ReadFile("/tmp/vanuaudiod.log");
             return daemon;
         }
+        DrainSyslog();
         std::this_thread::sleep_for(std::chrono::milliseconds(20));
     }
-    ADD_FAILURE() << "vanuaudiod did not answer within 5 s: " << ReadFile("/tmp/vanuaudiod.log");
+    ADD_FAILURE() << "vanuaudiod did not answer (or discover) within 5 s: "
+                  << ReadFile("/tmp/vanuaudiod.log");
     return daemon;
 }
 

@@ -55,8 +55,8 @@ class Process {
 Process Spawn(const std::vector<std::string>& argv, const std::string& logPath, pid_t netnsOf = 0);
 
 // The veth link between this test's namespace (va, 10.77.0.1/24) and a second namespace held by a
-// sleeping child (vb, 10.77.0.2/24). Both ends up, IPv6 duplicate address detection off (libupnp
-// binds the link-local address at once), and a route for multicast on each side.
+// sleeping child (vb, 10.77.0.2/24). Both ends up, IPv6 duplicate address detection off (the
+// link-local address is usable at once), and a route for multicast on each side.
 class PeerNetwork {
   public:
     PeerNetwork();  // fails the test (ADD_FAILURE) when the link cannot be made
@@ -73,12 +73,40 @@ class PeerNetwork {
     bool ok_ = false;
 };
 
+// Runs a shell command (ip, ...); a failure fails the test.
+bool RunCommand(const std::string& command);
+
+// Sends one ssdp:alive NOTIFY for a MediaServer:1 device `udn` from `fromAddress` (one of this
+// host's addresses on va) to the SSDP group, with whatever `location` the test wants to forge.
+void SendNotify(const std::string& fromAddress, const std::string& udn, const std::string& location,
+                int maxAgeSeconds);
+
+// A TCP listener on `address` (an ephemeral port) that accepts and never answers, counting the
+// connections: whether anybody was made to send a request there.
+class ConnectionCounter {
+  public:
+    explicit ConnectionCounter(const std::string& address);
+    ~ConnectionCounter();
+    ConnectionCounter(const ConnectionCounter&) = delete;
+    ConnectionCounter& operator=(const ConnectionCounter&) = delete;
+    unsigned short Port() const { return port_; }
+    int Accepted() const { return accepted_; }
+
+  private:
+    int listenFd_ = -1;
+    unsigned short port_ = 0;
+    std::atomic<int> accepted_{0};
+    std::atomic<bool> stop_{false};
+    std::thread thread_;
+};
+
 // Path of the built daemon.
 std::string DaemonProgram();
 
 // Starts the built vanuaudiod on interface `interfaceName` and waits (up to 5 s) until it answers
-// on /tmp/vanuaudiod.sock. Its output goes to /tmp/vanuaudiod.log.
-Process StartDaemon(const char* interfaceName = kHostInterface);
+// on /tmp/vanuaudiod.sock and, with `waitForDiscovery`, until it listens for SSDP on 10.77.0.1.
+// Its output goes to /tmp/vanuaudiod.log.
+Process StartDaemon(const char* interfaceName = kHostInterface, bool waitForDiscovery = true);
 
 // One exchange as the CGI's daemon client makes it: connect to the daemon's socket, wait for
 // writability, write the 8196-byte record, wait for a reply within what is left of `budgetMs`

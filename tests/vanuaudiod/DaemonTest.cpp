@@ -577,3 +577,199 @@ TEST_F(Vanuaudiod, AStoppedHarmonaMediadLeavesTheListAfterItsByebye) {
     ASSERT_TRUE(after.jsonOk) << after.output;
     EXPECT_EQ(after.json["items"].size(), 0u) << after.body;
 }
+
+// What a forger on the LAN and a local user can no longer do.
+namespace {
+
+int CountOf(const std::string& text, const std::string& part) {
+    int count = 0;
+    for (std::size_t at = text.find(part); at != std::string::npos; at = text.find(part, at + 1))
+        ++count;
+    return count;
+}
+
+// Waits until the daemon's log holds `part` (the log is its standard error, a file).
+bool WaitForLog(const std::string& part, int timeoutMs) {
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(timeoutMs);
+    while (ReadFile("/tmp/vanuaudiod.log").find(part) == std::string::npos) {
+        if (std::chrono::steady_clock::now() >= deadline)
+            return false;
+        DrainSyslog();
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    }
+    return true;
+}
+
+}  // namespace
+
+TEST_F(Vanuaudiod, ANotifyPointingAtLoopbackOrAnotherHostMakesNoRequestAndListsNothing) {
+    daemon_ = StartDaemon();
+    ConnectionCounter loopback("127.0.0.1");
+    ConnectionCounter elsewhere("10.77.0.12");
+    const std::string loopbackUrl =
+        "http://127.0.0.1:" + std::to_string(loopback.Port()) + "/admin/reset";
+    const std::string elsewhereUrl =
+        "http://10.77.0.12:" + std::to_string(elsewhere.Port()) + "/d.xml";
+    SendNotify(kHostAddress, "uuid:forged-loopback", loopbackUrl, 1800);
+    SendNotify(kHostAddress, "uuid:forged-elsewhere", elsewhereUrl, 1800);
+    // A real announcement after them: once it is listed, the forged ones were heard and judged.
+    FakeMediaServers fake;
+    fake.Add("uuid:real", FakeMediaServers::DescriptionXml("uuid:real", "Real", "/cd"));
+    fake.Alive("uuid:real", 60);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return !l.empty(); }, 5000), reply));
+    std::this_thread::sleep_for(std::chrono::milliseconds(500));
+    reply = Reply(Call(16, "0 10"));
+    ASSERT_EQ(reply["list"].size(), 1u) << reply;
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:real");
+    EXPECT_EQ(loopback.Accepted(), 0);
+    EXPECT_EQ(elsewhere.Accepted(), 0);
+    const std::string log = ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_NE(log.find("description refused: uuid:forged-loopback announced by 10.77.0.1: location "
+                       "host 127.0.0.1 is not the announcing address 10.77.0.1"),
+              std::string::npos)
+        << log;
+    EXPECT_NE(log.find("description refused: uuid:forged-elsewhere announced by 10.77.0.1"),
+              std::string::npos)
+        << log;
+}
+
+TEST_F(Vanuaudiod, AThousandForgedAnnouncementsDoNotKeepARealServerOut) {
+    daemon_ = StartDaemon();
+    // Forged devices on the forger's own address, whose descriptions never come.
+    ConnectionCounter tarpit(kHostAddress);
+    for (int i = 0; i < 1024; ++i) {
+        const std::string udn = "uuid:flood-" + std::to_string(i);
+        SendNotify(kHostAddress, udn,
+                   "http://10.77.0.1:" + std::to_string(tarpit.Port()) + "/" + udn, 86400);
+        if (i % 64 == 63)
+            DrainSyslog();
+    }
+    Process minidlna = StartMiniDlna(peer_, "Survivor MiniDLNA", 8205);
+    Call(14);
+    Json::Value reply;
+    ASSERT_TRUE(ParseJson(
+        WaitForList([](const Json::Value& l) { return HasServer(l, "Survivor MiniDLNA"); }, 20000),
+        reply));
+    ASSERT_TRUE(HasServer(reply["list"], "Survivor MiniDLNA")) << reply;
+    EXPECT_EQ(reply["total"], 1);
+    // One address gets sixteen devices at most, so sixteen fetches at most reached the tarpit.
+    EXPECT_LE(tarpit.Accepted(), 16);
+    EXPECT_TRUE(WaitForLog("announces 16 devices already", 2000));
+}
+
+TEST_F(Vanuaudiod, ASocketPlantedByAnotherUserKeepsItFromStartingAndItSaysWhy) {
+    {
+        const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
+        sockaddr_un address{};
+        address.sun_family = AF_UNIX;
+        std::strcpy(address.sun_path, kSocket);
+        ASSERT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
+        close(fd);
+        ASSERT_EQ(lchown(kSocket, 12345, 12345), 0);
+    }
+    Process daemon = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/d.log");
+    int status = 0;
+    ASSERT_TRUE(daemon.WaitExit(5000, status));
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 1) << status;
+    EXPECT_NE(ReadFile("/tmp/d.log")
+                  .find("/tmp/vanuaudiod.sock is owned by uid 12345, not by the "
+                        "daemon's account; not replacing it"),
+              std::string::npos)
+        << ReadFile("/tmp/d.log");
+    struct stat info {};
+    ASSERT_EQ(lstat(kSocket, &info), 0);
+    EXPECT_EQ(info.st_uid, 12345u);
+}
+
+TEST_F(Vanuaudiod, SixHundredIdleConnectionsOfOneUserDoNotKeepTheListFromTheCgi) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    fake.Add("uuid:one", FakeMediaServers::DescriptionXml("uuid:one", "The One", "/cd"));
+    fake.Alive("uuid:one", 60);
+    WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000);
+    // Another local user opens 600 connections and sends nothing.
+    int ready[2];
+    ASSERT_EQ(pipe(ready), 0);
+    const pid_t hog = fork();
+    if (hog == 0) {
+        close(ready[0]);
+        // A user of the web server's group, so that the socket lets it in.
+        const group* web = getgrnam(harmona::paths::kDaemonSocketGroup);
+        const gid_t groups[] = {web != nullptr ? web->gr_gid : 0};
+        if (web == nullptr || setgroups(1, groups) != 0 || setgid(12345) != 0 || setuid(12345) != 0)
+            _exit(1);
+        std::vector<int> held;
+        for (int i = 0; i < 600; ++i) {
+            const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
+            sockaddr_un address{};
+            address.sun_family = AF_UNIX;
+            std::strcpy(address.sun_path, kSocket);
+            if (connect(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)) == 0)
+                held.push_back(fd);
+        }
+        const char count = held.size() >= 600 ? 'y' : 'n';
+        (void)!write(ready[1], &count, 1);
+        pause();
+        _exit(0);
+    }
+    Process hogProcess(hog);
+    close(ready[1]);
+    char connected = 0;
+    ASSERT_EQ(read(ready[0], &connected, 1), 1);
+    close(ready[0]);
+    EXPECT_EQ(connected, 'y');
+    const CgiResult refresh = RefreshMediaServers();
+    ASSERT_TRUE(refresh.jsonOk) << refresh.output;
+    ASSERT_EQ(refresh.json["items"].size(), 1u) << refresh.body;
+    EXPECT_EQ(refresh.json["items"][0]["text"], "The One");
+}
+
+TEST_F(Vanuaudiod, StartedBeforeItsInterfaceHasAnAddressItAnswersAtOnceAndFindsServersLater) {
+    ASSERT_TRUE(RunCommand("ip addr flush dev va"));
+    daemon_ = StartDaemon(kHostInterface, false);
+    const Json::Value empty = Reply(Call(16, "0 10"));
+    EXPECT_EQ(empty["success"], true);
+    EXPECT_EQ(empty["total"], 0);
+    ASSERT_TRUE(
+        RunCommand("ip addr add 10.77.0.1/24 dev va && "
+                   "ip route replace 224.0.0.0/4 dev va"));
+    ASSERT_TRUE(WaitForLog("searching for media servers on va (10.77.0.1)", 5000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    FakeMediaServers fake;
+    fake.Add("uuid:late", FakeMediaServers::DescriptionXml("uuid:late", "Late", "/cd"));
+    fake.Alive("uuid:late", 60);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
+    EXPECT_EQ(reply["list"][0]["friendly_name"], "Late");
+}
+
+// The host lacks a route for multicast: one line says so, and the searches, bound to the
+// interface, still find the servers.
+TEST_F(Vanuaudiod, WithoutAMulticastRouteOneLogLineSaysSoAndSearchesStillFindServers) {
+    ASSERT_TRUE(RunCommand("ip route del 224.0.0.0/4 dev va"));
+    FakeMediaServers fake;
+    fake.Add("uuid:quiet", FakeMediaServers::DescriptionXml("uuid:quiet", "Quiet", "/cd"));
+    fake.AnswerSearches("uuid:quiet", 60);
+    daemon_ = StartDaemon();
+    ASSERT_TRUE(WaitForLog("no multicast route", 5000)) << ReadFile("/tmp/vanuaudiod.log");
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:quiet");
+    // More searches (the scan button) do not repeat it.
+    EXPECT_TRUE(Call(14).answered);
+    std::this_thread::sleep_for(std::chrono::milliseconds(1500));
+    EXPECT_TRUE(Call(14).answered);
+    std::this_thread::sleep_for(std::chrono::milliseconds(1500));
+    DrainSyslog();
+    const std::string log = ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(CountOf(log, "no multicast route"), 1) << log;
+    EXPECT_NE(log.find("network: no multicast route (Network is unreachable): searches are sent "
+                       "on va (10.77.0.1) only"),
+              std::string::npos)
+        << log;
+}
