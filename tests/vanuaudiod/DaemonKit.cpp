@@ -332,6 +332,52 @@ Process StartMiniDlna(PeerNetwork& peer, const std::string& friendlyName, int po
                             root + "/out.log");
 }
 
+Process StartGerbera(PeerNetwork& peer, const std::string& friendlyName, int port) {
+    const std::string root = "/tmp/gerbera-" + std::to_string(port);
+    MakeDirs(root);
+    const std::vector<std::string> argv = {
+        "gerbera", "-m", root, "-f", "cfg", "-e", kPeerInterface, "-p", std::to_string(port)};
+    const std::string config = root + "/cfg/config.xml";
+    {
+        // Its first start writes a configuration of its own, which then gets our name.
+        Process first = peer.SpawnOnPeer(argv, root + "/first.log");
+        const auto start = SteadyClock::now();
+        while (!Exists(config) && ElapsedMs(start) < 10000)
+            std::this_thread::sleep_for(std::chrono::milliseconds(50));
+        std::this_thread::sleep_for(std::chrono::milliseconds(300));
+        first.Stop(SIGTERM, 5000);
+    }
+    std::string text = ReadFile(config);
+    const std::string defaultName = "<name>gerbera</name>";
+    const std::size_t at = text.find(defaultName);
+    EXPECT_NE(at, std::string::npos) << text;
+    if (at != std::string::npos)
+        text.replace(at, defaultName.size(), "<name>" + friendlyName + "</name>");
+    WriteFile(config, text);
+    return peer.SpawnOnPeer(argv, root + "/out.log");
+}
+
+Process StartRygel(PeerNetwork& peer, const std::string& friendlyName, int port) {
+    const std::string root = "/tmp/rygel-" + std::to_string(port);
+    MakeDirs(root + "/media");
+    MakeDirs(root + "/cache");
+    MakeDirs(root + "/config");
+    std::string config =
+        "[general]\nipv6=false\nenable-transcoding=false\nupnp-enabled=true\n"
+        "interface=" +
+        std::string(kPeerInterface) + "\nport=" + std::to_string(port) +
+        "\n\n[MediaExport]\nenabled=true\ntitle=" + friendlyName + "\nuris=" + root + "/media\n";
+    // Every other plugin off: the media server alone, without D-Bus or a desktop around it.
+    for (const char* plugin :
+         {"Tracker", "Tracker3", "Playbin", "GstLaunch", "External", "MPRIS", "LMS", "Ruih"})
+        config += std::string("\n[") + plugin + "]\nenabled=false\n";
+    // Its user configuration (the one that can enable and disable plugins) in a home of its own.
+    WriteFile(root + "/config/rygel.conf", config);
+    return peer.SpawnOnPeer({"env", "HOME=" + root, "XDG_CACHE_HOME=" + root + "/cache",
+                             "XDG_CONFIG_HOME=" + root + "/config", "rygel"},
+                            root + "/out.log");
+}
+
 FakeMediaServers::FakeMediaServers() {
     listenFd_ = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
     sockaddr_in address{};

@@ -130,6 +130,14 @@ std::string WaitForList(Predicate accept, int timeoutMs);
 // disappearance within seconds can only be its byebye).
 Process StartMiniDlna(PeerNetwork& peer, const std::string& friendlyName, int port);
 
+// Starts Gerbera on the peer host with its own home folder /tmp/gerbera-<port> (configuration
+// and database), HTTP on `port` (49152 or more), under `friendlyName`.
+Process StartGerbera(PeerNetwork& peer, const std::string& friendlyName, int port);
+
+// Starts Rygel's media export on the peer host with its configuration, cache and an empty media
+// folder under /tmp/rygel-<port>, HTTP on `port`, titled `friendlyName`; no other plugin.
+Process StartRygel(PeerNetwork& peer, const std::string& friendlyName, int port);
+
 // A media server played by the test: its descriptions are served over HTTP on this host (an
 // ephemeral port) and its SSDP NOTIFY datagrams are sent to the multicast group on va (looped
 // back to this host's listeners), for as many devices as the test adds. The first 16 devices

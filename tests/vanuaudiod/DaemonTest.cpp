@@ -773,3 +773,55 @@ TEST_F(Vanuaudiod, WithoutAMulticastRouteOneLogLineSaysSoAndSearchesStillFindSer
               std::string::npos)
         << log;
 }
+
+// The media servers users have beside ours, found through the real CGI and gone when they stop.
+namespace {
+
+// Runs a scan through the CGI until the server named `name` is a node (or 20 s pass); the items.
+Json::Value ScanUntilListed(const std::string& name) {
+    RefreshMediaServers();
+    WaitForList([&name](const Json::Value& l) { return HasServer(l, name); }, 20000);
+    return RefreshMediaServers().json["items"];
+}
+
+bool HasNode(const Json::Value& items, const std::string& text) {
+    for (const Json::Value& item : items) {
+        if (item["text"].asString() == text && item["pid"].asString() == "mediaserver_root")
+            return true;
+    }
+    return false;
+}
+
+}  // namespace
+
+TEST_F(Vanuaudiod, GerberaIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByebye) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    Process gerbera = StartGerbera(peer_, "Cellar Gerbera", 49494);
+    const Json::Value items = ScanUntilListed("Cellar Gerbera");
+    ASSERT_TRUE(HasNode(items, "Cellar Gerbera"))
+        << items << ReadFile("/tmp/gerbera-49494/out.log") << ReadFile("/tmp/vanuaudiod.log");
+    const Json::Value list = Reply(Call(16, "0 10"))["list"];
+    ASSERT_EQ(list.size(), 1u);
+    EXPECT_EQ(list[0]["ip"], kPeerAddress);
+    EXPECT_EQ(list[0]["control_url"].asString().rfind("http://10.77.0.2:49494/", 0), 0u) << list;
+    gerbera.Stop(SIGTERM, 10000);
+    WaitForList([](const Json::Value& l) { return l.empty(); }, 10000);
+    EXPECT_EQ(RefreshMediaServers().json["items"].size(), 0u) << ReadFile("/tmp/vanuaudiod.log");
+}
+
+TEST_F(Vanuaudiod, RygelIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByebye) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    Process rygel = StartRygel(peer_, "Porch Rygel", 49600);
+    const Json::Value items = ScanUntilListed("Porch Rygel");
+    ASSERT_TRUE(HasNode(items, "Porch Rygel"))
+        << items << ReadFile("/tmp/rygel-49600/out.log") << ReadFile("/tmp/vanuaudiod.log");
+    const Json::Value list = Reply(Call(16, "0 10"))["list"];
+    ASSERT_EQ(list.size(), 1u);
+    EXPECT_EQ(list[0]["ip"], kPeerAddress);
+    EXPECT_EQ(list[0]["control_url"].asString().rfind("http://10.77.0.2:49600/", 0), 0u) << list;
+    rygel.Stop(SIGTERM, 10000);
+    WaitForList([](const Json::Value& l) { return l.empty(); }, 10000);
+    EXPECT_EQ(RefreshMediaServers().json["items"].size(), 0u) << ReadFile("/tmp/vanuaudiod.log");
+}
