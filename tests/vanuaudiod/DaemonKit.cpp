@@ -161,7 +161,7 @@ PeerNetwork::PeerNetwork() {
           Shell("ip addr add 10.77.0.1/24 dev va && ip link set va up") &&
           // More addresses of this host, for scripted servers beyond what one address may
           // announce.
-          Shell("for n in 11 12 13 14; do ip addr add 10.77.0.$n/24 dev va; done") &&
+          Shell("for n in 11 12 13 14 15 16 17; do ip addr add 10.77.0.$n/24 dev va; done") &&
           // A route for multicast, as a LAN host has with its default route (without one the
           // daemon warns).
           Shell("ip route add 224.0.0.0/4 dev va") &&
@@ -251,8 +251,19 @@ ConnectionCounter::~ConnectionCounter() {
     close(listenFd_);
 }
 
+namespace {
+std::string& DaemonProgramPath() {
+    static std::string path = HARMONA_VANUAUDIOD_PATH;
+    return path;
+}
+}  // namespace
+
 std::string DaemonProgram() {
-    return HARMONA_VANUAUDIOD_PATH;
+    return DaemonProgramPath();
+}
+
+void UseDaemonProgram(const std::string& path) {
+    DaemonProgramPath() = path;
 }
 
 Process StartDaemon(const char* interfaceName, bool waitForDiscovery) {

@@ -100,8 +100,10 @@ class ConnectionCounter {
     std::thread thread_;
 };
 
-// Path of the built daemon.
+// Path of the built daemon (or of the one UseDaemonProgram named, for a benchmark of another
+// build).
 std::string DaemonProgram();
+void UseDaemonProgram(const std::string& path);
 
 // Starts the built vanuaudiod on interface `interfaceName` and waits (up to 5 s) until it answers
 // on /tmp/vanuaudiod.sock and, with `waitForDiscovery`, until it listens for SSDP on 10.77.0.1.
@@ -141,7 +143,7 @@ Process StartRygel(PeerNetwork& peer, const std::string& friendlyName, int port)
 // A media server played by the test: its descriptions are served over HTTP on this host (an
 // ephemeral port) and its SSDP NOTIFY datagrams are sent to the multicast group on va (looped
 // back to this host's listeners), for as many devices as the test adds. The first 16 devices
-// announce from 10.77.0.1, the next ones from the host's further addresses 10.77.0.11 to .14.
+// announce from 10.77.0.1, the next ones from the host's further addresses 10.77.0.11 to .17.
 class FakeMediaServers {
   public:
     FakeMediaServers();
