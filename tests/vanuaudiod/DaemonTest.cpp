@@ -67,6 +67,17 @@ std::string Record(int32_t command, const std::string& arguments) {
     return record;
 }
 
+// A socket file at the daemon's path, bound by a process that is gone (stale).
+bool LeaveStaleSocket() {
+    const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    std::strcpy(address.sun_path, kSocket);
+    const bool bound = bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)) == 0;
+    close(fd);
+    return bound;
+}
+
 bool HasServer(const Json::Value& list, const std::string& name) {
     for (const Json::Value& server : list) {
         if (server["friendly_name"].asString() == name)
@@ -96,15 +107,7 @@ class Vanuaudiod : public ::testing::Test {
 }  // namespace
 
 TEST_F(Vanuaudiod, SocketIsOpenToTheCgiUserAndAStaleOneIsReplaced) {
-    // A stale socket file: bound by a process that is gone.
-    {
-        const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
-        sockaddr_un address{};
-        address.sun_family = AF_UNIX;
-        std::strcpy(address.sun_path, kSocket);
-        ASSERT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
-        close(fd);
-    }
+    ASSERT_TRUE(LeaveStaleSocket());
     daemon_ = StartDaemon();
     struct stat info {};
     ASSERT_EQ(stat(kSocket, &info), 0);
@@ -660,15 +663,8 @@ TEST_F(Vanuaudiod, AThousandForgedAnnouncementsDoNotKeepARealServerOut) {
 }
 
 TEST_F(Vanuaudiod, ASocketPlantedByAnotherUserKeepsItFromStartingAndItSaysWhy) {
-    {
-        const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
-        sockaddr_un address{};
-        address.sun_family = AF_UNIX;
-        std::strcpy(address.sun_path, kSocket);
-        ASSERT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
-        close(fd);
-        ASSERT_EQ(lchown(kSocket, 12345, 12345), 0);
-    }
+    ASSERT_TRUE(LeaveStaleSocket());
+    ASSERT_EQ(lchown(kSocket, 12345, 12345), 0);
     Process daemon = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/d.log");
     int status = 0;
     ASSERT_TRUE(daemon.WaitExit(5000, status));
@@ -792,36 +788,40 @@ bool HasNode(const Json::Value& items, const std::string& text) {
     return false;
 }
 
+// A peer server started on the peer host under `name` with HTTP on `port`: listed through the
+// CGI under that name, at its own address, and gone within seconds of its stop (its byebye; its
+// max-age is far longer).
+void ExpectListedUnderItsNameAndGoneAfterItsByebye(Process& server, const std::string& name,
+                                                   int port, const std::string& serverLog) {
+    const Json::Value items = ScanUntilListed(name);
+    ASSERT_TRUE(HasNode(items, name))
+        << items << ReadFile(serverLog) << ReadFile("/tmp/vanuaudiod.log");
+    const Json::Value list = Reply(Call(16, "0 10"))["list"];
+    ASSERT_EQ(list.size(), 1u);
+    EXPECT_EQ(list[0]["ip"], kPeerAddress);
+    const std::string base = "http://10.77.0.2:" + std::to_string(port) + "/";
+    EXPECT_EQ(list[0]["control_url"].asString().rfind(base, 0), 0u) << list;
+    server.Stop(SIGTERM, 10000);
+    WaitForList([](const Json::Value& l) { return l.empty(); }, 10000);
+    EXPECT_EQ(RefreshMediaServers().json["items"].size(), 0u) << ReadFile("/tmp/vanuaudiod.log");
+}
+
 }  // namespace
 
 TEST_F(Vanuaudiod, GerberaIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByebye) {
     StandardFixture();
-    daemon_ = StartDaemon();
+    // Gerbera first: the start that writes its configuration announces it under its default
+    // name, which is no part of this test.
     Process gerbera = StartGerbera(peer_, "Cellar Gerbera", 49494);
-    const Json::Value items = ScanUntilListed("Cellar Gerbera");
-    ASSERT_TRUE(HasNode(items, "Cellar Gerbera"))
-        << items << ReadFile("/tmp/gerbera-49494/out.log") << ReadFile("/tmp/vanuaudiod.log");
-    const Json::Value list = Reply(Call(16, "0 10"))["list"];
-    ASSERT_EQ(list.size(), 1u);
-    EXPECT_EQ(list[0]["ip"], kPeerAddress);
-    EXPECT_EQ(list[0]["control_url"].asString().rfind("http://10.77.0.2:49494/", 0), 0u) << list;
-    gerbera.Stop(SIGTERM, 10000);
-    WaitForList([](const Json::Value& l) { return l.empty(); }, 10000);
-    EXPECT_EQ(RefreshMediaServers().json["items"].size(), 0u) << ReadFile("/tmp/vanuaudiod.log");
+    daemon_ = StartDaemon();
+    ExpectListedUnderItsNameAndGoneAfterItsByebye(gerbera, "Cellar Gerbera", 49494,
+                                                  "/tmp/gerbera-49494/out.log");
 }
 
 TEST_F(Vanuaudiod, RygelIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByebye) {
     StandardFixture();
     daemon_ = StartDaemon();
     Process rygel = StartRygel(peer_, "Porch Rygel", 49600);
-    const Json::Value items = ScanUntilListed("Porch Rygel");
-    ASSERT_TRUE(HasNode(items, "Porch Rygel"))
-        << items << ReadFile("/tmp/rygel-49600/out.log") << ReadFile("/tmp/vanuaudiod.log");
-    const Json::Value list = Reply(Call(16, "0 10"))["list"];
-    ASSERT_EQ(list.size(), 1u);
-    EXPECT_EQ(list[0]["ip"], kPeerAddress);
-    EXPECT_EQ(list[0]["control_url"].asString().rfind("http://10.77.0.2:49600/", 0), 0u) << list;
-    rygel.Stop(SIGTERM, 10000);
-    WaitForList([](const Json::Value& l) { return l.empty(); }, 10000);
-    EXPECT_EQ(RefreshMediaServers().json["items"].size(), 0u) << ReadFile("/tmp/vanuaudiod.log");
+    ExpectListedUnderItsNameAndGoneAfterItsByebye(rygel, "Porch Rygel", 49600,
+                                                  "/tmp/rygel-49600/out.log");
 }
