@@ -7,7 +7,7 @@ namespace harmona::gupnp {
 ContextManager::ContextManager(const char* interfaceName, Handler available, Handler unavailable)
     : available_(std::move(available)), unavailable_(std::move(unavailable)) {
     manager_ = ObjectRef<GUPnPContextManager>::Adopt(
-        gupnp_context_manager_create_full(GSSDP_UDA_VERSION_1_0, G_SOCKET_FAMILY_IPV4, 0));
+        gupnp_context_manager_create_full(GSSDP_UDA_VERSION_1_0, G_SOCKET_FAMILY_INVALID, 0));
     if (interfaceName != nullptr) {
         GUPnPContextFilter* filter = gupnp_context_manager_get_context_filter(manager_.get());
         gupnp_context_filter_add_entry(filter, interfaceName);
