@@ -496,6 +496,17 @@ TEST_F(Vanuaudiod, CommandFourteenSendsANewSearch) {
     ASSERT_EQ(reply["list"].size(), 1u);
     EXPECT_EQ(reply["list"][0]["udn"], "uuid:quiet");
     EXPECT_GT(fake.SearchesSeen(), before);
+    // And every later press of the button searches again: once the first search's repeats are
+    // over, a device that answers from now on is found only by a new search.
+    fake.Add("uuid:quieter", FakeMediaServers::DescriptionXml("uuid:quieter", "Quieter", "/cd"));
+    std::this_thread::sleep_for(std::chrono::milliseconds(3000));
+    fake.AnswerSearches("uuid:quieter", 60);
+    const int beforeSecond = fake.SearchesSeen();
+    EXPECT_EQ(Call(14).reply, "{\"success\": true}");
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 2; }, 5000), reply));
+    EXPECT_EQ(reply["list"].size(), 2u);
+    EXPECT_GT(fake.SearchesSeen(), beforeSecond);
 }
 
 // The storage server's own media server, harmona-mediad, found on the network beside MiniDLNA.
