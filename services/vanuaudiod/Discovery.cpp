@@ -115,16 +115,14 @@ class Discovery::Worker {
     }
 
     void RequestSearch() {
-        if (searchDue_)
+        if (searchTimer_.active())
             return;  // a search is due already
         const auto sinceLast =
             std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - lastSearch_);
         const guint wait = sinceLast.count() >= kSearchIntervalMs
                                ? 0
                                : kSearchIntervalMs - static_cast<guint>(sinceLast.count());
-        searchDue_ = true;
         searchTimer_ = Source::Timeout(wait, [this] {
-            searchDue_ = false;
             SearchNow();
             return false;
         });
@@ -360,7 +358,6 @@ class Discovery::Worker {
     std::deque<FetchJob> queue_;
     std::map<GUPnPContext*, std::unique_ptr<Address>> addresses_;
     Clock::time_point lastSearch_{};
-    bool searchDue_ = false;  // searchTimer_ will send one
     bool routeMissing_ = false;
     Clock::time_point refusalWindowStart_{};
     int refusalLines_ = 0;

@@ -34,6 +34,13 @@ Source Source::UnixSignal(int signalNumber, Callback callback) {
     return source;
 }
 
+bool Source::active() const {
+    if (id_ == 0)
+        return false;
+    GSource* source = g_main_context_find_source_by_id(context_, id_);
+    return source != nullptr && !g_source_is_destroyed(source);
+}
+
 void Source::Remove() {
     // A source whose callback returned false is gone already; removing it again would warn.
     if (id_ != 0) {

@@ -55,7 +55,8 @@ class Source {
     // Calls `callback` in the loop when `signalNumber` (SIGTERM, SIGINT, SIGHUP, ...) arrives.
     static Source UnixSignal(int signalNumber, Callback callback);
 
-    bool active() const { return id_ != 0; }
+    // Attached and not ended (a source whose callback returned false is no longer active).
+    bool active() const;
     void Remove();
 
   private:
