@@ -107,6 +107,35 @@ Phase Sustained(int clients, double seconds) {
     return phase;
 }
 
+// Time from a server's ssdp:alive to its appearance in command 16, for `count` new servers
+// announced one after the other (polled every millisecond).
+std::vector<double> DiscoveryTimes(FakeMediaServers& fake, int count) {
+    std::vector<double> ms;
+    for (int i = 0; i < count; ++i) {
+        const std::string udn = "uuid:first-" + std::to_string(i);
+        fake.Add(udn, FakeMediaServers::DescriptionXml(udn, "First " + std::to_string(i), "/cd"));
+        const auto start = SteadyClock::now();
+        fake.Alive(udn, 1800);
+        const auto deadline = start + std::chrono::seconds(5);
+        for (;;) {
+            Json::Value page;
+            const Exchange exchange = Call(16, "0 10");
+            if (ParseJson(exchange.reply, page) && page["total"].asInt() == i + 1) {
+                ms.push_back(
+                    std::chrono::duration<double, std::milli>(SteadyClock::now() - start).count());
+                break;
+            }
+            if (SteadyClock::now() > deadline) {
+                ms.push_back(5000);
+                break;
+            }
+            DrainSyslog();
+            std::this_thread::sleep_for(std::chrono::milliseconds(1));
+        }
+    }
+    return ms;
+}
+
 void Print(const char* name, const Phase& phase, double trivialMs) {
     const double median = Percentile(phase.ms, 0.5);
     std::printf("%-38s %8zu %10.0f %9.3f %9.3f %9.3f %7d %9.4f\n", name, phase.ms.size(),
@@ -118,14 +147,27 @@ void Print(const char* name, const Phase& phase, double trivialMs) {
 
 int main(int argc, char** argv) {
     const double seconds = argc > 1 ? std::max(0.5, std::atof(argv[1])) : 3.0;
+    // Another build's daemon (the one to compare with) instead of this build's.
+    const bool otherDaemon = argc > 2;
+    if (otherDaemon)
+        UseDaemonProgram(argv[2]);
+    std::printf("daemon: %s\n", DaemonProgram().c_str());
     EnterSandbox();
     ResetSandbox();
     PeerNetwork peer;
     if (!peer.ok())
         return 1;
-    Process daemon = StartDaemon();
+    // This build's daemon says when discovery listens; another build's may not.
+    Process daemon = StartDaemon(kHostInterface, !otherDaemon);
+    if (otherDaemon)
+        std::this_thread::sleep_for(std::chrono::seconds(1));
     FakeMediaServers fake;
-    for (int i = 0; i < 100; ++i) {
+    const std::vector<double> discovery = DiscoveryTimes(fake, 10);
+    std::printf(
+        "discovery, alive to listed in command 16 (10 servers): median %.1f ms, max %.1f "
+        "ms\n",
+        Percentile(discovery, 0.5), Percentile(discovery, 1.0));
+    for (int i = 10; i < 100; ++i) {
         const std::string udn = "uuid:bench-" + std::to_string(1000 + i);
         fake.Add(udn, FakeMediaServers::DescriptionXml(
                           udn, "Media Server " + std::to_string(1000 + i),

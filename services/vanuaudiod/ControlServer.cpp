@@ -65,22 +65,8 @@ bool ControlServer::Open(std::string& error) {
         error = "socket path too long or empty";
         return false;
     }
-    struct stat existing {};
-    if (lstat(options_.socketPath.c_str(), &existing) == 0) {
-        if (!S_ISSOCK(existing.st_mode)) {
-            error = options_.socketPath + " exists and is not a socket; not replacing it";
-            return false;
-        }
-        if (SomeoneListens(address)) {
-            error = "another daemon is listening on " + options_.socketPath;
-            return false;
-        }
-        // Stale (its daemon died): safe to replace.
-        if (unlink(options_.socketPath.c_str()) != 0 && errno != ENOENT) {
-            error = "cannot remove stale " + options_.socketPath + ": " + std::strerror(errno);
-            return false;
-        }
-    }
+    if (!ClearTheWay(address, error))
+        return false;
     listenFd_ = socket(AF_UNIX, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0);
     if (listenFd_ < 0) {
         error = std::string("socket: ") + std::strerror(errno);
@@ -101,9 +87,11 @@ bool ControlServer::Open(std::string& error) {
         socketDev_ = own.st_dev;
         socketIno_ = own.st_ino;
     }
-    if (chmod(options_.socketPath.c_str(), options_.socketMode) != 0 ||
+    // Owned by the daemon's account (which removes it at exit), in the web server's group.
+    if (lchown(options_.socketPath.c_str(), options_.socketOwner, options_.socketGroup) != 0 ||
+        chmod(options_.socketPath.c_str(), options_.socketMode) != 0 ||
         listen(listenFd_, SOMAXCONN) != 0) {
-        error = std::string("chmod/listen: ") + std::strerror(errno);
+        error = std::string("chown/chmod/listen: ") + std::strerror(errno);
         return false;
     }
     sigset_t stopSignals;
@@ -125,6 +113,35 @@ bool ControlServer::Open(std::string& error) {
             error = std::string("epoll_ctl: ") + std::strerror(errno);
             return false;
         }
+    }
+    return true;
+}
+
+bool ControlServer::ClearTheWay(const sockaddr_un& address, std::string& error) {
+    struct stat existing {};
+    if (lstat(options_.socketPath.c_str(), &existing) != 0)
+        return true;
+    if (!S_ISSOCK(existing.st_mode)) {
+        error = options_.socketPath + " exists and is not a socket; not replacing it";
+        return false;
+    }
+    // In a world-writable folder anybody may have put it there first: only a socket of the
+    // daemon's own account (or root's) is ours to replace.
+    const uid_t owner =
+        options_.socketOwner != static_cast<uid_t>(-1) ? options_.socketOwner : geteuid();
+    if (existing.st_uid != owner && existing.st_uid != 0) {
+        error = options_.socketPath + " is owned by uid " + std::to_string(existing.st_uid) +
+                ", not by the daemon's account; not replacing it";
+        return false;
+    }
+    if (SomeoneListens(address)) {
+        error = "another daemon is listening on " + options_.socketPath;
+        return false;
+    }
+    // Stale (its daemon died): safe to replace.
+    if (unlink(options_.socketPath.c_str()) != 0 && errno != ENOENT) {
+        error = "cannot remove stale " + options_.socketPath + ": " + std::strerror(errno);
+        return false;
     }
     return true;
 }
@@ -166,7 +183,8 @@ void ControlServer::Accept() {
                 syslog(LOG_ERR, "accept: %m");
             return;
         }
-        if (clients_.size() >= options_.maxClients) {
+        uid_t uid = 0;
+        if (clients_.size() >= options_.maxClients || !AdmitPeer(fd, uid)) {
             close(fd);  // overloaded: the client sees a closed connection, not a hang
             continue;
         }
@@ -179,8 +197,20 @@ void ControlServer::Accept() {
         }
         Client& client = clients_[fd];
         client.received = 0;
+        client.uid = uid;
+        ++clientsPerUser_[uid];
         client.deadline = SteadyClock::now() + std::chrono::milliseconds(options_.requestTimeoutMs);
     }
+}
+
+bool ControlServer::AdmitPeer(int fd, uid_t& uid) {
+    ucred peer{};
+    socklen_t length = sizeof(peer);
+    if (getsockopt(fd, SOL_SOCKET, SO_PEERCRED, &peer, &length) != 0)
+        return false;
+    uid = peer.uid;
+    const auto found = clientsPerUser_.find(uid);
+    return found == clientsPerUser_.end() || found->second < options_.maxClientsPerUser;
 }
 
 void ControlServer::Readable(int fd) {
@@ -236,7 +266,13 @@ void ControlServer::Finish(int fd, const std::string& reply) {
 void ControlServer::Drop(int fd) {
     epoll_ctl(epollFd_, EPOLL_CTL_DEL, fd, nullptr);
     close(fd);
-    clients_.erase(fd);
+    const auto found = clients_.find(fd);
+    if (found == clients_.end())
+        return;
+    const auto count = clientsPerUser_.find(found->second.uid);
+    if (count != clientsPerUser_.end() && --count->second == 0)
+        clientsPerUser_.erase(count);
+    clients_.erase(found);
 }
 
 void ControlServer::ExpireClients() {

@@ -5,6 +5,7 @@
 #pragma once
 
 #include <sys/types.h>
+#include <sys/un.h>
 
 #include <chrono>
 #include <functional>
@@ -18,9 +19,12 @@ namespace vanuaudiod {
 
 struct ControlServerOptions {
     std::string socketPath;
-    mode_t socketMode = 0666;      // the web server's CGI user must be able to connect
-    int requestTimeoutMs = 2000;   // to send the whole record
-    std::size_t maxClients = 512;  // more at once are closed at once (within RLIMIT_NOFILE)
+    mode_t socketMode = 0660;  // owner and group: the web server's CGI user is in the group
+    uid_t socketOwner = static_cast<uid_t>(-1);  // -1: as created
+    gid_t socketGroup = static_cast<gid_t>(-1);  // -1: as created
+    int requestTimeoutMs = 2000;                 // to send the whole record
+    std::size_t maxClients = 2048;       // more at once are closed at once (within RLIMIT_NOFILE)
+    std::size_t maxClientsPerUser = 64;  // per peer uid, so that no local user starves the CGI
 };
 
 class ControlServer {
@@ -31,8 +35,9 @@ class ControlServer {
     ControlServer(const ControlServer&) = delete;
     ControlServer& operator=(const ControlServer&) = delete;
 
-    // Creates the socket (replacing a stale one, refusing to take over a live daemon's or a file
-    // that is not a socket) and the event loop's descriptors. False with `error` set.
+    // Creates the socket (replacing a stale one of its own; refusing to take over a live daemon's,
+    // a socket of another user or a file that is not a socket) and the event loop's descriptors.
+    // False with `error` set.
     bool Open(std::string& error);
 
     // Runs until SIGTERM or SIGINT arrives (the caller blocks them in every thread first) or
@@ -45,6 +50,7 @@ class ControlServer {
         unsigned char record[kRequestSize];
         std::size_t received = 0;
         std::chrono::steady_clock::time_point deadline;
+        uid_t uid = 0;
     };
     void Accept();
     void Readable(int fd);
@@ -53,6 +59,8 @@ class ControlServer {
     void ExpireClients();
     int NextTimeoutMs() const;
     void RemoveSocketFile();
+    bool ClearTheWay(const sockaddr_un& address, std::string& error);
+    bool AdmitPeer(int fd, uid_t& uid);
 
     ServerList& servers_;
     std::function<void()> startSearch_;
@@ -64,6 +72,7 @@ class ControlServer {
     dev_t socketDev_ = 0;
     ino_t socketIno_ = 0;
     std::unordered_map<int, Client> clients_;
+    std::unordered_map<uid_t, std::size_t> clientsPerUser_;
 };
 
 }  // namespace vanuaudiod

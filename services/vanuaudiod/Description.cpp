@@ -1,14 +1,13 @@
 #include "Description.h"
 
-#include <upnp/upnp.h>
-#include <upnp/upnptools.h>
+#include <glib.h>
 #include <pugixml.hpp>
 
-#include <cstdlib>
 #include <cstring>
 
-#include "HttpGet.h"
 #include "Protocol.h"
+#include "Url.h"
+#include "gupnp/Object.h"
 
 namespace vanuaudiod {
 namespace {
@@ -45,14 +44,19 @@ void FindMediaServer(const pugi::xml_node& device, const std::string& udn, pugi:
         FindMediaServer(child, udn, first, exact, depth + 1);
 }
 
-bool UsableUrl(const std::string& url) {
-    if (url.empty() || url.size() > kMaxControlUrlBytes)
-        return false;
+// No spaces, controls, quotes or backslashes: the URL is passed on as it stands.
+bool PlainUrlText(const std::string& url) {
     for (const char c : url) {
         const auto byte = static_cast<unsigned char>(c);
         if (byte <= 0x20 || byte >= 0x7F || c == '"' || c == '\\')
             return false;
     }
+    return true;
+}
+
+bool UsableUrl(const std::string& url) {
+    if (url.empty() || url.size() > kMaxControlUrlBytes || !PlainUrlText(url))
+        return false;
     UrlParts parts;
     return SplitHttpUrl(url, parts);
 }
@@ -60,16 +64,15 @@ bool UsableUrl(const std::string& url) {
 }  // namespace
 
 std::string ResolveUrl(const std::string& base, const std::string& relative) {
-    if (relative.empty())
+    // Checked before resolution too, which would percent-encode what the device sent.
+    if (relative.empty() || relative.size() > kMaxControlUrlBytes || !PlainUrlText(relative))
         return "";
-    char* absolute = nullptr;
-    if (UpnpResolveURL2(base.c_str(), relative.c_str(), &absolute) != UPNP_E_SUCCESS ||
-        absolute == nullptr) {
-        std::free(absolute);
+    // RFC 3986 resolution by GLib; a base that is no absolute URI gives nothing.
+    const harmona::gupnp::Chars absolute(
+        g_uri_resolve_relative(base.c_str(), relative.c_str(), G_URI_FLAGS_NONE, nullptr));
+    if (!absolute)
         return "";
-    }
-    std::string resolved = absolute;
-    std::free(absolute);
+    const std::string resolved = absolute.get();
     return UsableUrl(resolved) ? resolved : "";
 }
 

@@ -1,215 +1,428 @@
 #include "Discovery.h"
 
+#include <arpa/inet.h>
+#include <libgssdp/gssdp.h>
+#include <libgupnp/gupnp.h>
+#include <netinet/in.h>
+#include <sys/socket.h>
 #include <syslog.h>
-#include <upnp/upnp.h>
-#include <upnp/upnptools.h>
+#include <unistd.h>
 
+#include <cerrno>
 #include <cstring>
+#include <deque>
+#include <map>
+#include <memory>
 
+#include "Announcement.h"
 #include "Description.h"
-#include "HttpGet.h"
-#include "Protocol.h"
-#include "upnp/ControlPoint.h"
-#include "upnp/UpnpLibrary.h"
+#include "gupnp/ContextManager.h"
+#include "gupnp/HttpFetch.h"
+#include "gupnp/MainLoop.h"
+#include "gupnp/Object.h"
+#include "gupnp/Signal.h"
 
 namespace vanuaudiod {
 namespace {
 
+using harmona::gupnp::ObjectRef;
+using harmona::gupnp::SignalConnection;
+using harmona::gupnp::Source;
+
 constexpr const char kSearchTarget[] = "urn:schemas-upnp-org:device:MediaServer:1";
-constexpr const char kMediaServerPrefix[] = "urn:schemas-upnp-org:device:MediaServer:";
-// Queued description fetches beyond this are dropped (a flood of fake announcements must not
-// grow memory); the device is fetched on a later announcement.
-constexpr std::size_t kMaxQueuedFetches = 256;
+// GSSDP's kinds of received message, as its "message-received" signal passes them.
+constexpr int kSearchAnswer = 1;
+constexpr int kNotify = 2;
 // Searches are sent at most this often: many browsers pressing the scan button at once (command
 // 14 each) must not flood the network; a request within the interval is served at its end.
-constexpr auto kSearchInterval = std::chrono::seconds(1);
-// The most devices kept at once, for the same reason.
-constexpr std::size_t kMaxKnownDevices = 1024;
+constexpr guint kSearchIntervalMs = 1000;
+// A search listens this long for answers through GSSDP's browser, whose cache is then dropped
+// (our own table holds what was found; the browser's would grow with every forged answer).
+constexpr guint kSearchWindowMs = 10000;
+// Queued description fetches beyond this are refused (a flood must not grow memory); the device
+// is fetched again on a later announcement.
+constexpr std::size_t kMaxQueuedFetches = 64;
+// Refusals are logged at most this many per window, then counted: a flood of forged NOTIFYs must
+// not flood the log.
+constexpr int kRefusalLinesPerWindow = 10;
+constexpr auto kRefusalWindow = std::chrono::seconds(10);
 
-int Trampoline(Upnp_EventType eventType, const void* event, void* cookie) {
-    static_cast<Discovery*>(cookie)->OnEvent(eventType, event);
-    return 0;
+std::string AddressText(GInetAddress* address) {
+    return harmona::gupnp::Chars(g_inet_address_to_string(address)).c_str();
 }
 
-bool Printable(const std::string& text, std::size_t maxBytes) {
-    if (text.empty() || text.size() > maxBytes)
-        return false;
-    for (const char c : text) {
-        const auto byte = static_cast<unsigned char>(c);
-        if (byte <= 0x20 || byte >= 0x7F || c == '"' || c == '\\')
-            return false;
-    }
-    return true;
+// The broadcast address of an IPv4 network ("" for IPv6 or an unknown mask).
+std::string BroadcastOf(GSSDPClient* client) {
+    GInetAddressMask* mask = gssdp_client_get_address_mask(client);
+    if (mask == nullptr)
+        return "";
+    ObjectRef<GInetAddressMask> owned = ObjectRef<GInetAddressMask>::Adopt(mask);
+    GInetAddress* network = g_inet_address_mask_get_address(mask);
+    const guint length = g_inet_address_mask_get_length(mask);
+    if (g_inet_address_get_family(network) != G_SOCKET_FAMILY_IPV4 || length > 32)
+        return "";
+    in_addr bytes{};
+    std::memcpy(&bytes, g_inet_address_to_bytes(network), 4);
+    const uint32_t hostBits = length == 32 ? 0 : (0xFFFFFFFFu >> length);
+    bytes.s_addr = htonl(ntohl(bytes.s_addr) | hostBits);
+    char text[INET_ADDRSTRLEN] = {};
+    inet_ntop(AF_INET, &bytes, text, sizeof(text));
+    return text;
 }
 
-std::string Field(const char* value) {
-    return value != nullptr ? value : "";
+// Why the host has no route for the SSDP group from `address` ("" when it has one). GSSDP
+// binds its searches to the interface, so they leave all the same; but a host without the
+// route is misconfigured for SSDP (other programs' announcements and searches fail), which the
+// log should say.
+std::string MulticastRouteProblem(GInetAddress* address) {
+    if (g_inet_address_get_family(address) != G_SOCKET_FAMILY_IPV4)
+        return "";  // IPv6 SSDP uses the link-scope group, which needs no route
+    const int fd = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, IPPROTO_UDP);
+    if (fd < 0)
+        return "";
+    sockaddr_in group{};
+    group.sin_family = AF_INET;
+    group.sin_port = htons(1900);
+    inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
+    std::string problem;
+    if (connect(fd, reinterpret_cast<sockaddr*>(&group), sizeof(group)) != 0)
+        problem = std::strerror(errno);
+    close(fd);
+    return problem;
 }
 
 }  // namespace
 
+// Everything below runs on the discovery thread.
+class Discovery::Worker {
+  public:
+    Worker(ServerList& servers, const DiscoveryOptions& options)
+        : servers_(servers),
+          options_(options),
+          fetcher_({options.fetchTimeoutMs, options.maxDescriptionBytes}),
+          contexts_(
+              options.interfaceName, [this](GUPnPContext* c) { ContextAvailable(c); },
+              [this](GUPnPContext* c) { ContextUnavailable(c); }) {
+        expiry_ = Source::Timeout(1000, [this] {
+            Expire();
+            FlushRefusalCount();
+            return true;
+        });
+        research_ = Source::Timeout(options.researchSeconds * 1000, [this] {
+            SearchNow();
+            return true;
+        });
+    }
+
+    void RequestSearch() {
+        if (searchTimer_.active())
+            return;  // a search is due already
+        const auto sinceLast =
+            std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - lastSearch_);
+        const guint wait = sinceLast.count() >= kSearchIntervalMs
+                               ? 0
+                               : kSearchIntervalMs - static_cast<guint>(sinceLast.count());
+        searchTimer_ = Source::Timeout(wait, [this] {
+            SearchNow();
+            return false;
+        });
+    }
+
+  private:
+    struct Address {
+        ObjectRef<GUPnPContext> context;
+        std::string interfaceName;
+        std::string address;
+        std::string broadcast;
+        bool linkLocal = false;
+        SignalConnection messages;
+        ObjectRef<GSSDPResourceBrowser> browser;
+        Source searchWindow;
+    };
+    struct FetchJob {
+        std::string udn;
+        std::string location;
+        std::string announcer;
+    };
+
+    void ContextAvailable(GUPnPContext* context) {
+        auto entry = std::make_unique<Address>();
+        GSSDPClient* client = GSSDP_CLIENT(context);
+        entry->context = ObjectRef<GUPnPContext>::Share(context);
+        entry->interfaceName = gssdp_client_get_interface(client);
+        GInetAddress* address = gssdp_client_get_address(client);
+        entry->address = AddressText(address);
+        entry->linkLocal = g_inet_address_get_is_link_local(address);
+        g_object_unref(address);
+        entry->broadcast = BroadcastOf(client);
+        entry->messages = SignalConnection(client, "message-received",
+                                           G_CALLBACK(&Worker::MessageReceived), this);
+        syslog(LOG_INFO, "network: searching for media servers on %s (%s)",
+               entry->interfaceName.c_str(), entry->address.c_str());
+        Address& added = *entry;
+        addresses_[context] = std::move(entry);
+        Search(added);
+    }
+
+    void ContextUnavailable(GUPnPContext* context) {
+        auto found = addresses_.find(context);
+        if (found == addresses_.end())
+            return;
+        syslog(LOG_INFO, "network: %s (%s) gone", found->second->interfaceName.c_str(),
+               found->second->address.c_str());
+        addresses_.erase(found);
+        // Another address of the network may answer differently: look again.
+        RequestSearch();
+    }
+
+    // Link-local locations are taken only on an interface that has nothing better.
+    bool InterfaceIsLinkLocalOnly(const std::string& interfaceName) const {
+        for (const auto& [context, address] : addresses_) {
+            if (address->interfaceName == interfaceName && !address->linkLocal)
+                return false;
+        }
+        return true;
+    }
+
+    void SearchNow() {
+        lastSearch_ = Clock::now();
+        for (auto& [context, address] : addresses_)
+            Search(*address);
+    }
+
+    void Search(Address& address) {
+        lastSearch_ = Clock::now();
+        CheckMulticastRoute(address);
+        // A fresh browser sends the search burst on activation; it lives for the answer window.
+        address.browser = ObjectRef<GSSDPResourceBrowser>::Adopt(
+            gssdp_resource_browser_new(GSSDP_CLIENT(address.context.get()), kSearchTarget));
+        gssdp_resource_browser_set_mx(address.browser.get(), options_.searchMxSeconds);
+        gssdp_resource_browser_set_active(address.browser.get(), TRUE);
+        Address* target = &address;
+        address.searchWindow = Source::Timeout(kSearchWindowMs, [target] {
+            target->browser.Reset();
+            return false;
+        });
+    }
+
+    // The route is the host's, not the address's: one line when it goes missing, one when it
+    // is back.
+    void CheckMulticastRoute(Address& address) {
+        GInetAddress* local = gssdp_client_get_address(GSSDP_CLIENT(address.context.get()));
+        const std::string problem = MulticastRouteProblem(local);
+        const bool ipv4 = g_inet_address_get_family(local) == G_SOCKET_FAMILY_IPV4;
+        g_object_unref(local);
+        if (!ipv4)
+            return;
+        if (!problem.empty() && !routeMissing_)
+            syslog(LOG_WARNING,
+                   "network: no multicast route (%s): searches are sent on %s (%s) only, bound "
+                   "to it; add a default route or 224.0.0.0/4 for SSDP",
+                   problem.c_str(), address.interfaceName.c_str(), address.address.c_str());
+        else if (problem.empty() && routeMissing_)
+            syslog(LOG_INFO, "network: multicast route present again");
+        routeMissing_ = !problem.empty();
+    }
+
+    static void MessageReceived(GSSDPClient* client, const char* fromIp, guint /*fromPort*/,
+                                gint type, SoupMessageHeaders* headers, gpointer data) {
+        auto* self = static_cast<Worker*>(data);
+        auto found = self->addresses_.find(reinterpret_cast<GUPnPContext*>(client));
+        if (found == self->addresses_.end() || fromIp == nullptr || headers == nullptr)
+            return;
+        if (type == kNotify || type == kSearchAnswer)
+            self->OnMessage(*found->second, fromIp, type, headers);
+    }
+
+    void OnMessage(const Address& address, const std::string& fromIp, int type,
+                   SoupMessageHeaders* headers) {
+        const bool notify = type == kNotify;
+        const Announcement announcement =
+            ReadAnnouncement(soup_message_headers_get_one(headers, notify ? "NT" : "ST"),
+                             notify ? soup_message_headers_get_one(headers, "NTS") : nullptr,
+                             soup_message_headers_get_one(headers, "USN"),
+                             soup_message_headers_get_one(headers, "LOCATION"),
+                             soup_message_headers_get_one(headers, "CACHE-CONTROL"));
+        if (announcement.kind == AnnouncementKind::kByebye)
+            Byebye(announcement.udn, fromIp);
+        else if (announcement.kind == AnnouncementKind::kAlive)
+            Alive(address, announcement, fromIp);
+    }
+
+    void Byebye(const std::string& udn, const std::string& fromIp) {
+        MediaServer gone;
+        if (servers_.Remove(udn, fromIp, gone))
+            syslog(LOG_INFO, "media server gone (byebye): \"%s\" %s at %s",
+                   gone.friendlyName.c_str(), udn.c_str(), gone.ip.c_str());
+    }
+
+    void Alive(const Address& address, const Announcement& announcement,
+               const std::string& fromIp) {
+        AnnouncerFacts facts;
+        facts.sourceAddress = fromIp;
+        facts.linkLocalAllowed = InterfaceIsLinkLocalOnly(address.interfaceName);
+        facts.interfaceBroadcast = address.broadcast;
+        const std::string refusal = RefuseLocation(announcement.location, facts);
+        if (!refusal.empty()) {
+            Refused(announcement.udn, fromIp, refusal);
+            return;
+        }
+        switch (servers_.Seen(announcement.udn, announcement.location, fromIp,
+                              announcement.maxAgeSeconds, Clock::now())) {
+            case SeenOutcome::kFetch:
+                Enqueue({announcement.udn, announcement.location, fromIp});
+                return;
+            case SeenOutcome::kAnnouncerFull:
+                Refused(announcement.udn, fromIp,
+                        "its address announces " + std::to_string(kMaxDevicesPerAnnouncer) +
+                            " devices already");
+                return;
+            case SeenOutcome::kTableFull:
+                Refused(announcement.udn, fromIp, "the device table is full");
+                return;
+            case SeenOutcome::kNothing:
+                return;
+        }
+    }
+
+    // Once a window is over: the refusals it did not log, in one line, and a fresh window.
+    void FlushRefusalCount() {
+        const auto now = Clock::now();
+        if (now - refusalWindowStart_ < kRefusalWindow)
+            return;
+        if (refusalsUnlogged_ > 0)
+            syslog(LOG_WARNING, "description refused for %d more announcement(s)",
+                   refusalsUnlogged_);
+        refusalWindowStart_ = now;
+        refusalLines_ = 0;
+        refusalsUnlogged_ = 0;
+    }
+
+    void Refused(const std::string& udn, const std::string& fromIp, const std::string& why) {
+        FlushRefusalCount();
+        if (refusalLines_ >= kRefusalLinesPerWindow) {
+            ++refusalsUnlogged_;
+            return;
+        }
+        ++refusalLines_;
+        syslog(LOG_WARNING, "description refused: %s announced by %s: %s", udn.c_str(),
+               fromIp.c_str(), why.c_str());
+    }
+
+    void Enqueue(FetchJob job) {
+        if (queue_.size() >= kMaxQueuedFetches) {
+            servers_.Described(job.udn, job.location, false, {}, Clock::now());
+            Refused(job.udn, job.announcer, "too many descriptions waiting to be fetched");
+            return;
+        }
+        queue_.push_back(std::move(job));
+        StartFetches();
+    }
+
+    void StartFetches() {
+        while (fetcher_.running() < options_.parallelFetches && !queue_.empty()) {
+            FetchJob job = std::move(queue_.front());
+            queue_.pop_front();
+            const std::string location = job.location;
+            fetcher_.Get(location, [this, job = std::move(job)](harmona::gupnp::FetchResult r) {
+                Fetched(job, r);
+                StartFetches();
+            });
+        }
+    }
+
+    void Fetched(const FetchJob& job, const harmona::gupnp::FetchResult& result) {
+        MediaServer server;
+        const bool ok =
+            result.ok && ParseDeviceDescription(result.body, job.location, job.udn, server);
+        if (!result.ok)
+            Refused(job.udn, job.announcer, "description at " + job.location + ": " + result.error);
+        else if (!ok)
+            Refused(
+                job.udn, job.announcer,
+                "description at " + job.location + " has no usable MediaServer ContentDirectory");
+        if (servers_.Described(job.udn, job.location, ok, server, Clock::now()))
+            syslog(LOG_INFO, "media server added: \"%s\" %s at %s", server.friendlyName.c_str(),
+                   job.udn.c_str(), server.ip.c_str());
+    }
+
+    void Expire() {
+        for (const MediaServer& gone : servers_.Expire(Clock::now()))
+            syslog(LOG_INFO, "media server expired: \"%s\" %s at %s", gone.friendlyName.c_str(),
+                   gone.udn.c_str(), gone.ip.c_str());
+    }
+
+    ServerList& servers_;
+    DiscoveryOptions options_;
+    harmona::gupnp::HttpFetcher fetcher_;
+    std::deque<FetchJob> queue_;
+    std::map<GUPnPContext*, std::unique_ptr<Address>> addresses_;
+    Clock::time_point lastSearch_{};
+    bool routeMissing_ = false;
+    Clock::time_point refusalWindowStart_{};
+    int refusalLines_ = 0;
+    int refusalsUnlogged_ = 0;
+    Source expiry_;
+    Source research_;
+    Source searchTimer_;
+    // Last: its handlers use everything above, and it goes first.
+    harmona::gupnp::ContextManager contexts_;
+};
+
 Discovery::Discovery(ServerList& servers, DiscoveryOptions options)
-    : servers_(servers), options_(options) {}
+    : servers_(servers),
+      options_(options),
+      context_(g_main_context_new()),
+      loop_(g_main_loop_new(context_, FALSE)) {}
 
 Discovery::~Discovery() {
     Stop();
+    g_main_loop_unref(loop_);
+    g_main_context_unref(context_);
 }
 
-bool Discovery::Start(std::string& error) {
-    library_ = std::make_unique<harmona::upnp::UpnpLibrary>(options_.interfaceName, 0);
-    if (!library_->ok()) {
-        error = "UpnpInit2: " + library_->ErrorText();
-        library_.reset();
-        return false;
+void Discovery::Start() {
+    if (!thread_.joinable())
+        thread_ = std::thread(&Discovery::Run, this);
+}
+
+void Discovery::Run() {
+    g_main_context_push_thread_default(context_);
+    {
+        Worker worker(servers_, options_);
+        worker_ = &worker;
+        g_main_loop_run(loop_);
+        worker_ = nullptr;
     }
-    controlPoint_ = std::make_unique<harmona::upnp::ControlPoint>(&Trampoline, this);
-    if (!controlPoint_->ok()) {
-        error = "UpnpRegisterClient: " + controlPoint_->ErrorText();
-        controlPoint_.reset();
-        library_.reset();
-        return false;
+    // Cancelled fetches finish on the loop: let them, so that nothing is left behind.
+    while (g_main_context_iteration(context_, FALSE)) {
     }
-    syslog(LOG_INFO, "control point on %s:%u", library_->ServerAddress().c_str(),
-           library_->ServerPort());
-    searchWanted_ = true;  // the search at start
-    scheduler_ = std::thread(&Discovery::SchedulerLoop, this);
-    for (int i = 0; i < options_.fetchThreads; ++i)
-        fetchers_.emplace_back(&Discovery::FetchLoop, this);
-    return true;
+    g_main_context_pop_thread_default(context_);
 }
 
 void Discovery::RequestSearch() {
-    std::lock_guard<std::mutex> lock(mutex_);
-    searchWanted_ = true;
-    schedulerWake_.notify_one();
+    g_main_context_invoke(
+        context_,
+        [](gpointer data) -> gboolean {
+            Worker* worker = static_cast<Discovery*>(data)->worker_;
+            if (worker != nullptr)
+                worker->RequestSearch();
+            return G_SOURCE_REMOVE;
+        },
+        this);
 }
 
 void Discovery::Stop() {
-    {
-        std::lock_guard<std::mutex> lock(mutex_);
-        stopping_ = true;
-        schedulerWake_.notify_all();
-        fetchWake_.notify_all();
-    }
-    if (scheduler_.joinable())
-        scheduler_.join();
-    for (std::thread& fetcher : fetchers_) {
-        if (fetcher.joinable())
-            fetcher.join();
-    }
-    fetchers_.clear();
-    // Unregistering waits for running callbacks; after it no callback reaches us.
-    controlPoint_.reset();
-    library_.reset();
-}
-
-void Discovery::OnEvent(int eventType, const void* event) {
-    if (event == nullptr)
+    if (!thread_.joinable())
         return;
-    switch (eventType) {
-        case UPNP_DISCOVERY_ADVERTISEMENT_ALIVE:
-        case UPNP_DISCOVERY_SEARCH_RESULT: {
-            const auto* discovery = static_cast<const UpnpDiscovery*>(event);
-            if (UpnpDiscovery_get_ErrCode(discovery) != UPNP_E_SUCCESS)
-                return;
-            const std::string type = Field(UpnpDiscovery_get_DeviceType_cstr(discovery));
-            if (type.compare(0, sizeof(kMediaServerPrefix) - 1, kMediaServerPrefix) != 0)
-                return;
-            const std::string udn = Field(UpnpDiscovery_get_DeviceID_cstr(discovery));
-            const std::string location = Field(UpnpDiscovery_get_Location_cstr(discovery));
-            UrlParts parts;
-            if (!Printable(udn, kMaxUdnBytes) || !Printable(location, kMaxControlUrlBytes) ||
-                !SplitHttpUrl(location, parts))
-                return;
-            if (servers_.KnownCount() >= kMaxKnownDevices && !servers_.Knows(udn))
-                return;
-            const int maxAge = UpnpDiscovery_get_Expires(discovery);
-            if (servers_.Seen(udn, location, maxAge, Clock::now()))
-                Enqueue({udn, location});
-            return;
-        }
-        case UPNP_DISCOVERY_ADVERTISEMENT_BYEBYE: {
-            const auto* discovery = static_cast<const UpnpDiscovery*>(event);
-            const std::string udn = Field(UpnpDiscovery_get_DeviceID_cstr(discovery));
-            if (!udn.empty())
-                servers_.Remove(udn);
-            return;
-        }
-        default:
-            return;
-    }
-}
-
-void Discovery::Enqueue(FetchJob job) {
-    std::lock_guard<std::mutex> lock(mutex_);
-    if (stopping_)
-        return;
-    if (jobs_.size() >= kMaxQueuedFetches) {
-        // Mark it failed so that a later announcement asks again.
-        servers_.Described(job.udn, job.location, false, {}, Clock::now());
-        return;
-    }
-    jobs_.push_back(std::move(job));
-    fetchWake_.notify_one();
-}
-
-void Discovery::SchedulerLoop() {
-    std::unique_lock<std::mutex> lock(mutex_);
-    Clock::time_point lastSearch{};
-    while (!stopping_) {
-        const auto now = Clock::now();
-        if (searchWanted_ && now - lastSearch >= kSearchInterval) {
-            searchWanted_ = false;
-            lastSearch = now;
-            lock.unlock();
-            // Blocks a few hundred milliseconds (libupnp repeats the datagram); the control
-            // socket's loop is not on this thread, so it keeps answering meanwhile.
-            const int rc = controlPoint_->Search(options_.searchMxSeconds, kSearchTarget, this);
-            if (rc != UPNP_E_SUCCESS)
-                syslog(LOG_ERR, "M-SEARCH failed: %s", UpnpGetErrorMessage(rc));
-            lock.lock();
-            continue;
-        }
-        // Wake at the next expiry or the next allowed search, at the latest after a second.
-        lock.unlock();
-        const int gone = servers_.Expire(Clock::now());
-        if (gone > 0)
-            syslog(LOG_INFO, "%d media server(s) expired", gone);
-        auto next = std::min(servers_.NextExpiry(), Clock::now() + std::chrono::seconds(1));
-        lock.lock();
-        if (searchWanted_)
-            next = std::min(next, lastSearch + kSearchInterval);
-        if (!stopping_)
-            schedulerWake_.wait_until(lock, next);
-    }
-}
-
-void Discovery::FetchLoop() {
-    std::unique_lock<std::mutex> lock(mutex_);
-    for (;;) {
-        fetchWake_.wait(lock, [this] { return stopping_ || !jobs_.empty(); });
-        if (stopping_)
-            return;
-        FetchJob job = std::move(jobs_.front());
-        jobs_.pop_front();
-        lock.unlock();
-        Fetch(job);
-        lock.lock();
-    }
-}
-
-void Discovery::Fetch(const FetchJob& job) {
-    const HttpResult reply =
-        HttpGet(job.location, options_.fetchTimeoutMs, options_.maxDescriptionBytes);
-    MediaServer server;
-    bool ok = reply.ok && ParseDeviceDescription(reply.body, job.location, job.udn, server);
-    if (!reply.ok)
-        syslog(LOG_ERR, "description of %s at %s: %s", job.udn.c_str(), job.location.c_str(),
-               reply.error.c_str());
-    else if (!ok)
-        syslog(LOG_ERR, "description of %s at %s: no usable MediaServer ContentDirectory",
-               job.udn.c_str(), job.location.c_str());
-    servers_.Described(job.udn, job.location, ok, server, Clock::now());
+    g_main_context_invoke(
+        context_,
+        [](gpointer data) -> gboolean {
+            g_main_loop_quit(static_cast<GMainLoop*>(data));
+            return G_SOURCE_REMOVE;
+        },
+        loop_);
+    thread_.join();
 }
 
 }  // namespace vanuaudiod

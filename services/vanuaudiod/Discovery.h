@@ -1,32 +1,28 @@
-// Finding the media servers: libupnp's control point (SSDP M-SEARCH for MediaServer devices,
-// alive and byebye notifications), the device descriptions fetched by worker threads of our own
-// (libupnp forbids SDK calls inside its callbacks, and a slow device must not hold its threads),
-// and the expiry of devices that stop announcing.
+// Finding the media servers, on its own thread and GLib main loop: GUPnP's context manager follows
+// the host's addresses as they come and go; on each, GSSDP's client hears the NOTIFYs and the
+// answers to our M-SEARCH with their source address, so that a description is fetched only from
+// the host that announced it (libsoup, bounded in time and size). Servers are dropped on their
+// byebye or when their announcement expires. Every discovery event has its log line.
 #pragma once
 
-#include <condition_variable>
-#include <deque>
-#include <memory>
-#include <mutex>
+#include <glib.h>
+
+#include <atomic>
+#include <cstddef>
 #include <string>
 #include <thread>
-#include <vector>
 
 #include "ServerList.h"
-
-namespace harmona::upnp {
-class UpnpLibrary;
-class ControlPoint;
-}  // namespace harmona::upnp
 
 namespace vanuaudiod {
 
 struct DiscoveryOptions {
-    const char* interfaceName = nullptr;  // nullptr: libupnp's first suitable interface
-    int searchMxSeconds = 2;              // MX of the M-SEARCH
-    int fetchTimeoutMs = 3000;            // whole description exchange
+    const char* interfaceName = nullptr;  // nullptr: every interface with an address
+    unsigned searchMxSeconds = 2;         // MX of the M-SEARCH
+    unsigned fetchTimeoutMs = 3000;       // whole description exchange
     std::size_t maxDescriptionBytes = 256 * 1024;
-    int fetchThreads = 2;
+    std::size_t parallelFetches = 4;
+    unsigned researchSeconds = 180;  // a new search this often, for servers whose NOTIFYs got lost
 };
 
 class Discovery {
@@ -36,42 +32,26 @@ class Discovery {
     Discovery(const Discovery&) = delete;
     Discovery& operator=(const Discovery&) = delete;
 
-    // Starts libupnp, registers the control point, starts the threads and sends the first search.
-    // False (with `error` set) when libupnp cannot start.
-    bool Start(std::string& error);
+    // Starts the discovery thread. Never fails for want of a network: searches go out on each
+    // address as it appears.
+    void Start();
 
-    // Asks for a new search soon; returns at once (the M-SEARCH is sent by the scheduler thread).
+    // Asks for a new search soon; returns at once. Safe from any thread.
     void RequestSearch();
 
-    // Stops the threads and libupnp (idempotent).
+    // Stops the thread (idempotent).
     void Stop();
 
-    // Called by libupnp's callback (public for the C trampoline only).
-    void OnEvent(int eventType, const void* event);
-
   private:
-    struct FetchJob {
-        std::string udn;
-        std::string location;
-    };
-    void SchedulerLoop();
-    void FetchLoop();
-    void Fetch(const FetchJob& job);
-    void Enqueue(FetchJob job);
+    class Worker;
+    void Run();
 
     ServerList& servers_;
     DiscoveryOptions options_;
-    std::unique_ptr<harmona::upnp::UpnpLibrary> library_;
-    std::unique_ptr<harmona::upnp::ControlPoint> controlPoint_;
-
-    std::mutex mutex_;
-    std::condition_variable schedulerWake_;
-    std::condition_variable fetchWake_;
-    bool stopping_ = false;
-    bool searchWanted_ = false;
-    std::deque<FetchJob> jobs_;
-    std::thread scheduler_;
-    std::vector<std::thread> fetchers_;
+    GMainContext* context_;
+    GMainLoop* loop_;
+    std::atomic<Worker*> worker_{nullptr};
+    std::thread thread_;
 };
 
 }  // namespace vanuaudiod

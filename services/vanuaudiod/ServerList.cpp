@@ -23,87 +23,109 @@ int SaneMaxAge(int seconds) {
 
 ServerList::ServerList() : snapshot_(std::make_shared<const std::vector<MediaServer>>()) {}
 
-bool ServerList::Seen(const std::string& udn, const std::string& location, int maxAgeSeconds,
-                      Clock::time_point now) {
+SeenOutcome ServerList::Seen(const std::string& udn, const std::string& location,
+                             const std::string& announcer, int maxAgeSeconds,
+                             Clock::time_point now) {
     std::lock_guard<std::mutex> lock(mutex_);
     const auto expiresAt = now + std::chrono::seconds(SaneMaxAge(maxAgeSeconds));
     auto found = entries_.find(udn);
     if (found == entries_.end()) {
+        if (CountFromLocked(announcer) >= kMaxDevicesPerAnnouncer)
+            return SeenOutcome::kAnnouncerFull;
+        if (entries_.size() >= kMaxKnownDevices && !EvictUndescribedLocked())
+            return SeenOutcome::kTableFull;
         Entry entry;
         entry.location = location;
-        entry.expiresAt = expiresAt;
+        entry.announcer = announcer;
+        entry.announcedUntil = expiresAt;
+        // Until its description is in, a device holds its slot only briefly.
+        entry.expiresAt = std::min(expiresAt, now + kUndescribedHold);
         entry.fetchPending = true;
         entries_.emplace(udn, std::move(entry));
-        return true;
+        return SeenOutcome::kFetch;
     }
     Entry& entry = found->second;
-    entry.expiresAt = std::max(entry.expiresAt, expiresAt);
-    if (entry.location != location) {
-        // Moved (new address or port): the old description no longer holds.
+    entry.announcedUntil = std::max(entry.announcedUntil, expiresAt);
+    if (entry.location != location || entry.announcer != announcer) {
+        // Moved (new address or port): the old description no longer holds. The new address
+        // must have room as a newcomer would.
+        if (entry.announcer != announcer && CountFromLocked(announcer) >= kMaxDevicesPerAnnouncer)
+            return SeenOutcome::kAnnouncerFull;
         const bool wasListed = entry.described;
         entry.location = location;
+        entry.announcer = announcer;
         entry.described = false;
         entry.failed = false;
         entry.fetchPending = true;
+        entry.expiresAt = std::min(expiresAt, now + kUndescribedHold);
         if (wasListed)
             RebuildSnapshotLocked();
-        return true;
+        return SeenOutcome::kFetch;
     }
-    if (entry.described || entry.fetchPending)
-        return false;
+    if (entry.described) {
+        entry.expiresAt = std::max(entry.expiresAt, expiresAt);
+        return SeenOutcome::kNothing;
+    }
+    if (entry.fetchPending)
+        return SeenOutcome::kNothing;
     if (entry.failed && now - entry.lastFailure < kRetryAfterFailure)
-        return false;
+        return SeenOutcome::kNothing;
     entry.fetchPending = true;
-    return true;
+    entry.expiresAt = std::min(expiresAt, now + kUndescribedHold);
+    return SeenOutcome::kFetch;
 }
 
-void ServerList::Described(const std::string& udn, const std::string& location, bool ok,
+bool ServerList::Described(const std::string& udn, const std::string& location, bool ok,
                            const MediaServer& server, Clock::time_point now) {
     std::lock_guard<std::mutex> lock(mutex_);
     auto found = entries_.find(udn);
     if (found == entries_.end() || found->second.location != location)
-        return;
+        return false;
     Entry& entry = found->second;
     entry.fetchPending = false;
     if (!ok) {
         entry.failed = true;
         entry.lastFailure = now;
-        return;
+        entry.expiresAt = std::min(entry.expiresAt, now + kUndescribedHold);
+        return false;
     }
     entry.failed = false;
     entry.described = true;
+    entry.expiresAt = std::max(entry.expiresAt, entry.announcedUntil);
     entry.server = server;
     entry.server.udn = udn;
     RebuildSnapshotLocked();
+    return true;
 }
 
-void ServerList::Remove(const std::string& udn) {
+bool ServerList::Remove(const std::string& udn, const std::string& announcer, MediaServer& gone) {
     std::lock_guard<std::mutex> lock(mutex_);
     auto found = entries_.find(udn);
-    if (found == entries_.end())
-        return;
+    if (found == entries_.end() || found->second.announcer != announcer)
+        return false;
     const bool wasListed = found->second.described;
+    gone = found->second.server;
     entries_.erase(found);
     if (wasListed)
         RebuildSnapshotLocked();
+    return wasListed;
 }
 
-int ServerList::Expire(Clock::time_point now) {
+std::vector<MediaServer> ServerList::Expire(Clock::time_point now) {
     std::lock_guard<std::mutex> lock(mutex_);
-    int gone = 0;
-    bool listedGone = false;
+    std::vector<MediaServer> listedGone;
     for (auto it = entries_.begin(); it != entries_.end();) {
-        if (it->second.expiresAt <= now) {
-            listedGone = listedGone || it->second.described;
+        if (it->second.expiresAt <= now && !it->second.fetchPending) {
+            if (it->second.described)
+                listedGone.push_back(it->second.server);
             it = entries_.erase(it);
-            ++gone;
         } else {
             ++it;
         }
     }
-    if (listedGone)
+    if (!listedGone.empty())
         RebuildSnapshotLocked();
-    return gone;
+    return listedGone;
 }
 
 Clock::time_point ServerList::NextExpiry() const {
@@ -127,6 +149,28 @@ bool ServerList::Knows(const std::string& udn) const {
 std::size_t ServerList::KnownCount() const {
     std::lock_guard<std::mutex> lock(mutex_);
     return entries_.size();
+}
+
+std::size_t ServerList::CountFromLocked(const std::string& announcer) const {
+    std::size_t count = 0;
+    for (const auto& [udn, entry] : entries_)
+        count += entry.announcer == announcer ? 1 : 0;
+    return count;
+}
+
+bool ServerList::EvictUndescribedLocked() {
+    auto victim = entries_.end();
+    for (auto it = entries_.begin(); it != entries_.end(); ++it) {
+        const Entry& entry = it->second;
+        if (entry.described || entry.fetchPending)
+            continue;
+        if (victim == entries_.end() || entry.lastFailure < victim->second.lastFailure)
+            victim = it;
+    }
+    if (victim == entries_.end())
+        return false;
+    entries_.erase(victim);
+    return true;
 }
 
 void ServerList::RebuildSnapshotLocked() {

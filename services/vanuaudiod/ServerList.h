@@ -1,5 +1,5 @@
-// The media servers found on the network, shared between libupnp's callback threads
-// (announcements), the description fetchers and the control socket loop (command 16). Everything is
+// The media servers found on the network, shared between the discovery thread (announcements and
+// description fetches) and the control socket loop (command 16). Everything is
 // guarded by one mutex; readers take an immutable, already sorted snapshot so that answering a page
 // never waits for discovery work and never sorts.
 #pragma once
@@ -25,26 +25,45 @@ struct MediaServer {
 
 using ServerSnapshot = std::shared_ptr<const std::vector<MediaServer>>;
 
+// What an announcement leads to.
+enum class SeenOutcome {
+    kFetch,          // fetch the description now
+    kNothing,        // known already (described, or a fetch is pending or failed lately)
+    kAnnouncerFull,  // its announcer has as many devices as one address may have
+    kTableFull,      // every slot holds a described server or a pending fetch
+};
+
+// The table's bounds: a flood of announcements may not push real servers out, nor hold slots
+// with devices that never give a valid description.
+inline constexpr std::size_t kMaxDevicesPerAnnouncer = 16;
+inline constexpr std::size_t kMaxKnownDevices = 1024;
+inline constexpr auto kUndescribedHold = std::chrono::seconds(30);
+
 class ServerList {
   public:
     ServerList();
 
-    // An announcement (alive or search answer) of device `udn` with its description at `location`,
-    // valid for `maxAgeSeconds`. Returns true when the caller should fetch the description: the
-    // device is new, moved to another location, or its last fetch failed long enough ago.
-    bool Seen(const std::string& udn, const std::string& location, int maxAgeSeconds,
-              Clock::time_point now);
+    // An announcement (alive or search answer) of device `udn`, sent from address `announcer`,
+    // with its description at `location`, valid for `maxAgeSeconds`. kFetch when the caller
+    // should fetch the description: the device is new, moved to another location, or its last
+    // fetch failed long enough ago. A new device needs a free slot: at most
+    // kMaxDevicesPerAnnouncer per announcer, kMaxKnownDevices in all, where a device without a
+    // description gives its slot up to a newcomer.
+    SeenOutcome Seen(const std::string& udn, const std::string& location,
+                     const std::string& announcer, int maxAgeSeconds, Clock::time_point now);
 
-    // The description of `udn` fetched from `location` gave `server` (ok) or could not be had.
-    // Ignored when the device left or moved meanwhile.
-    void Described(const std::string& udn, const std::string& location, bool ok,
+    // The description of `udn` fetched from `location` gave `server` (ok) or could not be had
+    // (the device then keeps its slot for kUndescribedHold at most). Ignored when the device left
+    // or moved meanwhile. True when this listed the server or changed what is listed for it.
+    bool Described(const std::string& udn, const std::string& location, bool ok,
                    const MediaServer& server, Clock::time_point now);
 
-    // The device said byebye.
-    void Remove(const std::string& udn);
+    // The device said byebye from `announcer` (a byebye from another address is somebody
+    // else's word and ignored). True with the listed server in `gone` when it was listed.
+    bool Remove(const std::string& udn, const std::string& announcer, MediaServer& gone);
 
-    // Drops the devices whose announcement expired; returns how many went.
-    int Expire(Clock::time_point now);
+    // Drops the devices whose announcement expired; returns the listed servers among them.
+    std::vector<MediaServer> Expire(Clock::time_point now);
 
     // The earliest expiry time (Clock::time_point::max() when there are no devices).
     Clock::time_point NextExpiry() const;
@@ -61,7 +80,9 @@ class ServerList {
   private:
     struct Entry {
         std::string location;
+        std::string announcer;
         Clock::time_point expiresAt;
+        Clock::time_point announcedUntil;  // what the announcements' max-age promised
         bool described = false;
         bool fetchPending = false;
         Clock::time_point lastFailure;
@@ -69,6 +90,8 @@ class ServerList {
         MediaServer server;
     };
     void RebuildSnapshotLocked();
+    std::size_t CountFromLocked(const std::string& announcer) const;
+    bool EvictUndescribedLocked();
 
     mutable std::mutex mutex_;
     std::map<std::string, Entry> entries_;

@@ -4,22 +4,26 @@
 //
 //   vanuaudiod [--interface NAME] [--socket PATH] [--verbose]
 //
-// --interface: the network interface for SSDP (default: libupnp's first suitable one; tests on a
-// private loopback use "lo"). --socket: the control socket (default /tmp/vanuaudiod.sock, the
-// platform's fixed path; other paths only for benchmarks).
+// --interface: the only network interface for SSDP (default: every interface with an address,
+// followed as addresses come and go). --socket: the control socket (default /tmp/vanuaudiod.sock,
+// the platform's fixed path; other paths only for benchmarks).
 //
 // The host needs a route for multicast (its default route, or 224.0.0.0/4 on the interface):
-// without one, libupnp's M-SEARCH fails with ENETUNREACH and servers are found only by their
+// without one, M-SEARCH cannot leave (the log says so once) and servers are found only by their
 // own announcements.
+#include <grp.h>
 #include <signal.h>
 #include <sys/resource.h>
 #include <syslog.h>
+#include <unistd.h>
 
+#include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <string>
 
 #include "ControlServer.h"
+#include "DaemonAccount.h"
 #include "Discovery.h"
 #include "PlatformPaths.h"
 #include "ServerList.h"
@@ -48,8 +52,8 @@ bool ParseArguments(int argc, char** argv, Arguments& out) {
 }
 
 // SIGTERM and SIGINT are taken through the event loop's signalfd: block them before any thread
-// (libupnp's included) starts, so that every thread inherits the mask. SIGPIPE is ignored: a
-// client that leaves early must not end the daemon.
+// (the discovery thread included) starts, so that every thread inherits the mask. SIGPIPE is
+// ignored: a client that leaves early must not end the daemon.
 void PrepareSignals() {
     sigset_t stopSignals;
     sigemptyset(&stopSignals);
@@ -66,6 +70,51 @@ void RaiseDescriptorLimit() {
         limit.rlim_cur = limit.rlim_max;
         setrlimit(RLIMIT_NOFILE, &limit);
     }
+}
+
+// Started as root, the daemon opens its socket as root (for the group and the replacement of a
+// stale socket) and then runs as its own account: nothing it does afterwards needs privileges,
+// and what it reads comes from strangers on the network.
+struct Account {
+    bool dropPrivileges = false;
+    uid_t uid = static_cast<uid_t>(-1);
+    gid_t gid = static_cast<gid_t>(-1);
+    gid_t socketGroup = static_cast<gid_t>(-1);
+};
+
+bool ChooseAccount(Account& account, std::string& error) {
+    if (geteuid() != 0)
+        return true;  // unprivileged already: socket as created
+    if (!harmona::paths::LookUpDaemonAccount(account.uid, account.gid)) {
+        error = std::string("neither account ") + harmona::paths::kDaemonUser + " nor " +
+                harmona::paths::kDaemonFallbackUser + " exists";
+        return false;
+    }
+    account.dropPrivileges = true;
+    const group* web = getgrnam(harmona::paths::kDaemonSocketGroup);
+    account.socketGroup = web != nullptr ? web->gr_gid : account.gid;
+    if (web == nullptr)
+        syslog(LOG_WARNING, "group %s does not exist; the control socket keeps group %u",
+               harmona::paths::kDaemonSocketGroup, static_cast<unsigned>(account.gid));
+    return true;
+}
+
+bool DropPrivileges(const Account& account, std::string& error) {
+    if (!account.dropPrivileges)
+        return true;
+    if (setgroups(0, nullptr) != 0 || setgid(account.gid) != 0 || setuid(account.uid) != 0) {
+        error = std::string("cannot drop privileges: ") + std::strerror(errno);
+        return false;
+    }
+    syslog(LOG_INFO, "running as uid %u gid %u", static_cast<unsigned>(account.uid),
+           static_cast<unsigned>(account.gid));
+    return true;
+}
+
+int Fail(const std::string& error) {
+    syslog(LOG_ERR, "%s", error.c_str());
+    std::fprintf(stderr, "vanuaudiod: %s\n", error.c_str());
+    return 1;
 }
 
 }  // namespace
@@ -85,23 +134,25 @@ int main(int argc, char** argv) {
     discoveryOptions.interfaceName = arguments.interfaceName;
     vanuaudiod::Discovery discovery(servers, discoveryOptions);
 
+    std::string error;
+    Account account;
+    if (!ChooseAccount(account, error))
+        return Fail(error);
     vanuaudiod::ControlServerOptions serverOptions;
     serverOptions.socketPath = arguments.socketPath;
+    serverOptions.socketOwner = account.uid;
+    serverOptions.socketGroup = account.socketGroup;
     vanuaudiod::ControlServer control(
         servers, [&discovery] { discovery.RequestSearch(); }, serverOptions);
 
-    std::string error;
-    if (!control.Open(error)) {
-        syslog(LOG_ERR, "control socket: %s", error.c_str());
-        std::fprintf(stderr, "vanuaudiod: %s\n", error.c_str());
-        return 1;
-    }
-    if (!discovery.Start(error)) {
-        syslog(LOG_ERR, "discovery: %s", error.c_str());
-        std::fprintf(stderr, "vanuaudiod: %s\n", error.c_str());
-        return 1;
-    }
+    if (!control.Open(error))
+        return Fail("control socket: " + error);
+    if (!DropPrivileges(account, error))
+        return Fail(error);
+    // Logged before discovery starts: from here on this thread logs nothing until it stops, so
+    // that a slow system log can hold up discovery but never the answers on the socket.
     syslog(LOG_INFO, "listening on %s", arguments.socketPath.c_str());
+    discovery.Start();
     control.Run();
     syslog(LOG_INFO, "stopping");
     discovery.Stop();

@@ -6,10 +6,14 @@
 #include <syslog.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <cstdio>
 #include <cstring>
 
+#include <sys/stat.h>
+
 #include "AudioDaemon.h"
+#include "DaemonAccount.h"
 #include "PlatformPaths.h"
 #include "VanuSystem.h"
 
@@ -82,6 +86,23 @@ int Exchange(int fd, const AudioDaemonRequest* request, char* reply, int replySi
 
 }  // namespace
 
+namespace {
+
+// The socket lives in world-writable /tmp: only one that root or the daemon's account made is
+// the daemon's; any other local user could have put one there to answer in its place.
+bool OwnedByTheDaemon(const char* path) {
+    struct stat info {};
+    if (lstat(path, &info) != 0 || !S_ISSOCK(info.st_mode))
+        return true;  // nothing there (or no socket): the connect fails and says so
+    if (info.st_uid == 0)
+        return true;
+    uid_t daemonUid = 0;
+    gid_t daemonGid = 0;
+    return harmona::paths::LookUpDaemonAccount(daemonUid, daemonGid) && info.st_uid == daemonUid;
+}
+
+}  // namespace
+
 int AudioDaemonConnect() {
     // Non-blocking, so that a daemon whose listen queue is full fails the connect at once
     // instead of holding the request; the exchange waits with select() anyway.
@@ -92,6 +113,13 @@ int AudioDaemonConnect() {
     std::memset(&address, 0, sizeof(address));
     address.sun_family = AF_UNIX;
     std::snprintf(address.sun_path, sizeof(address.sun_path), "%s", harmona::paths::kDaemonSocket);
+    if (!OwnedByTheDaemon(harmona::paths::kDaemonSocket)) {
+        errno = EACCES;
+        syslog(LOG_ERR, "%s:%d Failed to connect to %s. [%m]", kUnit, kLineConnectFailed,
+               harmona::paths::kDaemonSocket);
+        close(fd);
+        return -1;
+    }
     if (connect(fd, reinterpret_cast<const sockaddr*>(&address), sizeof(address)) != 0) {
         syslog(LOG_ERR, "%s:%d Failed to connect to %s. [%m]", kUnit, kLineConnectFailed,
                harmona::paths::kDaemonSocket);

@@ -113,7 +113,11 @@ int HarmonaHandler::AppendMediaServers(Json::Value& children) {
         return 0;
     Json::Value node;
     int offset = 0;
-    for (;;) {
+    // Whatever "total" the daemon claims, at most this many pages are asked for (1,000 servers,
+    // which no real network has): a daemon that lies cannot keep the request going.
+    constexpr int kMaxPages = 100;
+    int total = 0;
+    for (int page = 0; page < kMaxPages; ++page) {
         static char reply[kReplySize];  // 40 KB: kept off the stack
         if (AudioDaemonGetMediaServerList(offset, kPageSize, reply, kReplySize) != 0)
             return 0;
@@ -138,7 +142,7 @@ int HarmonaHandler::AppendMediaServers(Json::Value& children) {
                          NODE_LEAF);
             children.append(std::move(node));
         }
-        const int total = TotalOf(root);
+        total = TotalOf(root);
         // The offset would overflow past INT_MAX; no int total can be above it anyway.
         if (offset > INT_MAX - kPageSize)
             return total;
@@ -146,6 +150,7 @@ int HarmonaHandler::AppendMediaServers(Json::Value& children) {
         if (!(offset < total))
             return total;
     }
+    return total;
 }
 
 void HarmonaHandler::RefreshMediaServers() {

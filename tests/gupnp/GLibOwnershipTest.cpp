@@ -103,6 +103,8 @@ TEST(GLibOwnership, TimeoutSourceRunsUntilItsCallbackSaysStop) {
     });
     g_main_loop_run(loop);
     EXPECT_EQ(ticks, 3);
+    EXPECT_FALSE(timer.active());  // ended by its callback
+    EXPECT_TRUE(guard.active());
     timer.Remove();  // already ended by its callback: must not warn or remove another source
     guard.Remove();
     EXPECT_FALSE(guard.active());

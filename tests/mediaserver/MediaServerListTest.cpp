@@ -3,6 +3,7 @@
 // the test process (the root tree that shows it to the browser is tested in tests/tree).
 #include <gtest/gtest.h>
 #include <stdlib.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cstdio>
@@ -431,3 +432,33 @@ TEST_F(MediaServerList, RealDaemonsUnsupportedAnswerGivesNoNodes) {
 }
 
 }  // namespace
+
+// A daemon that claims a huge total is asked for 100 pages at most (1,000 servers), and the
+// request ends with those, its memory bounded.
+TEST_F(MediaServerList, AHugeTotalIsPagedAtMostAHundredTimes) {
+    const std::vector<MediaServer> ten = MakeMediaServers(10);
+    ScriptedDaemon daemon(
+        Pages([&ten](int) { return DaemonAnswer::Reply(Page(ten, Json::Value(2000000000))); }));
+    const CgiResult r = Refresh();
+    EXPECT_FALSE(r.timedOut);
+    EXPECT_EQ(PageArguments(daemon).size(), 100u);
+    EXPECT_EQ(PageArguments(daemon).back(), "990 10");
+    EXPECT_EQ(Ids(r).size(), 1000u);
+    EXPECT_LT(r.peakRssKb, 200 * 1024) << "KiB";
+}
+
+// In world-writable /tmp, a socket that neither root nor the daemon's account owns was put
+// there by somebody else: the CGI does not talk to it and logs the connect failure.
+TEST_F(MediaServerList, ASocketOwnedByAnotherUserIsRefused) {
+    ScriptedDaemon daemon(ServeMediaServers(MakeMediaServers(3)));
+    ASSERT_EQ(lchown("/tmp/vanuaudiod.sock", 12345, 12345), 0);
+    const CgiResult r = Refresh();
+    EXPECT_EQ(r.body, "{\"items\":null,\"success\":true}\n");
+    EXPECT_EQ(daemon.Connections(), 0);
+    EXPECT_EQ(r.LogMessages(),
+              std::vector<std::string>{
+                  "ctrl:27 Failed to connect to /tmp/vanuaudiod.sock. [Permission denied]"});
+    // The same socket given back to root is the daemon's again.
+    ASSERT_EQ(lchown("/tmp/vanuaudiod.sock", 0, 0), 0);
+    EXPECT_EQ(Ids(Refresh()).size(), 3u);
+}

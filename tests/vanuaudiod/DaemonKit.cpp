@@ -93,6 +93,8 @@ bool Process::WaitExit(int timeoutMs, int& status) {
         }
         if (ElapsedMs(start) >= timeoutMs)
             return false;
+        // A program that logs while it stops must not wait on the sandbox's unread log socket.
+        DrainSyslog();
         std::this_thread::sleep_for(std::chrono::milliseconds(10));
     }
 }
@@ -157,8 +159,11 @@ PeerNetwork::PeerNetwork() {
     ok_ = Shell("ip link add va type veth peer name vb netns " + peer) &&
           Shell("echo 0 > /proc/sys/net/ipv6/conf/va/accept_dad") &&
           Shell("ip addr add 10.77.0.1/24 dev va && ip link set va up") &&
-          // Multicast needs a route (a LAN host has its default route): without one, libupnp's
-          // M-SEARCH fails with ENETUNREACH.
+          // More addresses of this host, for scripted servers beyond what one address may
+          // announce.
+          Shell("for n in 11 12 13 14 15 16 17; do ip addr add 10.77.0.$n/24 dev va; done") &&
+          // A route for multicast, as a LAN host has with its default route (without one the
+          // daemon warns).
           Shell("ip route add 224.0.0.0/4 dev va") &&
           Shell("nsenter -t " + peer +
                 " -n sh -c 'echo 0 > /proc/sys/net/ipv6/conf/vb/accept_dad && ip link set lo up && "
@@ -179,16 +184,101 @@ Process PeerNetwork::SpawnOnPeer(const std::vector<std::string>& argv, const std
     return Spawn(argv, logPath, holder_.pid());
 }
 
-std::string DaemonProgram() {
-    return HARMONA_VANUAUDIOD_PATH;
+bool RunCommand(const std::string& command) {
+    return Shell(command);
 }
 
-Process StartDaemon(const char* interfaceName) {
+void SendNotify(const std::string& fromAddress, const std::string& udn, const std::string& location,
+                int maxAgeSeconds) {
+    static const std::string kType = "urn:schemas-upnp-org:device:MediaServer:1";
+    const std::string message =
+        "NOTIFY * HTTP/1.1\r\nHOST: 239.255.255.250:1900\r\nCACHE-CONTROL: "
+        "max-age=" +
+        std::to_string(maxAgeSeconds) + "\r\nLOCATION: " + location +
+        "\r\nSERVER: Linux/6 UPnP/1.0 forged/1\r\nNT: " + kType +
+        "\r\nNTS: ssdp:alive\r\nUSN: " + udn + "::" + kType + "\r\n\r\n";
+    const int fd = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    sockaddr_in local{};
+    local.sin_family = AF_INET;
+    inet_pton(AF_INET, fromAddress.c_str(), &local.sin_addr);
+    EXPECT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&local), sizeof(local)), 0) << fromAddress;
+    in_addr interfaceAddress{};
+    inet_pton(AF_INET, kHostAddress, &interfaceAddress);
+    setsockopt(fd, IPPROTO_IP, IP_MULTICAST_IF, &interfaceAddress, sizeof(interfaceAddress));
+    const unsigned char loop = 1;
+    setsockopt(fd, IPPROTO_IP, IP_MULTICAST_LOOP, &loop, sizeof(loop));
+    sockaddr_in group{};
+    group.sin_family = AF_INET;
+    group.sin_port = htons(1900);
+    inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
+    EXPECT_EQ(sendto(fd, message.data(), message.size(), 0, reinterpret_cast<sockaddr*>(&group),
+                     sizeof(group)),
+              static_cast<ssize_t>(message.size()));
+    close(fd);
+}
+
+ConnectionCounter::ConnectionCounter(const std::string& address) {
+    listenFd_ = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    sockaddr_in local{};
+    local.sin_family = AF_INET;
+    inet_pton(AF_INET, address.c_str(), &local.sin_addr);
+    EXPECT_EQ(bind(listenFd_, reinterpret_cast<sockaddr*>(&local), sizeof(local)), 0)
+        << address << ": " << std::strerror(errno);
+    socklen_t length = sizeof(local);
+    getsockname(listenFd_, reinterpret_cast<sockaddr*>(&local), &length);
+    port_ = ntohs(local.sin_port);
+    listen(listenFd_, 256);
+    thread_ = std::thread([this] {
+        std::vector<int> held;
+        while (!stop_) {
+            pollfd entry{listenFd_, POLLIN, 0};
+            if (poll(&entry, 1, 50) != 1)
+                continue;
+            const int client = accept4(listenFd_, nullptr, nullptr, SOCK_CLOEXEC);
+            if (client >= 0) {
+                ++accepted_;
+                held.push_back(client);  // never answered
+            }
+        }
+        for (int fd : held)
+            close(fd);
+    });
+}
+
+ConnectionCounter::~ConnectionCounter() {
+    stop_ = true;
+    thread_.join();
+    close(listenFd_);
+}
+
+namespace {
+std::string& DaemonProgramPath() {
+    static std::string path = HARMONA_VANUAUDIOD_PATH;
+    return path;
+}
+}  // namespace
+
+std::string DaemonProgram() {
+    return DaemonProgramPath();
+}
+
+void UseDaemonProgram(const std::string& path) {
+    DaemonProgramPath() = path;
+}
+
+Process StartDaemon(const char* interfaceName, bool waitForDiscovery) {
     Process daemon =
         Spawn({DaemonProgram(), "--interface", interfaceName, "--verbose"}, "/tmp/vanuaudiod.log");
     const auto start = SteadyClock::now();
+    // The socket answers at once; discovery listens once the interface's address has its SSDP
+    // client, which its log line tells.
+    const std::string discovering =
+        "searching for media servers on " + std::string(interfaceName) + " (" + kHostAddress + ")";
+    bool answered = false;
     while (ElapsedMs(start) < 5000) {
-        if (Call(3).answered)
+        answered = answered || Call(3).answered;
+        if (answered && (!waitForDiscovery ||
+                         ReadFile("/tmp/vanuaudiod.log").find(discovering) != std::string::npos))
             return daemon;
         int status = 0;
         if (daemon.WaitExit(0, status)) {
@@ -196,9 +286,11 @@ Process StartDaemon(const char* interfaceName) {
                           << "): " << ReadFile("/tmp/vanuaudiod.log");
             return daemon;
         }
+        DrainSyslog();
         std::this_thread::sleep_for(std::chrono::milliseconds(20));
     }
-    ADD_FAILURE() << "vanuaudiod did not answer within 5 s: " << ReadFile("/tmp/vanuaudiod.log");
+    ADD_FAILURE() << "vanuaudiod did not answer (or discover) within 5 s: "
+                  << ReadFile("/tmp/vanuaudiod.log");
     return daemon;
 }
 
@@ -251,11 +343,57 @@ Process StartMiniDlna(PeerNetwork& peer, const std::string& friendlyName, int po
                             root + "/out.log");
 }
 
+Process StartGerbera(PeerNetwork& peer, const std::string& friendlyName, int port) {
+    const std::string root = "/tmp/gerbera-" + std::to_string(port);
+    MakeDirs(root);
+    const std::vector<std::string> argv = {
+        "gerbera", "-m", root, "-f", "cfg", "-e", kPeerInterface, "-p", std::to_string(port)};
+    const std::string config = root + "/cfg/config.xml";
+    {
+        // Its first start writes a configuration of its own, which then gets our name.
+        Process first = peer.SpawnOnPeer(argv, root + "/first.log");
+        const auto start = SteadyClock::now();
+        while (!Exists(config) && ElapsedMs(start) < 10000)
+            std::this_thread::sleep_for(std::chrono::milliseconds(50));
+        std::this_thread::sleep_for(std::chrono::milliseconds(300));
+        first.Stop(SIGTERM, 5000);
+    }
+    std::string text = ReadFile(config);
+    const std::string defaultName = "<name>gerbera</name>";
+    const std::size_t at = text.find(defaultName);
+    EXPECT_NE(at, std::string::npos) << text;
+    if (at != std::string::npos)
+        text.replace(at, defaultName.size(), "<name>" + friendlyName + "</name>");
+    WriteFile(config, text);
+    return peer.SpawnOnPeer(argv, root + "/out.log");
+}
+
+Process StartRygel(PeerNetwork& peer, const std::string& friendlyName, int port) {
+    const std::string root = "/tmp/rygel-" + std::to_string(port);
+    MakeDirs(root + "/media");
+    MakeDirs(root + "/cache");
+    MakeDirs(root + "/config");
+    std::string config =
+        "[general]\nipv6=false\nenable-transcoding=false\nupnp-enabled=true\n"
+        "interface=" +
+        std::string(kPeerInterface) + "\nport=" + std::to_string(port) +
+        "\n\n[MediaExport]\nenabled=true\ntitle=" + friendlyName + "\nuris=" + root + "/media\n";
+    // Every other plugin off: the media server alone, without D-Bus or a desktop around it.
+    for (const char* plugin :
+         {"Tracker", "Tracker3", "Playbin", "GstLaunch", "External", "MPRIS", "LMS", "Ruih"})
+        config += std::string("\n[") + plugin + "]\nenabled=false\n";
+    // Its user configuration (the one that can enable and disable plugins) in a home of its own.
+    WriteFile(root + "/config/rygel.conf", config);
+    return peer.SpawnOnPeer({"env", "HOME=" + root, "XDG_CACHE_HOME=" + root + "/cache",
+                             "XDG_CONFIG_HOME=" + root + "/config", "rygel"},
+                            root + "/out.log");
+}
+
 FakeMediaServers::FakeMediaServers() {
     listenFd_ = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
     sockaddr_in address{};
     address.sin_family = AF_INET;
-    inet_pton(AF_INET, kHostAddress, &address.sin_addr);
+    address.sin_addr.s_addr = htonl(INADDR_ANY);  // every address the devices announce
     EXPECT_EQ(bind(listenFd_, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0)
         << std::strerror(errno);
     socklen_t length = sizeof(address);
@@ -263,12 +401,8 @@ FakeMediaServers::FakeMediaServers() {
     port_ = ntohs(address.sin_port);
     listen(listenFd_, 64);
 
-    udpFd_ = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
     in_addr interfaceAddress{};
     inet_pton(AF_INET, kHostAddress, &interfaceAddress);
-    setsockopt(udpFd_, IPPROTO_IP, IP_MULTICAST_IF, &interfaceAddress, sizeof(interfaceAddress));
-    const unsigned char loop = 1;
-    setsockopt(udpFd_, IPPROTO_IP, IP_MULTICAST_LOOP, &loop, sizeof(loop));
 
     ssdpFd_ = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
     const int yes = 1;
@@ -291,8 +425,35 @@ FakeMediaServers::~FakeMediaServers() {
     stop_ = true;
     thread_.join();
     close(listenFd_);
-    close(udpFd_);
+    for (const auto& [address, fd] : udpFds_)
+        close(fd);
     close(ssdpFd_);
+}
+
+int FakeMediaServers::SocketFrom(const std::string& address) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    const auto found = udpFds_.find(address);
+    if (found != udpFds_.end())
+        return found->second;
+    const int fd = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    sockaddr_in local{};
+    local.sin_family = AF_INET;
+    inet_pton(AF_INET, address.c_str(), &local.sin_addr);
+    EXPECT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&local), sizeof(local)), 0)
+        << address << ": " << std::strerror(errno);
+    in_addr interfaceAddress{};
+    inet_pton(AF_INET, kHostAddress, &interfaceAddress);
+    setsockopt(fd, IPPROTO_IP, IP_MULTICAST_IF, &interfaceAddress, sizeof(interfaceAddress));
+    const unsigned char loop = 1;
+    setsockopt(fd, IPPROTO_IP, IP_MULTICAST_LOOP, &loop, sizeof(loop));
+    udpFds_[address] = fd;
+    return fd;
+}
+
+std::string FakeMediaServers::AddressOf(const std::string& udn) const {
+    std::lock_guard<std::mutex> lock(mutex_);
+    const auto found = addresses_.find(udn);
+    return found == addresses_.end() ? kHostAddress : found->second;
 }
 
 void FakeMediaServers::AnswerSearches(const std::string& udn, int maxAgeSeconds) {
@@ -325,8 +486,8 @@ void FakeMediaServers::AnswerSearch() {
             "\r\nEXT:\r\nLOCATION: " + Location(udn) +
             "\r\nSERVER: Linux/6 UPnP/1.0 fake/1\r\nST: " + kType + "\r\nUSN: " + udn +
             "::" + kType + "\r\n\r\n";
-        sendto(udpFd_, reply.data(), reply.size(), 0, reinterpret_cast<sockaddr*>(&from),
-               fromLength);
+        sendto(SocketFrom(AddressOf(udn)), reply.data(), reply.size(), 0,
+               reinterpret_cast<sockaddr*>(&from), fromLength);
     }
 }
 
@@ -345,8 +506,14 @@ std::string FakeMediaServers::DescriptionXml(const std::string& udn,
 
 std::string FakeMediaServers::Add(const std::string& udn, const std::string& descriptionXml) {
     std::lock_guard<std::mutex> lock(mutex_);
-    const std::string path = "/" + std::to_string(paths_.size()) + ".xml";
+    const std::size_t index = paths_.size();
+    const std::string path = "/" + std::to_string(index) + ".xml";
     paths_[udn] = path;
+    // Sixteen devices per address, as one host may announce: the first on the host's own
+    // address, the next ones on its further addresses.
+    addresses_[udn] = index < kDevicesPerAddress
+                          ? kHostAddress
+                          : "10.77.0." + std::to_string(10 + index / kDevicesPerAddress);
     descriptions_[path] = descriptionXml;
     return path;
 }
@@ -354,8 +521,9 @@ std::string FakeMediaServers::Add(const std::string& udn, const std::string& des
 std::string FakeMediaServers::Location(const std::string& udn) const {
     std::lock_guard<std::mutex> lock(mutex_);
     const auto found = paths_.find(udn);
-    return "http://" + std::string(kHostAddress) + ":" + std::to_string(port_) +
-           (found == paths_.end() ? "/none.xml" : found->second);
+    const auto address = addresses_.find(udn);
+    return "http://" + (address == addresses_.end() ? kHostAddress : address->second) + ":" +
+           std::to_string(port_) + (found == paths_.end() ? "/none.xml" : found->second);
 }
 
 void FakeMediaServers::Alive(const std::string& udn, int maxAgeSeconds) {
@@ -378,8 +546,8 @@ void FakeMediaServers::Notify(const std::string& udn, const char* nts, int maxAg
     group.sin_family = AF_INET;
     group.sin_port = htons(1900);
     inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
-    EXPECT_EQ(sendto(udpFd_, message.data(), message.size(), 0, reinterpret_cast<sockaddr*>(&group),
-                     sizeof(group)),
+    EXPECT_EQ(sendto(SocketFrom(AddressOf(udn)), message.data(), message.size(), 0,
+                     reinterpret_cast<sockaddr*>(&group), sizeof(group)),
               static_cast<ssize_t>(message.size()))
         << std::strerror(errno);
 }

@@ -17,6 +17,7 @@
 #include <vector>
 
 #include "CgiRunner.h"
+#include "Sandbox.h"
 
 namespace harmona::test {
 
@@ -54,8 +55,8 @@ class Process {
 Process Spawn(const std::vector<std::string>& argv, const std::string& logPath, pid_t netnsOf = 0);
 
 // The veth link between this test's namespace (va, 10.77.0.1/24) and a second namespace held by a
-// sleeping child (vb, 10.77.0.2/24). Both ends up, IPv6 duplicate address detection off (libupnp
-// binds the link-local address at once), and a route for multicast on each side.
+// sleeping child (vb, 10.77.0.2/24). Both ends up, IPv6 duplicate address detection off (the
+// link-local address is usable at once), and a route for multicast on each side.
 class PeerNetwork {
   public:
     PeerNetwork();  // fails the test (ADD_FAILURE) when the link cannot be made
@@ -72,12 +73,42 @@ class PeerNetwork {
     bool ok_ = false;
 };
 
-// Path of the built daemon.
+// Runs a shell command (ip, ...); a failure fails the test.
+bool RunCommand(const std::string& command);
+
+// Sends one ssdp:alive NOTIFY for a MediaServer:1 device `udn` from `fromAddress` (one of this
+// host's addresses on va) to the SSDP group, with whatever `location` the test wants to forge.
+void SendNotify(const std::string& fromAddress, const std::string& udn, const std::string& location,
+                int maxAgeSeconds);
+
+// A TCP listener on `address` (an ephemeral port) that accepts and never answers, counting the
+// connections: whether anybody was made to send a request there.
+class ConnectionCounter {
+  public:
+    explicit ConnectionCounter(const std::string& address);
+    ~ConnectionCounter();
+    ConnectionCounter(const ConnectionCounter&) = delete;
+    ConnectionCounter& operator=(const ConnectionCounter&) = delete;
+    unsigned short Port() const { return port_; }
+    int Accepted() const { return accepted_; }
+
+  private:
+    int listenFd_ = -1;
+    unsigned short port_ = 0;
+    std::atomic<int> accepted_{0};
+    std::atomic<bool> stop_{false};
+    std::thread thread_;
+};
+
+// Path of the built daemon (or of the one UseDaemonProgram named, for a benchmark of another
+// build).
 std::string DaemonProgram();
+void UseDaemonProgram(const std::string& path);
 
 // Starts the built vanuaudiod on interface `interfaceName` and waits (up to 5 s) until it answers
-// on /tmp/vanuaudiod.sock. Its output goes to /tmp/vanuaudiod.log.
-Process StartDaemon(const char* interfaceName = kHostInterface);
+// on /tmp/vanuaudiod.sock and, with `waitForDiscovery`, until it listens for SSDP on 10.77.0.1.
+// Its output goes to /tmp/vanuaudiod.log.
+Process StartDaemon(const char* interfaceName = kHostInterface, bool waitForDiscovery = true);
 
 // One exchange as the CGI's daemon client makes it: connect to the daemon's socket, wait for
 // writability, write the 8196-byte record, wait for a reply within what is left of `budgetMs`
@@ -101,9 +132,18 @@ std::string WaitForList(Predicate accept, int timeoutMs);
 // disappearance within seconds can only be its byebye).
 Process StartMiniDlna(PeerNetwork& peer, const std::string& friendlyName, int port);
 
-// A media server played by the test: its descriptions are served over HTTP on this host
-// (10.77.0.1, an ephemeral port) and its SSDP NOTIFY datagrams are sent to the multicast group
-// on va (looped back to this host's listeners), for as many devices as the test adds.
+// Starts Gerbera on the peer host with its own home folder /tmp/gerbera-<port> (configuration
+// and database), HTTP on `port` (49152 or more), under `friendlyName`.
+Process StartGerbera(PeerNetwork& peer, const std::string& friendlyName, int port);
+
+// Starts Rygel's media export on the peer host with its configuration, cache and an empty media
+// folder under /tmp/rygel-<port>, HTTP on `port`, titled `friendlyName`; no other plugin.
+Process StartRygel(PeerNetwork& peer, const std::string& friendlyName, int port);
+
+// A media server played by the test: its descriptions are served over HTTP on this host (an
+// ephemeral port) and its SSDP NOTIFY datagrams are sent to the multicast group on va (looped
+// back to this host's listeners), for as many devices as the test adds. The first 16 devices
+// announce from 10.77.0.1, the next ones from the host's further addresses 10.77.0.11 to .17.
 class FakeMediaServers {
   public:
     FakeMediaServers();
@@ -132,16 +172,22 @@ class FakeMediaServers {
     void Notify(const std::string& udn, const char* nts, int maxAgeSeconds);
     void AnswerSearch();
 
+    static constexpr std::size_t kDevicesPerAddress = 16;
+    // The datagram socket that sends from `address` (made on first use).
+    int SocketFrom(const std::string& address);
+    std::string AddressOf(const std::string& udn) const;
+
     int ssdpFd_ = -1;  // bound to port 1900, member of the SSDP group on va
     std::atomic<int> searchesSeen_{0};
     std::map<std::string, int> searchAnswers_;  // udn -> max-age
 
     int listenFd_ = -1;
-    int udpFd_ = -1;
+    std::map<std::string, int> udpFds_;  // source address -> socket
     unsigned short port_ = 0;
     std::atomic<bool> stop_{false};
     mutable std::mutex mutex_;
     std::map<std::string, std::string> paths_;         // udn -> path
+    std::map<std::string, std::string> addresses_;     // udn -> address it announces from
     std::map<std::string, std::string> descriptions_;  // path -> xml
     std::thread thread_;
 };
@@ -158,6 +204,9 @@ std::string WaitForList(Predicate accept, int timeoutMs) {
             return last;
         if (std::chrono::steady_clock::now() >= deadline)
             return last;
+        // The daemon logs each server it finds; the sandbox's log socket holds only a few lines
+        // until read, and a daemon whose log is full waits for it as it would for a slow syslog.
+        DrainSyslog();
         std::this_thread::sleep_for(std::chrono::milliseconds(100));
     }
 }

@@ -1,6 +1,7 @@
 // The real vanuaudiod (platform/README.md, "Audio daemon") in the test's private network: its
 // control socket, its robustness against bad clients, its concurrency, and the discovery of real
 // (MiniDLNA) and scripted media servers over a veth link.
+#include <grp.h>
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/socket.h>
@@ -14,9 +15,10 @@
 
 #include "DMABrowse.h"
 #include "DMAParser.h"
+#include "DaemonAccount.h"
 #include "DaemonKit.h"
 #include "Fixtures.h"
-#include "HttpGet.h"
+#include "gupnp/HttpFetch.h"
 
 using namespace harmona::test;
 
@@ -65,6 +67,17 @@ std::string Record(int32_t command, const std::string& arguments) {
     return record;
 }
 
+// A socket file at the daemon's path, bound by a process that is gone (stale).
+bool LeaveStaleSocket() {
+    const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    std::strcpy(address.sun_path, kSocket);
+    const bool bound = bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)) == 0;
+    close(fd);
+    return bound;
+}
+
 bool HasServer(const Json::Value& list, const std::string& name) {
     for (const Json::Value& server : list) {
         if (server["friendly_name"].asString() == name)
@@ -94,20 +107,16 @@ class Vanuaudiod : public ::testing::Test {
 }  // namespace
 
 TEST_F(Vanuaudiod, SocketIsOpenToTheCgiUserAndAStaleOneIsReplaced) {
-    // A stale socket file: bound by a process that is gone.
-    {
-        const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
-        sockaddr_un address{};
-        address.sun_family = AF_UNIX;
-        std::strcpy(address.sun_path, kSocket);
-        ASSERT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
-        close(fd);
-    }
+    ASSERT_TRUE(LeaveStaleSocket());
     daemon_ = StartDaemon();
     struct stat info {};
     ASSERT_EQ(stat(kSocket, &info), 0);
     EXPECT_TRUE(S_ISSOCK(info.st_mode));
-    EXPECT_EQ(info.st_mode & 0777, 0666u);
+    // Owner and group only: the web server's group, whose CGI is the one client.
+    EXPECT_EQ(info.st_mode & 0777, 0660u);
+    const group* web = getgrnam(harmona::paths::kDaemonSocketGroup);
+    ASSERT_NE(web, nullptr);
+    EXPECT_EQ(info.st_gid, web->gr_gid);
     EXPECT_TRUE(Call(16, "0 10").answered);
 }
 
@@ -452,8 +461,10 @@ TEST_F(Vanuaudiod, AServerAlreadyRunningIsFoundByTheSearchAtStart) {
     // next ones are a minute away: only the daemon's own M-SEARCH can find it.
     Process minidlna = StartMiniDlna(peer_, "Early MiniDLNA", 8203);
     const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(5);
-    while (!vanuaudiod::HttpGet("http://10.77.0.2:8203/rootDesc.xml", 500, 65536).ok &&
-           std::chrono::steady_clock::now() < deadline)
+    while (
+        !harmona::gupnp::HttpFetcher::GetAndWait("http://10.77.0.2:8203/rootDesc.xml", {500, 65536})
+             .ok &&
+        std::chrono::steady_clock::now() < deadline)
         std::this_thread::sleep_for(std::chrono::milliseconds(50));
     std::this_thread::sleep_for(std::chrono::milliseconds(300));
     daemon_ = StartDaemon();
@@ -485,6 +496,17 @@ TEST_F(Vanuaudiod, CommandFourteenSendsANewSearch) {
     ASSERT_EQ(reply["list"].size(), 1u);
     EXPECT_EQ(reply["list"][0]["udn"], "uuid:quiet");
     EXPECT_GT(fake.SearchesSeen(), before);
+    // And every later press of the button searches again: once the first search's repeats are
+    // over, a device that answers from now on is found only by a new search.
+    fake.Add("uuid:quieter", FakeMediaServers::DescriptionXml("uuid:quieter", "Quieter", "/cd"));
+    std::this_thread::sleep_for(std::chrono::milliseconds(3000));
+    fake.AnswerSearches("uuid:quieter", 60);
+    const int beforeSecond = fake.SearchesSeen();
+    EXPECT_EQ(Call(14).reply, "{\"success\": true}");
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 2; }, 5000), reply));
+    EXPECT_EQ(reply["list"].size(), 2u);
+    EXPECT_GT(fake.SearchesSeen(), beforeSecond);
 }
 
 // The storage server's own media server, harmona-mediad, found on the network beside MiniDLNA.
@@ -568,4 +590,249 @@ TEST_F(Vanuaudiod, AStoppedHarmonaMediadLeavesTheListAfterItsByebye) {
     const CgiResult after = RefreshMediaServers();
     ASSERT_TRUE(after.jsonOk) << after.output;
     EXPECT_EQ(after.json["items"].size(), 0u) << after.body;
+}
+
+// What a forger on the LAN and a local user can no longer do.
+namespace {
+
+int CountOf(const std::string& text, const std::string& part) {
+    int count = 0;
+    for (std::size_t at = text.find(part); at != std::string::npos; at = text.find(part, at + 1))
+        ++count;
+    return count;
+}
+
+// Waits until the daemon's log holds `part` (the log is its standard error, a file).
+bool WaitForLog(const std::string& part, int timeoutMs) {
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(timeoutMs);
+    while (ReadFile("/tmp/vanuaudiod.log").find(part) == std::string::npos) {
+        if (std::chrono::steady_clock::now() >= deadline)
+            return false;
+        DrainSyslog();
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    }
+    return true;
+}
+
+}  // namespace
+
+TEST_F(Vanuaudiod, ANotifyPointingAtLoopbackOrAnotherHostMakesNoRequestAndListsNothing) {
+    daemon_ = StartDaemon();
+    ConnectionCounter loopback("127.0.0.1");
+    ConnectionCounter elsewhere("10.77.0.12");
+    const std::string loopbackUrl =
+        "http://127.0.0.1:" + std::to_string(loopback.Port()) + "/admin/reset";
+    const std::string elsewhereUrl =
+        "http://10.77.0.12:" + std::to_string(elsewhere.Port()) + "/d.xml";
+    SendNotify(kHostAddress, "uuid:forged-loopback", loopbackUrl, 1800);
+    SendNotify(kHostAddress, "uuid:forged-elsewhere", elsewhereUrl, 1800);
+    // A real announcement after them: once it is listed, the forged ones were heard and judged.
+    FakeMediaServers fake;
+    fake.Add("uuid:real", FakeMediaServers::DescriptionXml("uuid:real", "Real", "/cd"));
+    fake.Alive("uuid:real", 60);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return !l.empty(); }, 5000), reply));
+    std::this_thread::sleep_for(std::chrono::milliseconds(500));
+    reply = Reply(Call(16, "0 10"));
+    ASSERT_EQ(reply["list"].size(), 1u) << reply;
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:real");
+    EXPECT_EQ(loopback.Accepted(), 0);
+    EXPECT_EQ(elsewhere.Accepted(), 0);
+    const std::string log = ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_NE(log.find("description refused: uuid:forged-loopback announced by 10.77.0.1: location "
+                       "host 127.0.0.1 is not the announcing address 10.77.0.1"),
+              std::string::npos)
+        << log;
+    EXPECT_NE(log.find("description refused: uuid:forged-elsewhere announced by 10.77.0.1"),
+              std::string::npos)
+        << log;
+}
+
+TEST_F(Vanuaudiod, AThousandForgedAnnouncementsDoNotKeepARealServerOut) {
+    daemon_ = StartDaemon();
+    // Forged devices on the forger's own address, whose descriptions never come.
+    ConnectionCounter tarpit(kHostAddress);
+    for (int i = 0; i < 1024; ++i) {
+        const std::string udn = "uuid:flood-" + std::to_string(i);
+        SendNotify(kHostAddress, udn,
+                   "http://10.77.0.1:" + std::to_string(tarpit.Port()) + "/" + udn, 86400);
+        if (i % 64 == 63)
+            DrainSyslog();
+    }
+    Process minidlna = StartMiniDlna(peer_, "Survivor MiniDLNA", 8205);
+    Call(14);
+    Json::Value reply;
+    ASSERT_TRUE(ParseJson(
+        WaitForList([](const Json::Value& l) { return HasServer(l, "Survivor MiniDLNA"); }, 20000),
+        reply));
+    ASSERT_TRUE(HasServer(reply["list"], "Survivor MiniDLNA")) << reply;
+    EXPECT_EQ(reply["total"], 1);
+    // One address gets sixteen devices at most, so sixteen fetches at most reached the tarpit.
+    EXPECT_LE(tarpit.Accepted(), 16);
+    EXPECT_TRUE(WaitForLog("announces 16 devices already", 2000));
+}
+
+TEST_F(Vanuaudiod, ASocketPlantedByAnotherUserKeepsItFromStartingAndItSaysWhy) {
+    ASSERT_TRUE(LeaveStaleSocket());
+    ASSERT_EQ(lchown(kSocket, 12345, 12345), 0);
+    Process daemon = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/d.log");
+    int status = 0;
+    ASSERT_TRUE(daemon.WaitExit(5000, status));
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 1) << status;
+    EXPECT_NE(ReadFile("/tmp/d.log")
+                  .find("/tmp/vanuaudiod.sock is owned by uid 12345, not by the "
+                        "daemon's account; not replacing it"),
+              std::string::npos)
+        << ReadFile("/tmp/d.log");
+    struct stat info {};
+    ASSERT_EQ(lstat(kSocket, &info), 0);
+    EXPECT_EQ(info.st_uid, 12345u);
+}
+
+TEST_F(Vanuaudiod, SixHundredIdleConnectionsOfOneUserDoNotKeepTheListFromTheCgi) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    fake.Add("uuid:one", FakeMediaServers::DescriptionXml("uuid:one", "The One", "/cd"));
+    fake.Alive("uuid:one", 60);
+    WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000);
+    // Another local user opens 600 connections and sends nothing.
+    int ready[2];
+    ASSERT_EQ(pipe(ready), 0);
+    const pid_t hog = fork();
+    if (hog == 0) {
+        close(ready[0]);
+        // A user of the web server's group, so that the socket lets it in.
+        const group* web = getgrnam(harmona::paths::kDaemonSocketGroup);
+        const gid_t groups[] = {web != nullptr ? web->gr_gid : 0};
+        if (web == nullptr || setgroups(1, groups) != 0 || setgid(12345) != 0 || setuid(12345) != 0)
+            _exit(1);
+        std::vector<int> held;
+        for (int i = 0; i < 600; ++i) {
+            const int fd = socket(AF_UNIX, SOCK_STREAM, 0);
+            sockaddr_un address{};
+            address.sun_family = AF_UNIX;
+            std::strcpy(address.sun_path, kSocket);
+            if (connect(fd, reinterpret_cast<sockaddr*>(&address), sizeof(address)) == 0)
+                held.push_back(fd);
+        }
+        const char count = held.size() >= 600 ? 'y' : 'n';
+        (void)!write(ready[1], &count, 1);
+        pause();
+        _exit(0);
+    }
+    Process hogProcess(hog);
+    close(ready[1]);
+    char connected = 0;
+    ASSERT_EQ(read(ready[0], &connected, 1), 1);
+    close(ready[0]);
+    EXPECT_EQ(connected, 'y');
+    const CgiResult refresh = RefreshMediaServers();
+    ASSERT_TRUE(refresh.jsonOk) << refresh.output;
+    ASSERT_EQ(refresh.json["items"].size(), 1u) << refresh.body;
+    EXPECT_EQ(refresh.json["items"][0]["text"], "The One");
+}
+
+TEST_F(Vanuaudiod, StartedBeforeItsInterfaceHasAnAddressItAnswersAtOnceAndFindsServersLater) {
+    ASSERT_TRUE(RunCommand("ip addr flush dev va"));
+    daemon_ = StartDaemon(kHostInterface, false);
+    const Json::Value empty = Reply(Call(16, "0 10"));
+    EXPECT_EQ(empty["success"], true);
+    EXPECT_EQ(empty["total"], 0);
+    ASSERT_TRUE(
+        RunCommand("ip addr add 10.77.0.1/24 dev va && "
+                   "ip route replace 224.0.0.0/4 dev va"));
+    ASSERT_TRUE(WaitForLog("searching for media servers on va (10.77.0.1)", 5000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    FakeMediaServers fake;
+    fake.Add("uuid:late", FakeMediaServers::DescriptionXml("uuid:late", "Late", "/cd"));
+    fake.Alive("uuid:late", 60);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
+    EXPECT_EQ(reply["list"][0]["friendly_name"], "Late");
+}
+
+// The host lacks a route for multicast: one line says so, and the searches, bound to the
+// interface, still find the servers.
+TEST_F(Vanuaudiod, WithoutAMulticastRouteOneLogLineSaysSoAndSearchesStillFindServers) {
+    ASSERT_TRUE(RunCommand("ip route del 224.0.0.0/4 dev va"));
+    FakeMediaServers fake;
+    fake.Add("uuid:quiet", FakeMediaServers::DescriptionXml("uuid:quiet", "Quiet", "/cd"));
+    fake.AnswerSearches("uuid:quiet", 60);
+    daemon_ = StartDaemon();
+    ASSERT_TRUE(WaitForLog("no multicast route", 5000)) << ReadFile("/tmp/vanuaudiod.log");
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:quiet");
+    // More searches (the scan button) do not repeat it.
+    EXPECT_TRUE(Call(14).answered);
+    std::this_thread::sleep_for(std::chrono::milliseconds(1500));
+    EXPECT_TRUE(Call(14).answered);
+    std::this_thread::sleep_for(std::chrono::milliseconds(1500));
+    DrainSyslog();
+    const std::string log = ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(CountOf(log, "no multicast route"), 1) << log;
+    EXPECT_NE(log.find("network: no multicast route (Network is unreachable): searches are sent "
+                       "on va (10.77.0.1) only"),
+              std::string::npos)
+        << log;
+}
+
+// The media servers users have beside ours, found through the real CGI and gone when they stop.
+namespace {
+
+// Runs a scan through the CGI until the server named `name` is a node (or 20 s pass); the items.
+Json::Value ScanUntilListed(const std::string& name) {
+    RefreshMediaServers();
+    WaitForList([&name](const Json::Value& l) { return HasServer(l, name); }, 20000);
+    return RefreshMediaServers().json["items"];
+}
+
+bool HasNode(const Json::Value& items, const std::string& text) {
+    for (const Json::Value& item : items) {
+        if (item["text"].asString() == text && item["pid"].asString() == "mediaserver_root")
+            return true;
+    }
+    return false;
+}
+
+// A peer server started on the peer host under `name` with HTTP on `port`: listed through the
+// CGI under that name, at its own address, and gone within seconds of its stop (its byebye; its
+// max-age is far longer).
+void ExpectListedUnderItsNameAndGoneAfterItsByebye(Process& server, const std::string& name,
+                                                   int port, const std::string& serverLog) {
+    const Json::Value items = ScanUntilListed(name);
+    ASSERT_TRUE(HasNode(items, name))
+        << items << ReadFile(serverLog) << ReadFile("/tmp/vanuaudiod.log");
+    const Json::Value list = Reply(Call(16, "0 10"))["list"];
+    ASSERT_EQ(list.size(), 1u);
+    EXPECT_EQ(list[0]["ip"], kPeerAddress);
+    const std::string base = "http://10.77.0.2:" + std::to_string(port) + "/";
+    EXPECT_EQ(list[0]["control_url"].asString().rfind(base, 0), 0u) << list;
+    server.Stop(SIGTERM, 10000);
+    WaitForList([](const Json::Value& l) { return l.empty(); }, 10000);
+    EXPECT_EQ(RefreshMediaServers().json["items"].size(), 0u) << ReadFile("/tmp/vanuaudiod.log");
+}
+
+}  // namespace
+
+TEST_F(Vanuaudiod, GerberaIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByebye) {
+    StandardFixture();
+    // Gerbera first: the start that writes its configuration announces it under its default
+    // name, which is no part of this test.
+    Process gerbera = StartGerbera(peer_, "Cellar Gerbera", 49494);
+    daemon_ = StartDaemon();
+    ExpectListedUnderItsNameAndGoneAfterItsByebye(gerbera, "Cellar Gerbera", 49494,
+                                                  "/tmp/gerbera-49494/out.log");
+}
+
+TEST_F(Vanuaudiod, RygelIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByebye) {
+    StandardFixture();
+    daemon_ = StartDaemon();
+    Process rygel = StartRygel(peer_, "Porch Rygel", 49600);
+    ExpectListedUnderItsNameAndGoneAfterItsByebye(rygel, "Porch Rygel", 49600,
+                                                  "/tmp/rygel-49600/out.log");
 }

@@ -12,7 +12,8 @@
 #include <thread>
 
 #include "Description.h"
-#include "HttpGet.h"
+#include "Url.h"
+#include "gupnp/HttpFetch.h"
 
 using namespace vanuaudiod;
 
@@ -154,49 +155,65 @@ TEST(Vanuaudiod_Description, HostOfUrlHandlesPortsAndIpv6) {
     EXPECT_EQ(HostOfUrl("http://10.0.0.1:99999/x"), "");
 }
 
-TEST(Vanuaudiod_HttpGet, FetchesAWholeBody) {
+namespace {
+
+harmona::gupnp::FetchResult Fetch(const std::string& url, unsigned timeoutMs, std::size_t maxBody) {
+    return harmona::gupnp::HttpFetcher::GetAndWait(url, {timeoutMs, maxBody});
+}
+
+}  // namespace
+
+TEST(Vanuaudiod_DescriptionFetch, FetchesAWholeBody) {
     OneShotServer server("HTTP/1.1 200 OK\r\nContent-Length: 5\r\n\r\nhello");
-    const HttpResult r = HttpGet(server.Url("/d.xml"), 2000, 1024);
+    const auto r = Fetch(server.Url("/d.xml"), 2000, 1024);
     ASSERT_TRUE(r.ok) << r.error;
     EXPECT_EQ(r.body, "hello");
 }
 
-TEST(Vanuaudiod_HttpGet, DecodesChunkedBodies) {
+TEST(Vanuaudiod_DescriptionFetch, DecodesChunkedBodies) {
     OneShotServer server(
         "HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n3\r\nabc\r\n2\r\nde\r\n0\r\n\r\n");
-    const HttpResult r = HttpGet(server.Url("/"), 2000, 1024);
+    const auto r = Fetch(server.Url("/"), 2000, 1024);
     ASSERT_TRUE(r.ok) << r.error;
     EXPECT_EQ(r.body, "abcde");
 }
 
-TEST(Vanuaudiod_HttpGet, RefusesBodiesOverTheBound) {
+TEST(Vanuaudiod_DescriptionFetch, RefusesBodiesOverTheBound) {
     OneShotServer server("HTTP/1.0 200 OK\r\n\r\n" + std::string(5000, 'x'));
-    const HttpResult r = HttpGet(server.Url("/"), 2000, 1000);
+    const auto r = Fetch(server.Url("/"), 2000, 1000);
     EXPECT_FALSE(r.ok);
+    EXPECT_NE(r.error.find("longer than 1000"), std::string::npos) << r.error;
 }
 
-TEST(Vanuaudiod_HttpGet, RefusesOtherStatusesAndTruncatedBodies) {
+TEST(Vanuaudiod_DescriptionFetch, RefusesOtherStatusesRedirectsAndTruncatedBodies) {
     {
         OneShotServer server("HTTP/1.1 404 Not Found\r\nContent-Length: 0\r\n\r\n");
-        EXPECT_FALSE(HttpGet(server.Url("/"), 2000, 1000).ok);
+        EXPECT_FALSE(Fetch(server.Url("/"), 2000, 1000).ok);
+    }
+    {
+        OneShotServer server(
+            "HTTP/1.1 302 Found\r\nLocation: http://127.0.0.1:1/\r\n"
+            "Content-Length: 0\r\n\r\n");
+        const auto r = Fetch(server.Url("/"), 2000, 1000);
+        EXPECT_FALSE(r.ok);
+        EXPECT_EQ(r.status, 302u);
     }
     {
         OneShotServer server("HTTP/1.1 200 OK\r\nContent-Length: 50\r\n\r\nshort");
-        EXPECT_FALSE(HttpGet(server.Url("/"), 2000, 1000).ok);
+        EXPECT_FALSE(Fetch(server.Url("/"), 2000, 1000).ok);
     }
 }
 
-TEST(Vanuaudiod_HttpGet, GivesUpAtItsTimeLimit) {
+TEST(Vanuaudiod_DescriptionFetch, GivesUpAtItsTimeLimit) {
     OneShotServer server("", 0, true);
     const auto start = std::chrono::steady_clock::now();
-    const HttpResult r = HttpGet(server.Url("/"), 300, 1000);
+    const auto r = Fetch(server.Url("/"), 300, 1000);
     const auto took = std::chrono::steady_clock::now() - start;
     EXPECT_FALSE(r.ok);
     EXPECT_LT(took, std::chrono::milliseconds(1200));
 }
 
-TEST(Vanuaudiod_HttpGet, RefusesNamesAndOtherSchemes) {
-    EXPECT_FALSE(HttpGet("http://localhost:1/", 300, 10).ok);
-    EXPECT_FALSE(HttpGet("https://127.0.0.1:1/", 300, 10).ok);
-    EXPECT_FALSE(HttpGet("http://127.0.0.1:1/", 300, 10).ok);  // refused connection
+TEST(Vanuaudiod_DescriptionFetch, RefusedConnectionsAndOtherSchemesFail) {
+    EXPECT_FALSE(Fetch("ftp://127.0.0.1:1/", 300, 10).ok);
+    EXPECT_FALSE(Fetch("http://127.0.0.1:1/", 300, 10).ok);  // refused connection
 }

@@ -11,11 +11,24 @@ MediaServer Described(const std::string& name) {
     return {"", name, "http://10.0.0.1/cd", "10.0.0.1"};
 }
 
+constexpr const char* kAnnouncer = "10.0.0.1";
+
+// An announcement from kAnnouncer; true when it asks for a fetch.
+bool Seen(ServerList& list, const std::string& udn, const std::string& location, int maxAge,
+          Clock::time_point now) {
+    return list.Seen(udn, location, kAnnouncer, maxAge, now) == SeenOutcome::kFetch;
+}
+
 void Add(ServerList& list, const std::string& udn, const std::string& name, int maxAge,
          Clock::time_point now) {
     const std::string location = "http://10.0.0.1/" + udn;
-    if (list.Seen(udn, location, maxAge, now))
+    if (Seen(list, udn, location, maxAge, now))
         list.Described(udn, location, true, Described(name), now);
+}
+
+void Remove(ServerList& list, const std::string& udn) {
+    MediaServer gone;
+    list.Remove(udn, kAnnouncer, gone);
 }
 
 std::vector<std::string> Names(const ServerList& list) {
@@ -40,12 +53,12 @@ TEST(Vanuaudiod_ServerList, ListedByFriendlyNameThenUdn) {
 TEST(Vanuaudiod_ServerList, OnlyDescribedDevicesAreListed) {
     ServerList list;
     const auto now = Clock::now();
-    EXPECT_TRUE(list.Seen("uuid:a", "http://10.0.0.1/a", 100, now));
+    EXPECT_TRUE(Seen(list, "uuid:a", "http://10.0.0.1/a", 100, now));
     EXPECT_TRUE(list.Snapshot()->empty());
-    EXPECT_FALSE(list.Seen("uuid:a", "http://10.0.0.1/a", 100, now));  // fetch already pending
+    EXPECT_FALSE(Seen(list, "uuid:a", "http://10.0.0.1/a", 100, now));  // fetch already pending
     list.Described("uuid:a", "http://10.0.0.1/a", true, Described("A"), now);
     EXPECT_EQ(list.Snapshot()->size(), 1u);
-    EXPECT_FALSE(list.Seen("uuid:a", "http://10.0.0.1/a", 100, now));
+    EXPECT_FALSE(Seen(list, "uuid:a", "http://10.0.0.1/a", 100, now));
 }
 
 TEST(Vanuaudiod_ServerList, ByebyeRemovesTheDevice) {
@@ -53,7 +66,7 @@ TEST(Vanuaudiod_ServerList, ByebyeRemovesTheDevice) {
     const auto now = Clock::now();
     Add(list, "uuid:a", "A", 100, now);
     Add(list, "uuid:b", "B", 100, now);
-    list.Remove("uuid:a");
+    Remove(list, "uuid:a");
     EXPECT_EQ(Names(list), (std::vector<std::string>{"B/uuid:b"}));
 }
 
@@ -62,11 +75,11 @@ TEST(Vanuaudiod_ServerList, DevicesExpireAfterTheirMaxAgeUnlessRenewed) {
     const auto now = Clock::now();
     Add(list, "uuid:a", "A", 10, now);
     Add(list, "uuid:b", "B", 10, now);
-    EXPECT_FALSE(list.Seen("uuid:b", "http://10.0.0.1/uuid:b", 10, now + std::chrono::seconds(8)));
-    EXPECT_EQ(list.Expire(now + std::chrono::seconds(9)), 0);
-    EXPECT_EQ(list.Expire(now + std::chrono::seconds(11)), 1);
+    EXPECT_FALSE(Seen(list, "uuid:b", "http://10.0.0.1/uuid:b", 10, now + std::chrono::seconds(8)));
+    EXPECT_EQ(list.Expire(now + std::chrono::seconds(9)).size(), 0u);
+    EXPECT_EQ(list.Expire(now + std::chrono::seconds(11)).size(), 1u);
     EXPECT_EQ(Names(list), (std::vector<std::string>{"B/uuid:b"}));
-    EXPECT_EQ(list.Expire(now + std::chrono::seconds(19)), 1);
+    EXPECT_EQ(list.Expire(now + std::chrono::seconds(19)).size(), 1u);
     EXPECT_TRUE(list.Snapshot()->empty());
 }
 
@@ -74,7 +87,7 @@ TEST(Vanuaudiod_ServerList, MovedDeviceIsUnlistedUntilDescribedAgain) {
     ServerList list;
     const auto now = Clock::now();
     Add(list, "uuid:a", "A", 100, now);
-    EXPECT_TRUE(list.Seen("uuid:a", "http://10.0.0.2/new", 100, now));
+    EXPECT_TRUE(Seen(list, "uuid:a", "http://10.0.0.2/new", 100, now));
     EXPECT_TRUE(list.Snapshot()->empty());
     // A late answer for the old location is ignored.
     list.Described("uuid:a", "http://10.0.0.1/uuid:a", true, Described("Old"), now);
@@ -86,10 +99,10 @@ TEST(Vanuaudiod_ServerList, MovedDeviceIsUnlistedUntilDescribedAgain) {
 TEST(Vanuaudiod_ServerList, FailedDescriptionIsRetriedOnlyAfterAPause) {
     ServerList list;
     const auto now = Clock::now();
-    ASSERT_TRUE(list.Seen("uuid:a", "http://10.0.0.1/a", 100, now));
+    ASSERT_TRUE(Seen(list, "uuid:a", "http://10.0.0.1/a", 100, now));
     list.Described("uuid:a", "http://10.0.0.1/a", false, {}, now);
-    EXPECT_FALSE(list.Seen("uuid:a", "http://10.0.0.1/a", 100, now + std::chrono::seconds(1)));
-    EXPECT_TRUE(list.Seen("uuid:a", "http://10.0.0.1/a", 100, now + std::chrono::seconds(11)));
+    EXPECT_FALSE(Seen(list, "uuid:a", "http://10.0.0.1/a", 100, now + std::chrono::seconds(1)));
+    EXPECT_TRUE(Seen(list, "uuid:a", "http://10.0.0.1/a", 100, now + std::chrono::seconds(11)));
 }
 
 TEST(Vanuaudiod_ServerList, SnapshotTakenBeforeAChangeStaysAsItWas) {
@@ -97,7 +110,64 @@ TEST(Vanuaudiod_ServerList, SnapshotTakenBeforeAChangeStaysAsItWas) {
     const auto now = Clock::now();
     Add(list, "uuid:a", "A", 100, now);
     const ServerSnapshot before = list.Snapshot();
-    list.Remove("uuid:a");
+    Remove(list, "uuid:a");
     EXPECT_EQ(before->size(), 1u);
     EXPECT_TRUE(list.Snapshot()->empty());
+}
+
+TEST(Vanuaudiod_ServerList, OneAddressHoldsAtMostSixteenDevices) {
+    ServerList list;
+    const auto now = Clock::now();
+    for (std::size_t i = 0; i < kMaxDevicesPerAnnouncer; ++i) {
+        const std::string udn = "uuid:flood-" + std::to_string(i);
+        EXPECT_EQ(list.Seen(udn, "http://10.0.0.9/" + udn, "10.0.0.9", 86400, now),
+                  SeenOutcome::kFetch);
+    }
+    EXPECT_EQ(list.Seen("uuid:one-more", "http://10.0.0.9/x", "10.0.0.9", 86400, now),
+              SeenOutcome::kAnnouncerFull);
+    // Another host is not held back by it.
+    EXPECT_TRUE(Seen(list, "uuid:real", "http://10.0.0.1/real", 100, now));
+    EXPECT_EQ(list.KnownCount(), kMaxDevicesPerAnnouncer + 1);
+}
+
+TEST(Vanuaudiod_ServerList, DevicesWithoutADescriptionGiveTheirSlotsUpSoon) {
+    ServerList list;
+    const auto now = Clock::now();
+    ASSERT_TRUE(Seen(list, "uuid:fake", "http://10.0.0.1/fake", 86400, now));
+    list.Described("uuid:fake", "http://10.0.0.1/fake", false, {}, now);
+    EXPECT_EQ(list.Expire(now + kUndescribedHold - std::chrono::seconds(1)).size(), 0u);
+    EXPECT_TRUE(list.Knows("uuid:fake"));
+    list.Expire(now + kUndescribedHold + std::chrono::seconds(1));
+    EXPECT_FALSE(list.Knows("uuid:fake"));
+    // A described server keeps its announced max-age.
+    Add(list, "uuid:real", "Real", 600, now);
+    list.Expire(now + std::chrono::seconds(300));
+    EXPECT_TRUE(list.Knows("uuid:real"));
+}
+
+TEST(Vanuaudiod_ServerList, AFullTableMakesRoomForANewcomerByDroppingAnUndescribedDevice) {
+    ServerList list;
+    const auto now = Clock::now();
+    for (std::size_t i = 0; i < kMaxKnownDevices; ++i) {
+        const std::string host = "10.1." + std::to_string(i / 16) + ".1";
+        const std::string udn = "uuid:fake-" + std::to_string(i);
+        ASSERT_EQ(list.Seen(udn, "http://" + host + "/d", host, 86400, now), SeenOutcome::kFetch);
+        list.Described(udn, "http://" + host + "/d", false, {}, now);
+    }
+    EXPECT_EQ(list.KnownCount(), kMaxKnownDevices);
+    EXPECT_TRUE(Seen(list, "uuid:real", "http://10.0.0.1/real", 100, now));
+    EXPECT_EQ(list.KnownCount(), kMaxKnownDevices);
+    list.Described("uuid:real", "http://10.0.0.1/real", true, Described("Real"), now);
+    EXPECT_EQ(Names(list), (std::vector<std::string>{"Real/uuid:real"}));
+}
+
+TEST(Vanuaudiod_ServerList, AByebyeFromAnotherAddressIsIgnored) {
+    ServerList list;
+    const auto now = Clock::now();
+    Add(list, "uuid:a", "A", 100, now);
+    MediaServer gone;
+    EXPECT_FALSE(list.Remove("uuid:a", "10.0.0.66", gone));
+    EXPECT_EQ(Names(list), (std::vector<std::string>{"A/uuid:a"}));
+    EXPECT_TRUE(list.Remove("uuid:a", kAnnouncer, gone));
+    EXPECT_EQ(gone.friendlyName, "A");
 }

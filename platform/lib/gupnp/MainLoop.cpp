@@ -9,28 +9,48 @@ gboolean Source::Dispatch(gpointer data) {
     return (*callback)() ? G_SOURCE_CONTINUE : G_SOURCE_REMOVE;
 }
 
+// Attached to the thread-default main context (the global default one on the main thread), so
+// that a loop on a thread of its own runs its sources.
+guint Source::Attach(GSource* source, Callback* callback) {
+    g_source_set_callback(source, &Source::Dispatch, callback, nullptr);
+    const guint id = g_source_attach(source, g_main_context_get_thread_default());
+    g_source_unref(source);
+    return id;
+}
+
 Source Source::Timeout(unsigned milliseconds, Callback callback) {
     Source source;
     source.callback_ = std::make_unique<Callback>(std::move(callback));
-    source.id_ = g_timeout_add(milliseconds, &Source::Dispatch, source.callback_.get());
+    source.context_ = g_main_context_ref_thread_default();
+    source.id_ = Attach(g_timeout_source_new(milliseconds), source.callback_.get());
     return source;
 }
 
 Source Source::UnixSignal(int signalNumber, Callback callback) {
     Source source;
     source.callback_ = std::make_unique<Callback>(std::move(callback));
-    source.id_ = g_unix_signal_add(signalNumber, &Source::Dispatch, source.callback_.get());
+    source.context_ = g_main_context_ref_thread_default();
+    source.id_ = Attach(g_unix_signal_source_new(signalNumber), source.callback_.get());
     return source;
+}
+
+bool Source::active() const {
+    if (id_ == 0)
+        return false;
+    GSource* source = g_main_context_find_source_by_id(context_, id_);
+    return source != nullptr && !g_source_is_destroyed(source);
 }
 
 void Source::Remove() {
     // A source whose callback returned false is gone already; removing it again would warn.
     if (id_ != 0) {
-        GSource* source = g_main_context_find_source_by_id(nullptr, id_);
+        GSource* source = g_main_context_find_source_by_id(context_, id_);
         if (source != nullptr && !g_source_is_destroyed(source))
-            g_source_remove(id_);
+            g_source_destroy(source);
         id_ = 0;
     }
+    if (context_ != nullptr)
+        g_main_context_unref(std::exchange(context_, nullptr));
     callback_.reset();
 }
 

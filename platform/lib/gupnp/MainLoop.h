@@ -35,11 +35,14 @@ class Source {
     Source() = default;
     ~Source() { Remove(); }
     Source(Source&& other) noexcept
-        : id_(std::exchange(other.id_, 0)), callback_(std::move(other.callback_)) {}
+        : id_(std::exchange(other.id_, 0)),
+          context_(std::exchange(other.context_, nullptr)),
+          callback_(std::move(other.callback_)) {}
     Source& operator=(Source&& other) noexcept {
         if (this != &other) {
             Remove();
             id_ = std::exchange(other.id_, 0);
+            context_ = std::exchange(other.context_, nullptr);
             callback_ = std::move(other.callback_);
         }
         return *this;
@@ -52,13 +55,16 @@ class Source {
     // Calls `callback` in the loop when `signalNumber` (SIGTERM, SIGINT, SIGHUP, ...) arrives.
     static Source UnixSignal(int signalNumber, Callback callback);
 
-    bool active() const { return id_ != 0; }
+    // Attached and not ended (a source whose callback returned false is no longer active).
+    bool active() const;
     void Remove();
 
   private:
     static gboolean Dispatch(gpointer data);
+    static guint Attach(GSource* source, Callback* callback);
 
     guint id_ = 0;
+    GMainContext* context_ = nullptr;  // where the source is attached
     // On the heap so that the address handed to GLib survives a move of this object.
     std::unique_ptr<Callback> callback_;
 };
