@@ -9,8 +9,10 @@
 #include "AudioFile.h"
 
 #include <fcntl.h>
+#include <pwd.h>
 #include <sys/random.h>
 #include <sys/stat.h>
+#include <syslog.h>
 #include <time.h>
 #include <unistd.h>
 
@@ -24,9 +26,9 @@
 #include <unordered_set>
 #include <vector>
 
-#include "sqlite/Database.h"
 #include "LibraryDatabase.h"
 #include "PlatformPaths.h"
+#include "sqlite/Database.h"
 
 namespace harmona::playlist {
 namespace {
@@ -298,6 +300,29 @@ std::string TemporaryName(const std::string& base, Generator& random) {
     return name;
 }
 
+// The name of the user `uid`, or "?" when the system does not know it.
+std::string UserNameOf(uid_t uid) {
+    passwd entry{};
+    passwd* found = nullptr;
+    char buffer[1024];
+    if (getpwuid_r(uid, &entry, buffer, sizeof buffer, &found) == 0 && found != nullptr)
+        return found->pw_name;
+    return "?";
+}
+
+// A file (or link) at `path` that another user owns is not ours to replace: in the shared,
+// sticky temporary folder the rename would be refused anyway, and taking over another user's file
+// elsewhere is never wanted. Someone made it on purpose or by mistake; the administrator learns
+// here whose it is, so that he can remove it. True when `base` is absent or ours.
+bool MayReplace(int dirFd, const std::string& path, const std::string& base) {
+    struct stat st {};
+    if (fstatat(dirFd, base.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0 || st.st_uid == geteuid())
+        return true;
+    syslog(LOG_ERR, "random playlist: cannot replace %s: it belongs to user %s (uid %u)",
+           path.c_str(), UserNameOf(st.st_uid).c_str(), static_cast<unsigned>(st.st_uid));
+    return false;
+}
+
 // Writes `text` to a new file in the folder of `path` and renames it over `path`. Both names are
 // taken relative to one open descriptor of that folder, so nothing lands anywhere else.
 bool ReplaceFile(const char* path, const std::string& text) {
@@ -310,7 +335,7 @@ bool ReplaceFile(const char* path, const std::string& text) {
         return false;
 
     Descriptor dir(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    if (dir.Get() < 0)
+    if (dir.Get() < 0 || !MayReplace(dir.Get(), full, base))
         return false;
     Generator random = SeededGenerator();
     for (int attempt = 0; attempt < 16; ++attempt) {
@@ -325,7 +350,11 @@ bool ReplaceFile(const char* path, const std::string& text) {
         const bool written = WriteAll(file.Get(), text) && file.Close();
         if (written && renameat(dir.Get(), temporary.c_str(), dir.Get(), base.c_str()) == 0)
             return true;
+        const int renameError = errno;
         unlinkat(dir.Get(), temporary.c_str(), 0);
+        // Another user's file put there since the test above: say whose, as above.
+        if (written && (renameError == EPERM || renameError == EACCES))
+            MayReplace(dir.Get(), full, base);
         return false;
     }
     return false;

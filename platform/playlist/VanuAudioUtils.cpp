@@ -1,6 +1,9 @@
 #include "VanuAudioUtils.h"
 
+#include <sys/stat.h>
+
 #include <algorithm>
+#include <string>
 
 #include "ConfFile.h"
 #include "PlatformPaths.h"
@@ -16,13 +19,26 @@ class SectionNames : public harmona::conf::ConfVisitor {
     std::vector<std::string> names;
 };
 
+// A user's smart playlist file lies in his playlists folder; like his playlists, it is read only
+// when that folder is a real one, not a symbolic link to someone else's.
+bool InRealFolder(const char* path) {
+    const std::string file(path);
+    const std::size_t slash = file.rfind('/');
+    if (slash == std::string::npos || slash == 0)
+        return true;
+    struct stat st {};
+    return lstat(file.substr(0, slash).c_str(), &st) == 0 && S_ISDIR(st.st_mode);
+}
+
 }  // namespace
 
 std::vector<std::string> VanuAudioUtils::SmartPLSEnum(int offset, int limit, int& total,
                                                       const char* path) {
     SectionNames visitor;
-    harmona::conf::ReadConf(path != nullptr ? path : harmona::paths::kSharedSmartPlaylists,
-                            visitor);
+    if (path == nullptr)
+        harmona::conf::ReadConf(harmona::paths::kSharedSmartPlaylists, visitor);
+    else if (InRealFolder(path))
+        harmona::conf::ReadConf(path, visitor);
     std::vector<std::string>& names = visitor.names;
     total = static_cast<int>(std::min<std::size_t>(names.size(), 0x7FFFFFFF));
 

@@ -9,6 +9,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <map>
 
 #include "CgiRunner.h"
 #include "Fixtures.h"
@@ -367,6 +368,138 @@ TEST_F(Hostile, SymlinkAtTheRandomPathIsReplacedNotFollowed) {
     struct stat st {};
     ASSERT_EQ(lstat("/tmp/==DynaRandom100==.admin", &st), 0);
     EXPECT_TRUE(S_ISREG(st.st_mode));
+}
+
+// A request as a browser sends it when a page (of this host or of another site) makes it.
+CgiRequest BrowserRequest(const std::string& query,
+                          const std::map<std::string, std::string>& headers) {
+    CgiRequest request;
+    request.queryString = query;
+    request.extraEnv = headers;
+    return request;
+}
+
+constexpr const char* kUnauthorized = "Status: 401 Unauthorized\r\n\r\n";
+const std::string kRandomFile = "/tmp/==DynaRandom100==.admin";
+
+TEST_F(Hostile, CrossSiteRequestsAreRefusedBeforeAnyActionRuns) {
+    MakeGeneratedLibrary(150);
+    ScriptedDaemon daemon(
+        [](const DaemonRequest&) { return DaemonAnswer::Reply("{\"success\":true}"); });
+    const std::vector<std::map<std::string, std::string>> foreign = {
+        {{"HTTP_SEC_FETCH_SITE", "cross-site"}},
+        {{"HTTP_SEC_FETCH_SITE", "Cross-Site"}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://evil.example"}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://nas.local.evil.example"}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://nas.local:8081"}, {"HTTP_HOST", "nas.local:8080"}},
+        {{"HTTP_ORIGIN", "https://nas.local"}, {"HTTP_HOST", "nas.local:80"}},
+        {{"HTTP_ORIGIN", "null"}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://nas.local"}},  // no Host to compare with
+        {{"HTTP_ORIGIN", ""}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://nas.local"},
+         {"HTTP_HOST", "nas.local"},
+         {"HTTP_SEC_FETCH_SITE", "cross-site"}},
+    };
+    for (const auto& headers : foreign) {
+        std::string described;
+        for (const auto& [name, value] : headers)
+            described += name + "=" + value + " ";
+        for (const char* query :
+             {"action=rerandom100", "action=refresh&target=mediaserver",
+              "action=refresh&target=personal", "action=gettreenode&node=audiotree_root"}) {
+            const CgiResult r = Run(BrowserRequest(query, headers));
+            EXPECT_EQ(r.output, kUnauthorized) << described << query;
+            EXPECT_EQ(r.exitStatus, 0) << described << query;
+        }
+    }
+    EXPECT_FALSE(Exists(kRandomFile));
+    EXPECT_TRUE(daemon.Requests().empty());
+}
+
+TEST_F(Hostile, SameOriginAndHeaderlessRequestsStillAct) {
+    MakeGeneratedLibrary(150);
+    ScriptedDaemon daemon(
+        [](const DaemonRequest&) { return DaemonAnswer::Reply("{\"success\":true}"); });
+    const std::vector<std::map<std::string, std::string>> own = {
+        {},  // curl, scripts
+        {{"HTTP_HOST", "nas.local"}},
+        {{"HTTP_SEC_FETCH_SITE", "same-origin"}, {"HTTP_HOST", "nas.local:8080"}},
+        {{"HTTP_SEC_FETCH_SITE", "none"}},  // typed into the address bar
+        {{"HTTP_ORIGIN", "http://nas.local:8080"}, {"HTTP_HOST", "nas.local:8080"}},
+        {{"HTTP_ORIGIN", "http://NAS.Local"}, {"HTTP_HOST", "nas.local:80"}},
+        {{"HTTP_ORIGIN", "https://nas.local:443"}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://127.0.0.1:8080"},
+         {"HTTP_HOST", "127.0.0.1:8080"},
+         {"HTTP_SEC_FETCH_SITE", "same-origin"}},
+    };
+    for (const auto& headers : own) {
+        unlink(kRandomFile.c_str());
+        const CgiResult r = Run(BrowserRequest("action=rerandom100", headers), {"/tmp"});
+        EXPECT_EQ(r.json["success"], true) << r.output;
+        EXPECT_TRUE(Exists(kRandomFile));
+    }
+    const CgiResult scan =
+        Run(BrowserRequest("action=refresh&target=mediaserver",
+                           {{"HTTP_ORIGIN", "http://nas.local"}, {"HTTP_HOST", "nas.local"}}));
+    EXPECT_EQ(scan.exitStatus, 1);
+    EXPECT_FALSE(daemon.Requests().empty());
+}
+
+// Another local user made the random playlist's file first (in the shared, sticky /tmp). The draw
+// fails as before, the file stays as it was, and the log says which file and whose it is.
+TEST_F(Hostile, RandomPlaylistFileOfAnotherUserFailsTheDrawWithOneLogLineNamingItsOwner) {
+    MakeGeneratedLibrary(150);
+    const uid_t nobody = 65534;  // "nobody" on Debian
+    WriteFile(kRandomFile, "#EXTM3U\n/volume1/music/planted.mp3\n");
+    ASSERT_EQ(chown(kRandomFile.c_str(), nobody, nobody), 0);
+    const CgiResult r = Run(BrowserRequest("action=rerandom100", {}));
+    EXPECT_EQ(r.json["success"], false) << r.body;
+    EXPECT_EQ(r.json["errinfo"]["key"], "error_create_random100") << r.body;
+    EXPECT_EQ(ReadFile(kRandomFile), "#EXTM3U\n/volume1/music/planted.mp3\n");
+    const std::vector<std::string> log = r.LogMessages();
+    ASSERT_EQ(log.size(), 1u);
+    EXPECT_NE(log[0].find(kRandomFile), std::string::npos) << log[0];
+    EXPECT_NE(log[0].find("user nobody (uid 65534)"), std::string::npos) << log[0];
+
+    // The same for a symbolic link that another user planted there.
+    ASSERT_EQ(unlink(kRandomFile.c_str()), 0);
+    ASSERT_EQ(symlink("/var/packages/Harmona/etc/users.conf", kRandomFile.c_str()), 0);
+    ASSERT_EQ(lchown(kRandomFile.c_str(), 4321, 4321), 0);
+    const CgiResult linked = Run(BrowserRequest("action=rerandom100", {}));
+    EXPECT_EQ(linked.json["success"], false) << linked.body;
+    ASSERT_EQ(linked.LogMessages().size(), 1u);
+    EXPECT_NE(linked.LogMessages()[0].find("(uid 4321)"), std::string::npos);
+}
+
+// The user's playlists folder is a symbolic link to another user's: neither his playlists nor his
+// smart playlists are listed; the listing fails as it does for a folder that cannot be read.
+TEST_F(Hostile, SymlinkedPlaylistsFolderIsRefusedLikeAnUnreadableOne) {
+    WritePersonalPlaylistFile("other", "Secret.m3u");
+    WriteSmartPlaylistFile(UserSmartPlaylistFile("other"), {"Secret smart"});
+    const std::string folder = PersonalPlaylistDir("admin");
+
+    // What an unreadable folder gives: a file where the folder should be.
+    ASSERT_EQ(system(("rm -rf '" + folder + "'").c_str()), 0);
+    WriteFile(folder, "not a folder\n");
+    const CgiResult unreadableRefresh = RunQuery("action=refresh&target=personal");
+    const CgiResult unreadableCategory =
+        RunQuery("action=gettreenode&node=musiclib_music_personal");
+    EXPECT_EQ(unreadableRefresh.json["success"], false) << unreadableRefresh.body;
+
+    ASSERT_EQ(unlink(folder.c_str()), 0);
+    ASSERT_EQ(symlink(PersonalPlaylistDir("other").c_str(), folder.c_str()), 0);
+    for (const char* query :
+         {"action=refresh&target=personal", "action=gettreenode&node=musiclib_music_personal",
+          "action=gettreenode&node=audiotree_root"}) {
+        const CgiResult r = RunQuery(query);
+        EXPECT_EQ(r.body.find("Secret"), std::string::npos) << query << ": " << r.body;
+    }
+    const CgiResult refresh = RunQuery("action=refresh&target=personal");
+    EXPECT_EQ(refresh.body, unreadableRefresh.body);
+    EXPECT_EQ(refresh.LogMessages(), unreadableRefresh.LogMessages());
+    const CgiResult category = RunQuery("action=gettreenode&node=musiclib_music_personal");
+    EXPECT_EQ(category.body, unreadableCategory.body);
+    EXPECT_EQ(category.exitStatus, unreadableCategory.exitStatus);
 }
 
 TEST_F(Hostile, PreferenceDirectoryThatIsASymlinkElsewhere) {
