@@ -7,16 +7,27 @@
 
 #include "ConfFile.h"
 #include "PlatformPaths.h"
+#include "PlaylistRecord.h"
 
 namespace {
 
 class SectionNames : public harmona::conf::ConfVisitor {
   public:
     void Section(std::string_view name) override {
-        if (!name.empty())
-            names.emplace_back(name);
+        if (name.empty() || tooMany)
+            return;
+        // Counted as the file is read: an 8 MiB file of one-letter sections never becomes two
+        // million names.
+        if (names.size() == kMaxSmartPlaylists) {
+            tooMany = true;
+            names.clear();
+            names.shrink_to_fit();
+            return;
+        }
+        names.emplace_back(name);
     }
     std::vector<std::string> names;
+    bool tooMany = false;
 };
 
 // A user's smart playlist file lies in his playlists folder; like his playlists, it is read only
@@ -35,10 +46,12 @@ bool InRealFolder(const char* path) {
 std::vector<std::string> VanuAudioUtils::SmartPLSEnum(int offset, int limit, int& total,
                                                       const char* path) {
     SectionNames visitor;
-    if (path == nullptr)
-        harmona::conf::ReadConf(harmona::paths::kSharedSmartPlaylists, visitor);
-    else if (InRealFolder(path))
-        harmona::conf::ReadConf(path, visitor);
+    const char* file = path != nullptr ? path : harmona::paths::kSharedSmartPlaylists;
+    if (path == nullptr || InRealFolder(path))
+        harmona::conf::ReadConf(file, visitor);
+    if (visitor.tooMany)
+        harmona::playlist::LogListTooLong(std::string("smart playlists in ") + file,
+                                          kMaxSmartPlaylists);
     std::vector<std::string>& names = visitor.names;
     total = static_cast<int>(std::min<std::size_t>(names.size(), 0x7FFFFFFF));
 

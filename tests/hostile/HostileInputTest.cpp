@@ -14,8 +14,10 @@
 #include "CgiRunner.h"
 #include "Fixtures.h"
 #include "PlaylistFixtures.h"
+#include "RequestMemory.h"
 #include "ScriptedDaemon.h"
 #include "ScriptedHttpServer.h"
+#include "SoapBrowse.h"
 
 using namespace harmona::test;
 using Strings = std::vector<std::string>;
@@ -255,6 +257,219 @@ TEST_F(Hostile, MediaServerWithTwoHundredThousandObjects) {
     EXPECT_LT(r.peakRssKb, 1024L * 1024 * kMemoryFactor);
 }
 
+// --- Memory: every request stays within its bound (RequestMemory.h) ----------------------------
+
+// The bound as ru_maxrss counts it (KiB); the sanitizer build sets no address-space limit and needs
+// more for its shadow memory.
+constexpr long kRequestBoundKb =
+    static_cast<long>(harmona::cgi::kRequestMemoryBytes >> 10) * kMemoryFactor;
+
+// A BrowseResponse whose Result holds `count` objects made by `object(i)`, the DIDL-Lite escaped as
+// a media server escapes text (only & < >; quotes need no escape in text). Built as one string
+// and moved into the reply, so that the test process holds it once.
+template <typename Object>
+ScriptedReply PageOf(std::size_t count, std::size_t bytesPerObject, Object object,
+                     std::size_t first = 0, std::size_t total = 0) {
+    std::string body =
+        "<?xml version=\"1.0\" encoding=\"utf-8\"?><s:Envelope "
+        "xmlns:s=\"http://schemas.xmlsoap.org/soap/envelope/\"><s:Body><u:BrowseResponse "
+        "xmlns:u=\"urn:schemas-upnp-org:service:ContentDirectory:1\"><Result>"
+        "&lt;DIDL-Lite xmlns=\"urn:schemas-upnp-org:metadata-1-0/DIDL-Lite/\" "
+        "xmlns:dc=\"http://purl.org/dc/elements/1.1/\" "
+        "xmlns:upnp=\"urn:schemas-upnp-org:metadata-1-0/upnp/\"&gt;";
+    body.reserve(body.size() + count * bytesPerObject + 1024);
+    for (std::size_t i = first; i < first + count; ++i)
+        object(i, body);
+    body += "&lt;/DIDL-Lite&gt;</Result><NumberReturned>" + std::to_string(count) +
+            "</NumberReturned><TotalMatches>" + std::to_string(total > 0 ? total : count) +
+            "</TotalMatches><UpdateID>1</UpdateID></u:BrowseResponse></s:Body></s:Envelope>";
+    ScriptedReply reply;
+    reply.body = std::move(body);
+    return reply;
+}
+
+void TinyObject(std::size_t i, std::string& out) {
+    out += "&lt;item id=\"";
+    out += std::to_string(i);
+    out += "\"/&gt;";
+}
+
+// A track as a real media server describes it: title, class, artist, album and a resource.
+void TrackObject(std::size_t i, std::string& out) {
+    const std::string n = std::to_string(i);
+    out += "&lt;item id=\"64$" + n +
+           "\" parentID=\"64\" restricted=\"1\"&gt;&lt;dc:title&gt;Track " + n +
+           " of a long album title&lt;/dc:title&gt;&lt;upnp:class&gt;object.item.audioItem." +
+           "musicTrack&lt;/upnp:class&gt;&lt;upnp:artist&gt;Artist " + n.substr(0, 3) +
+           "&lt;/upnp:artist&gt;&lt;upnp:album&gt;Album " + n.substr(0, 4) +
+           "&lt;/upnp:album&gt;&lt;res protocolInfo=\"http-get:*:audio/mpeg:*\"&gt;"
+           "http://192.168.1.10:50003/MediaItems/" +
+           n + ".mp3&lt;/res&gt;&lt;/item&gt;";
+}
+
+// Browses "big" on the pages enqueued on `server`.
+CgiResult BrowseBig(ScriptedHttpServer& server) {
+    CgiRequest request;
+    request.queryString = "action=gettreenode&node=musiclib_big";
+    request.timeoutMs = 120000;
+    request.parseJson = false;  // the test process stays small, so that ru_maxrss is the CGI's
+    return RunCgi(request);
+}
+
+CgiResult BrowseBig(ScriptedHttpServer& server, ScriptedReply page) {
+    server.Enqueue(std::move(page));
+    return BrowseBig(server);
+}
+
+// The attack as it was measured: a 61 MiB page (under the 64 MiB reply limit) of 2.5 million tiny
+// objects took 3.2 GB. Now refused before it is parsed, with a log line.
+TEST_F(Hostile, MediaServerPageOfTwoAndAHalfMillionTinyObjectsFailsWithinTheBound) {
+    ScriptedHttpServer server;
+    ASSERT_TRUE(server.Start());
+    ScriptedReply page = PageOf(2500000, 26, TinyObject);
+    EXPECT_GT(page.body.size(), 60u << 20);
+    EXPECT_LT(page.body.size(), harmona::dma::kMaxReplyBytes);
+    const FileSnapshot before = Snapshot();
+    const CgiResult r = BrowseBig(server, std::move(page));
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.body, "[]\n");
+    ASSERT_EQ(r.LogMessages().size(), 1u);
+    EXPECT_NE(r.LogMessages()[0].find("browse: object big of "), std::string::npos);
+    EXPECT_NE(r.LogMessages()[0].find("MiB to parse"), std::string::npos) << r.LogMessages()[0];
+    EXPECT_LT(r.peakRssKb, kRequestBoundKb);
+    EXPECT_TRUE(ChangedPaths(before, Snapshot()).empty());
+    RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
+}
+
+// Objects without attributes parse to less than the tree bound allows, so the object count stops
+// them: the browse ends at the first object past the limit.
+TEST_F(Hostile, MediaServerPageOfBareObjectsFailsAtTheObjectLimitWithinTheBound) {
+    ScriptedHttpServer server;
+    ASSERT_TRUE(server.Start());
+    ScriptedReply page =
+        PageOf(2500000, 13, [](std::size_t, std::string& out) { out += "&lt;item/&gt;"; });
+    const CgiResult r = BrowseBig(server, std::move(page));
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.body, "[]\n");
+    ASSERT_EQ(r.LogMessages().size(), 1u);
+    EXPECT_NE(r.LogMessages()[0].find("more than 200000 objects"), std::string::npos)
+        << r.LogMessages()[0];
+    EXPECT_LT(r.peakRssKb, kRequestBoundKb);
+    RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
+}
+
+// The largest container the bound allows: kMaxBrowseObjects tracks, each described in full, in two
+// pages of 100,000 (a page of 200,000 such objects would pass the 64 MiB reply limit; servers cap
+// their pages). Served whole; one object more is refused.
+TEST_F(Hostile, ContainerOfTwoHundredThousandTracksIsServedWithinTheBound) {
+    ASSERT_EQ(harmona::dma::kMaxBrowseObjects, 200000u);
+    ScriptedHttpServer server;
+    ASSERT_TRUE(server.Start());
+    server.Enqueue(PageOf(100000, 420, TrackObject, 0, 200000));
+    server.Enqueue(PageOf(100000, 420, TrackObject, 100000, 200000));
+    const CgiResult r = BrowseBig(server);
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_EQ(Count(r.body, "\"pid\":\"musiclib_big\""), 200000u);
+    EXPECT_NE(r.body.find("\"text\":\"Track 199999 of a long album title\""), std::string::npos);
+    EXPECT_EQ(r.LogMessages(), std::vector<std::string>{});
+    EXPECT_LT(r.peakRssKb, kRequestBoundKb);
+    RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
+    RecordProperty("wall_ms", std::to_string(static_cast<long>(r.wallMs)));
+
+    server.Enqueue(PageOf(100000, 420, TrackObject, 0, 200001));
+    server.Enqueue(PageOf(100001, 420, TrackObject, 100000, 200001));
+    const CgiResult over = BrowseBig(server);
+    ASSERT_TRUE(over.exited) << over.errors;
+    EXPECT_EQ(over.exitStatus, 0);
+    EXPECT_EQ(over.body, "[]\n");
+    ASSERT_EQ(over.LogMessages().size(), 1u);
+    EXPECT_NE(over.LogMessages()[0].find("more than 200000 objects"), std::string::npos)
+        << over.LogMessages()[0];
+}
+
+// What the readers' bounds let through and still needs more than the bound: one object whose
+// 47 MiB title is all double quotes, which the tree node holds HTML-encoded (six bytes each) twice,
+// as text and tooltip. The address-space limit set at start-up stops it: one log line, no reply at
+// all (the web server answers 500), nothing written.
+TEST_F(Hostile, RequestPastTheAddressSpaceLimitEndsWithALogLineAndNoReply) {
+#ifdef HARMONA_SANITIZE
+    GTEST_SKIP() << "sanitizer builds reserve terabytes of address space and set no limit";
+#endif
+    ScriptedHttpServer server;
+    ASSERT_TRUE(server.Start());
+    const std::size_t titleBytes = 47u << 20;
+    ScriptedReply page = PageOf(1, titleBytes + 100, [&](std::size_t, std::string& out) {
+        out += "&lt;item id=\"q\"&gt;&lt;dc:title&gt;";
+        out.append(titleBytes, '"');
+        out += "&lt;/dc:title&gt;&lt;/item&gt;";
+    });
+    const FileSnapshot before = Snapshot();
+    const CgiResult r = BrowseBig(server, std::move(page));
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.output, "");
+    EXPECT_EQ(r.LogMessages(), std::vector<std::string>{
+                                   "request: out of memory within its bound of 512 MiB; no reply"});
+    EXPECT_TRUE(ChangedPaths(before, Snapshot()).empty());
+}
+
+// The attack as it was measured: an 8 MiB smart playlist file of one-letter sections took 3.0 GB,
+// 15.6 s and a 505 MB reply. Now the file is not listed, with one log line; the ordinary playlists
+// still are.
+TEST_F(Hostile, SmartPlaylistFileOfTwoMillionOneLetterSectionsFailsWithinTheBound) {
+    {
+        std::string sections;
+        sections.reserve(8u << 20);
+        while (sections.size() + 4 <= (8u << 20))
+            sections += "[a]\n";
+        WriteFile(UserSmartPlaylistFile("admin"), sections);
+    }
+    const CgiResult r = RunQuery("action=refresh&target=personal");
+    EXPECT_EQ(r.json["success"], true) << r.body.substr(0, 300);
+    EXPECT_NE(r.body.find("musiclib_music_personal/playlist/Mine"), std::string::npos);
+    EXPECT_EQ(r.body.find("/smart/"), std::string::npos);
+    ASSERT_EQ(r.LogMessages().size(), 1u);
+    EXPECT_EQ(r.LogMessages()[0], "playlist list: more than 10000 smart playlists in " +
+                                      UserSmartPlaylistFile("admin") + "; the listing is refused");
+    EXPECT_LT(r.peakRssKb, kRequestBoundKb);
+    RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
+    RecordProperty("wall_ms", std::to_string(static_cast<long>(r.wallMs)));
+}
+
+TEST_F(Hostile, SmartPlaylistFileOfTenThousandSectionsIsListedWhole) {
+    std::vector<std::string> names;
+    for (int i = 0; i < 10000; ++i)
+        names.push_back("Smart " + std::to_string(100000 + i));
+    WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), names);
+    const CgiResult r = RunQuery("action=refresh&target=personal");
+    EXPECT_EQ(r.json["success"], true);
+    EXPECT_EQ(Count(r.body, "\"musiclib_music_personal/smart/"), 10000u);
+    EXPECT_TRUE(r.LogMessages().empty());
+    RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
+}
+
+// A playlists folder of more files than a list may hold is refused while it is read.
+TEST_F(Hostile, PlaylistsFolderOfMoreThanTenThousandPlaylistsFailsWithALogLine) {
+    for (int i = 1; i < 10000; ++i)  // "Mine.m3u" is the first
+        WritePersonalPlaylistFile("admin", "List " + std::to_string(i) + ".m3u");
+    const CgiResult listed = RunQuery("action=refresh&target=personal");
+    EXPECT_EQ(listed.json["success"], true);
+    EXPECT_EQ(Count(listed.body, "\"musiclib_music_personal/playlist/"), 10000u);
+    EXPECT_TRUE(listed.LogMessages().empty());
+    RecordProperty("peak_rss_kb", std::to_string(listed.peakRssKb));
+
+    WritePersonalPlaylistFile("admin", "One too many.m3u");
+    const CgiResult refused = RunQuery("action=refresh&target=personal");
+    EXPECT_EQ(refused.json["success"], false);
+    const std::vector<std::string> log = refused.LogMessages();
+    ASSERT_FALSE(log.empty());
+    EXPECT_EQ(log[0], "playlist list: more than 10000 playlists in " +
+                          PersonalPlaylistDir("admin") + "; the listing is refused");
+}
+
 TEST_F(Hostile, MediaServerBillionLaughs) {
     ScriptedHttpServer server;
     ASSERT_TRUE(server.Start());
@@ -313,6 +528,29 @@ TEST_F(Hostile, HugeTextConfAndSmartPlaylistFiles) {
     EXPECT_NE(r.body.find("\"inetradio_root\""), std::string::npos);
     EXPECT_NE(r.body.find("\"Radio\""), std::string::npos);
     EXPECT_NE(r.body.find("musiclib_music_personal/smart/Smart"), std::string::npos);
+    EXPECT_LT(r.peakRssKb, 64 * 1024 * kMemoryFactor);
+}
+
+// A damaged text table of 2 million short entries would be parsed by every builder of a root
+// request; the first 20,000 entries are kept and the table says so in the log.
+TEST_F(Hostile, TextTableOfTwoMillionEntriesKeepsTheFirstTwentyThousand) {
+    {
+        std::string table = "[radio]\nradio=Radio\n[x]\n";
+        table.reserve(8u << 20);
+        for (int i = 0; table.size() < (8u << 20) - 16; ++i)
+            table += "k" + std::to_string(i) + "=v\n";
+        WriteFile(std::string(kTextsDir) + "enu/strings", table);
+    }
+    const CgiResult r = RunQuery("action=gettreenode&node=audiotree_root");
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_NE(r.body.find("\"Radio\""), std::string::npos);
+    // One line per parse of the table (the daemon is not running here: its lines are left aside).
+    const std::string tooMany = "texts: " + std::string(kTextsDir) +
+                                "enu/strings holds more than 20000 texts; the rest are ignored";
+    const std::vector<std::string> log = r.LogMessages();
+    EXPECT_GE(std::count(log.begin(), log.end(), tooMany), 1) << ::testing::PrintToString(log);
+    for (const std::string& line : log)
+        EXPECT_TRUE(line == tooMany || line.rfind("ctrl:", 0) == 0) << line;
     EXPECT_LT(r.peakRssKb, 64 * 1024 * kMemoryFactor);
 }
 
