@@ -5,6 +5,7 @@
 // writes.
 #include <gtest/gtest.h>
 
+#include <dirent.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -255,6 +256,75 @@ TEST_F(Hostile, MediaServerWithTwoHundredThousandObjects) {
     RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
     RecordProperty("wall_ms", std::to_string(static_cast<long>(r.wallMs)));
     EXPECT_LT(r.peakRssKb, 1024L * 1024 * kMemoryFactor);
+}
+
+// The processes still running the CGI's program (a child it forked and left behind would be one).
+std::vector<pid_t> ProcessesOfTheCgi() {
+    std::vector<pid_t> found;
+    char* resolved = realpath(CgiProgram().c_str(), nullptr);
+    const std::string cgi = resolved != nullptr ? resolved : CgiProgram();
+    std::free(resolved);
+    DIR* proc = opendir("/proc");
+    if (proc == nullptr)
+        return found;
+    while (const dirent* entry = readdir(proc)) {
+        const pid_t pid = std::atoi(entry->d_name);
+        if (pid <= 0)
+            continue;
+        char exe[4096];
+        const std::string link = "/proc/" + std::string(entry->d_name) + "/exe";
+        const ssize_t n = readlink(link.c_str(), exe, sizeof exe);
+        if (n > 0 && std::string(exe, static_cast<std::size_t>(n)) == cgi)
+            found.push_back(pid);
+    }
+    closedir(proc);
+    return found;
+}
+
+// Checks a request over an iPod whose database is never read to its end: the listing fails after
+// the time limit with the log line naming the mountpoint, the category shows its refresh button
+// alone, and no reading process is left behind.
+void ExpectIPodListingCutAtTheTimeLimit(const CgiResult& r, const std::string& mountpoint) {
+    ASSERT_TRUE(r.exited) << "timed out: " << r.timedOut;
+    EXPECT_EQ(r.exitStatus, 1);
+    const std::string cut = "iPod: the database of the iPod mounted at " + mountpoint +
+                            " was not read within 5 seconds; its playlists are not listed";
+    EXPECT_EQ(r.LogMessages(), std::vector<std::string>{cut});
+    EXPECT_GE(r.wallMs, 4900);
+    EXPECT_LT(r.wallMs, 15000);
+    EXPECT_TRUE(ProcessesOfTheCgi().empty());
+}
+
+// A database that libgpod waits for forever: a FIFO in its place (libgpod opens it and blocks,
+// as no writer ever comes).
+TEST_F(Hostile, IPodDatabaseThatIsNeverReadToItsEndFailsTheListingAfterFiveSeconds) {
+    const std::string mountpoint = "/tmp/ipod";
+    MakeDirs(mountpoint + "/iPod_Control/iTunes");
+    ASSERT_EQ(mkfifo((mountpoint + "/iPod_Control/iTunes/iTunesDB").c_str(), 0644), 0);
+    WriteFile("/usr/vanu/etc/audio/ipod/mountpoint", mountpoint + "\n");
+    ScriptedDaemon daemon(ServeMediaServers({}));
+
+    CgiRequest root;
+    root.queryString = "action=gettreenode&node=audiotree_root";
+    const CgiResult r = Run(root);
+    ExpectIPodListingCutAtTheTimeLimit(r, mountpoint);
+    // The iPod category holds its refresh button alone, as for any failed listing.
+    ASSERT_TRUE(r.json.isArray());
+    bool sawIPod = false;
+    for (const Json::Value& category : r.json) {
+        if (category["id"] != "ipod_root")
+            continue;
+        sawIPod = true;
+        ASSERT_EQ(category["children"].size(), 1u);
+        EXPECT_EQ(category["children"][0]["id"], "ipod_refresh");
+    }
+    EXPECT_TRUE(sawIPod) << r.body.substr(0, 300);
+
+    CgiRequest refresh;
+    refresh.queryString = "action=refresh&target=ipod";
+    const CgiResult again = Run(refresh);
+    ExpectIPodListingCutAtTheTimeLimit(again, mountpoint);
+    EXPECT_EQ(again.body, "{\"items\":null,\"success\":true}\n");
 }
 
 // --- Memory: every request stays within its bound (RequestMemory.h) ----------------------------
