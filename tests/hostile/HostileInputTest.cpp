@@ -4,6 +4,7 @@
 // itself within its time limit, its peak memory, and that no file changed but the one the action
 // writes.
 #include <gtest/gtest.h>
+#include <zlib.h>
 
 #include <dirent.h>
 #include <sys/stat.h>
@@ -14,6 +15,7 @@
 
 #include "CgiRunner.h"
 #include "Fixtures.h"
+#include "IPodFixtures.h"
 #include "PlaylistFixtures.h"
 #include "RequestMemory.h"
 #include "ScriptedDaemon.h"
@@ -322,6 +324,74 @@ TEST_F(Hostile, IPodDatabaseThatIsNeverReadToItsEndFailsTheListingAfterFiveSecon
 
     CgiRequest refresh;
     refresh.queryString = "action=refresh&target=ipod";
+    const CgiResult again = Run(refresh);
+    ExpectIPodListingCutAtTheTimeLimit(again, mountpoint);
+    EXPECT_EQ(again.body, "{\"items\":null,\"success\":true}\n");
+}
+
+// The database as libgpod stores it for the iPods that keep it compressed (iTunesCDB, which
+// itdb_parse reads before iTunesDB): the header as it stands with byte 0xa8 set to 1, the rest
+// compressed with zlib at level 1, and the header's total length (bytes 8 to 11, little-endian)
+// set to the compressed file's size. Replaces the iTunesDB that WriteIPodDatabase wrote.
+void CompressIPodDatabase(const std::string& mountpoint) {
+    const std::string plain = ReadFile(IPodDatabasePath(mountpoint));
+    ASSERT_GT(plain.size(), 0xa8u);
+    const auto le32 = [](const std::string& bytes, std::size_t at) {
+        return static_cast<std::uint32_t>(static_cast<unsigned char>(bytes[at])) |
+               static_cast<std::uint32_t>(static_cast<unsigned char>(bytes[at + 1])) << 8 |
+               static_cast<std::uint32_t>(static_cast<unsigned char>(bytes[at + 2])) << 16 |
+               static_cast<std::uint32_t>(static_cast<unsigned char>(bytes[at + 3])) << 24;
+    };
+    const std::uint32_t headerBytes = le32(plain, 4);
+    ASSERT_GT(headerBytes, 0xa8u);
+    ASSERT_LT(headerBytes, plain.size());
+    uLongf compressedBytes = compressBound(plain.size() - headerBytes);
+    std::string file(headerBytes + compressedBytes, '\0');
+    ASSERT_EQ(compress2(reinterpret_cast<Bytef*>(&file[headerBytes]), &compressedBytes,
+                        reinterpret_cast<const Bytef*>(plain.data() + headerBytes),
+                        plain.size() - headerBytes, 1),
+              Z_OK);
+    file.replace(0, headerBytes, plain, 0, headerBytes);
+    file.resize(headerBytes + compressedBytes);
+    file[0xa8] = 1;
+    for (int i = 0; i < 4; ++i)
+        file[8 + i] = static_cast<char>((file.size() >> (8 * i)) & 0xff);
+    WriteFile(mountpoint + "/iPod_Control/iTunes/iTunesCDB", file);
+    ASSERT_EQ(unlink(IPodDatabasePath(mountpoint).c_str()), 0);
+}
+
+// The hang as it was found: two changed bytes of a valid database make libgpod spin at full CPU
+// for good. Here the two bytes are the low half of the compressed database's total length, which
+// then says 256: the compressed part ends early, and libgpod's inflate loop keeps asking zlib for
+// more of it, which never comes. Every root tree and iPod refresh of every user hung while such an
+// iPod was attached.
+TEST_F(Hostile, IPodDatabaseThatSpinsTheParserFailsTheListingAfterFiveSeconds) {
+    const std::string mountpoint = "/tmp/ipod";
+    const std::vector<std::uint64_t> ids = AttachIPod({"Road Trip", "Gym"}, mountpoint);
+    CompressIPodDatabase(mountpoint);
+    ScriptedDaemon daemon(ServeMediaServers({}));
+    CgiRequest refresh;
+    refresh.queryString = "action=refresh&target=ipod";
+
+    // Intact, libgpod reads it: both playlists are listed.
+    const CgiResult intact = Run(refresh);
+    EXPECT_EQ(intact.json["items"].size(), 2u) << intact.body;
+    EXPECT_NE(intact.body.find("\"ipod_" + IPodKey(ids[1]) + "\""), std::string::npos);
+    EXPECT_TRUE(intact.LogMessages().empty());
+
+    const std::string database = mountpoint + "/iPod_Control/iTunes/iTunesCDB";
+    std::string damaged = ReadFile(database);
+    damaged[8] = '\x00';
+    damaged[9] = '\x01';
+    WriteFile(database, damaged);
+
+    CgiRequest root;
+    root.queryString = "action=gettreenode&node=audiotree_root";
+    const CgiResult r = Run(root);
+    ExpectIPodListingCutAtTheTimeLimit(r, mountpoint);
+    EXPECT_NE(r.body.find("\"ipod_refresh\""), std::string::npos);
+    EXPECT_EQ(r.body.find("\"ipod_" + IPodKey(ids[0]) + "\""), std::string::npos);
+
     const CgiResult again = Run(refresh);
     ExpectIPodListingCutAtTheTimeLimit(again, mountpoint);
     EXPECT_EQ(again.body, "{\"items\":null,\"success\":true}\n");
