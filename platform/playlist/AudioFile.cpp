@@ -28,10 +28,13 @@
 
 #include "LibraryDatabase.h"
 #include "PlatformPaths.h"
+#include "posix/FileDescriptor.h"
 #include "sqlite/Database.h"
 
 namespace harmona::playlist {
 namespace {
+
+using harmona::posix::FileDescriptor;
 
 // Artist and title are cut to this many bytes (on a UTF-8 boundary); nothing in the file is
 // trusted, and a display text needs no more.
@@ -269,27 +272,6 @@ bool WriteAll(int fd, const std::string& text) {
     return true;
 }
 
-class Descriptor {
-  public:
-    explicit Descriptor(int fd) : fd_(fd) {}
-    ~Descriptor() {
-        if (fd_ >= 0)
-            close(fd_);
-    }
-    Descriptor(const Descriptor&) = delete;
-    Descriptor& operator=(const Descriptor&) = delete;
-    int Get() const { return fd_; }
-    // Closes now and reports whether the close succeeded (a late write error shows here).
-    bool Close() {
-        const int fd = fd_;
-        fd_ = -1;
-        return close(fd) == 0;
-    }
-
-  private:
-    int fd_;
-};
-
 // A name for the temporary file that no random playlist can have (those begin with "==").
 std::string TemporaryName(const std::string& base, Generator& random) {
     static constexpr char kLetters[] = "abcdefghijklmnopqrstuvwxyz0123456789";
@@ -334,14 +316,14 @@ bool ReplaceFile(const char* path, const std::string& text) {
     if (base.empty() || base == "." || base == "..")
         return false;
 
-    Descriptor dir(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    FileDescriptor dir(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     if (dir.Get() < 0 || !MayReplace(dir.Get(), full, base))
         return false;
     Generator random = SeededGenerator();
     for (int attempt = 0; attempt < 16; ++attempt) {
         const std::string temporary = TemporaryName(base, random);
-        Descriptor file(openat(dir.Get(), temporary.c_str(),
-                               O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
+        FileDescriptor file(openat(dir.Get(), temporary.c_str(),
+                                   O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
         if (file.Get() < 0) {
             if (errno == EEXIST)
                 continue;
