@@ -8,6 +8,7 @@
 
 #include "AudioUsers.h"
 #include "PlatformPaths.h"
+#include "RequestOrigin.h"
 #include "UILanguage.h"
 
 namespace {
@@ -31,7 +32,11 @@ bool WebMan::IsValidUserName(const std::string& name) {
 int WebMan::IsAuthorized(const char* /*application*/, int /*level*/,
                          tag_cgi_position /*position*/) {
     const char* user = Env("REMOTE_USER");
-    if (user != nullptr && IsValidUserName(user))
+    // A page of another site acts in the user's name only through his browser: such a request
+    // gets the same answer as one without a valid login, before anything runs.
+    const bool crossSite = harmona::cgi::IsCrossSiteRequest(Env("HTTP_SEC_FETCH_SITE"),
+                                                            Env("HTTP_ORIGIN"), Env("HTTP_HOST"));
+    if (user != nullptr && IsValidUserName(user) && !crossSite)
         return 1;
     std::fputs("Status: 401 Unauthorized\r\n\r\n", stdout);
     std::fflush(stdout);

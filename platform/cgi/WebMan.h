@@ -13,7 +13,8 @@ class WebMan {
   public:
     // Nonzero when REMOTE_USER names a valid user (1 to 64 bytes, no '/', no control byte or 0x7f,
     // neither "." nor ".."). A refused caller gets the CGI header "Status: 401 Unauthorized" and an
-    // empty line on standard output, and nothing else.
+    // empty line on standard output, and nothing else. A request that a page of another site sent
+    // (RequestOrigin.h) is refused the same way.
     int IsAuthorized(const char* application, int level, tag_cgi_position position);
 
     // Loads the parameters: a urlencoded POST body first, then the query string.

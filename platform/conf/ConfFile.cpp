@@ -8,6 +8,8 @@
 #include <cerrno>
 #include <string>
 
+#include "posix/FileDescriptor.h"
+
 namespace harmona::conf {
 namespace {
 
@@ -99,21 +101,6 @@ std::string_view SkipBom(std::string_view text) {
     return text;
 }
 
-class FileDescriptor {
-  public:
-    explicit FileDescriptor(int fd) : fd_(fd) {}
-    ~FileDescriptor() {
-        if (fd_ >= 0)
-            close(fd_);
-    }
-    FileDescriptor(const FileDescriptor&) = delete;
-    FileDescriptor& operator=(const FileDescriptor&) = delete;
-    int get() const { return fd_; }
-
-  private:
-    int fd_;
-};
-
 class LookupVisitor : public ConfVisitor {
   public:
     LookupVisitor(std::optional<std::string_view> section, std::string_view key)
@@ -145,11 +132,11 @@ void ParseConf(std::string_view text, ConfVisitor& visitor) {
 ReadResult ReadConf(const char* path, ConfVisitor& visitor) {
     if (path == nullptr)
         return ReadResult::missing;
-    FileDescriptor fd(open(path, O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
-    if (fd.get() < 0)
+    harmona::posix::FileDescriptor fd(open(path, O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
+    if (fd.Get() < 0)
         return (errno == ENOENT || errno == ENOTDIR) ? ReadResult::missing : ReadResult::unreadable;
     struct stat st {};
-    if (fstat(fd.get(), &st) != 0 || !S_ISREG(st.st_mode))
+    if (fstat(fd.Get(), &st) != 0 || !S_ISREG(st.st_mode))
         return ReadResult::unreadable;
 
     LineSplitter splitter(visitor);
@@ -157,7 +144,7 @@ ReadResult ReadConf(const char* path, ConfVisitor& visitor) {
     std::size_t total = 0;
     while (total < kMaxConfBytes) {
         const std::size_t want = std::min(sizeof(buffer), kMaxConfBytes - total);
-        const ssize_t n = read(fd.get(), buffer, want);
+        const ssize_t n = read(fd.Get(), buffer, want);
         if (n < 0) {
             if (errno == EINTR)
                 continue;

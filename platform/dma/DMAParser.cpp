@@ -1,5 +1,7 @@
 #include "DMAParser.h"
 
+#include <syslog.h>
+
 #include <algorithm>
 #include <chrono>
 #include <climits>
@@ -56,6 +58,12 @@ int DMAParser::Fail(std::string why) {
     return 1;
 }
 
+int DMAParser::Refuse(const DMABrowse& browse, const std::string& why) {
+    syslog(LOG_ERR, "browse: object %s of %s refused: %s", browse.objectId.c_str(),
+           browse.ControlUrl().c_str(), why.c_str());
+    return Fail("too large: " + why);
+}
+
 int DMAParser::Parse(DMABrowse* browse) {
     Clear();
     error_.clear();
@@ -76,6 +84,7 @@ int DMAParser::Parse(DMABrowse* browse) {
                                    harmona::dma::kBrowseSoapAction};
     const bool fetchAll = browse->requestedCount == 0;
     unsigned long index = browse->startingIndex;
+    std::size_t textBytes = 0;  // of the objects of every page so far
     for (bool firstPage = true;; firstPage = false) {
         const long remainingMs = static_cast<long>(
             std::chrono::duration_cast<std::chrono::milliseconds>(deadline - Clock::now()).count());
@@ -97,8 +106,13 @@ int DMAParser::Parse(DMABrowse* browse) {
         request.sinkContext = &reply;
         request.expect = ExpectReplySize;
         harmona_http_post_result outcome{};
-        if (post(&request, &outcome) != 0)
-            return Fail(reply.tooLarge ? "reply over the size limit" : outcome.error);
+        if (post(&request, &outcome) != 0) {
+            if (reply.tooLarge)
+                return Refuse(
+                    *browse,
+                    "a reply over " + std::to_string(harmona::dma::kMaxReplyBytes >> 20) + " MiB");
+            return Fail(outcome.error);
+        }
         if (outcome.status != 200)
             return Fail("HTTP status " + std::to_string(outcome.status));
 
@@ -116,9 +130,26 @@ int DMAParser::Parse(DMABrowse* browse) {
             break;
         // The DIDL-Lite text usually lies inside the reply buffer (see BrowsePage), which lives
         // until this page is done.
-        const long count = harmona::dma::ParseDidl(page.ResultData(), page.ResultSize(), items_);
+        const std::size_t treeBytes =
+            harmona::dma::EstimatedDidlTreeBytes(page.ResultData(), page.ResultSize());
+        if (treeBytes > harmona::dma::kMaxDidlTreeBytes)
+            return Refuse(*browse, "a page would take " + std::to_string(treeBytes >> 20) +
+                                       " MiB to parse, more than " +
+                                       std::to_string(harmona::dma::kMaxDidlTreeBytes >> 20));
+        const long count = harmona::dma::ParseDidl(page.ResultData(), page.ResultSize(), items_,
+                                                   harmona::dma::kMaxBrowseObjects);
+        if (count == harmona::dma::kTooManyObjects)
+            return Refuse(*browse, "more than " + std::to_string(harmona::dma::kMaxBrowseObjects) +
+                                       " objects");
         if (count < 0)
             return Fail("Result is not DIDL-Lite");
+        for (std::size_t i = items_.size() - static_cast<std::size_t>(count); i < items_.size();
+             ++i)
+            textBytes += items_[i]->TextBytes();
+        if (textBytes > harmona::dma::kMaxBrowseTextBytes)
+            return Refuse(*browse, "objects of more than " +
+                                       std::to_string(harmona::dma::kMaxBrowseTextBytes >> 20) +
+                                       " MiB of text");
         index += static_cast<unsigned long>(count);
         // Ask again from the next index while a page brought objects and some are still missing.
         if (!fetchAll || count == 0 || index >= page.totalMatches || index > UINT_MAX)

@@ -21,7 +21,10 @@ class DMAParser {
     // Sends the prepared browse (every page of it when requestedCount is 0) and parses the reply;
     // 0 on a BrowseResponse; non-zero on no connection within 2 s, no whole reply within 20 s (all
     // pages together), an HTTP status other than 200, a SOAP fault, malformed XML, a Result that is
-    // not DIDL-Lite, a reply over 64 MiB or a missing HTTP plugin (Error() says which).
+    // not DIDL-Lite, a missing HTTP plugin (Error() says which), or a browse too large for a
+    // request's memory: a reply over 64 MiB, a page whose parse would take more than
+    // kMaxDidlTreeBytes, more than kMaxBrowseObjects objects or kMaxBrowseTextBytes of their
+    // values in all (SoapBrowse.h; these four with a log line).
     int Parse(DMABrowse* browse);
 
     // The parse result: null when the reply had no Result (or an empty one), else the DIDL-Lite
@@ -36,6 +39,8 @@ class DMAParser {
   private:
     void Clear();
     int Fail(std::string why);
+    // Fails for a reply too large for the request's memory bound, with a log line.
+    int Refuse(const DMABrowse& browse, const std::string& why);
 
     ItemList items_;
     bool hasResult_ = false;

@@ -32,6 +32,9 @@ class ItemNode {
     // halves what they take.
     void Assign(const std::array<std::string_view, kFieldCount>& values);
 
+    // The bytes of all eight values together.
+    std::size_t TextBytes() const { return values_.size(); }
+
     bool isContainer = false;
 
   private:

@@ -283,7 +283,24 @@ void FillItem(pugi::xml_node object, ItemNode& item, ItemScratch& scratch) {
 
 }  // namespace
 
-long ParseDidl(char* didl, std::size_t size, std::vector<ItemNode*>& items) {
+std::size_t EstimatedDidlTreeBytes(const char* didl, std::size_t size) {
+    std::size_t nodes = 0;
+    std::size_t attributes = 0;
+    char before = '>';
+    for (std::size_t i = 0; i < size; ++i) {
+        const char c = didl[i];
+        if (c == '<') {
+            const bool closing = i + 1 < size && didl[i + 1] == '/';
+            nodes += (closing ? 0 : 1) + (before != '>' ? 1 : 0);
+        } else if (c == '=') {
+            ++attributes;
+        }
+        before = c;
+    }
+    return nodes * kDidlBytesPerNode + attributes * kDidlBytesPerAttribute;
+}
+
+long ParseDidl(char* didl, std::size_t size, std::vector<ItemNode*>& items, std::size_t maxItems) {
     pugi::xml_document document;
     if (!ParseInPlace(document, didl, size))
         return -1;
@@ -295,6 +312,8 @@ long ParseDidl(char* didl, std::size_t size, std::vector<ItemNode*>& items) {
     for (pugi::xml_node object : root.children()) {
         if (!Is(object, kDidlNs, "container") && !Is(object, kDidlNs, "item"))
             continue;
+        if (items.size() >= maxItems)
+            return kTooManyObjects;
         auto* item = new ItemNode;
         FillItem(object, *item, scratch);
         items.push_back(item);

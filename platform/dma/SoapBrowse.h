@@ -27,6 +27,25 @@ inline constexpr long kConnectTimeoutMs = 2000;
 inline constexpr long kWholeReplyTimeoutMs = 20000;
 inline constexpr std::size_t kMaxReplyBytes = 64u * 1024u * 1024u;
 
+// What one request's memory bound (RequestMemory.h) leaves for a browse. The reply's text is
+// bounded above; the parsed document of a page and the objects of all pages are bounded here:
+// - the parsed DIDL-Lite tree of one page: pugixml takes kDidlBytesPerNode per node (an element,
+//   or a run of text) and kDidlBytesPerAttribute per attribute, estimated from the text before it
+//   is parsed: every `<` that is not a closing tag may open an element, every `<` after something
+//   other than `>` may end a run of text, and every `=` may be an attribute, so the estimate is
+//   never below the truth;
+// - the objects of the whole browse, each kept as an ItemNode and then written as a tree node: at
+//   most kMaxBrowseObjects of them, with at most kMaxBrowseTextBytes of values in all (a browse of
+//   many pages is not bounded by the reply limit, which holds per page).
+inline constexpr std::size_t kDidlBytesPerNode = 64;
+inline constexpr std::size_t kDidlBytesPerAttribute = 40;
+inline constexpr std::size_t kMaxDidlTreeBytes = std::size_t{192} << 20;
+inline constexpr std::size_t kMaxBrowseObjects = 200000;
+inline constexpr std::size_t kMaxBrowseTextBytes = std::size_t{48} << 20;
+
+// The memory that parsing `didl` would take at most, by the estimate above.
+std::size_t EstimatedDidlTreeBytes(const char* didl, std::size_t size);
+
 // Escapes & < > " ' and CR, LF, TAB (as character references, so that they survive the
 // receiver's line-end and attribute normalisation). Other bytes, UTF-8 included, stay as they are.
 std::string XmlEscape(const std::string& text);
@@ -63,8 +82,12 @@ enum class ReplyStatus { Ok, Malformed, Fault, NotBrowseResponse };
 ReplyStatus ParseBrowseResponse(std::string& reply, BrowsePage& page);
 
 // Appends the DIDL-Lite document's container and item objects, in document order, to `items` (new
-// objects, owned by the caller); the number appended, or -1 when the document is not DIDL-Lite XML.
-long ParseDidl(char* didl, std::size_t size, std::vector<ItemNode*>& items);
+// objects, owned by the caller); the number appended, -1 when the document is not DIDL-Lite XML, or
+// kTooManyObjects when `items` would grow past `maxItems` (what was appended stays, for the caller
+// to free).
+inline constexpr long kTooManyObjects = -2;
+long ParseDidl(char* didl, std::size_t size, std::vector<ItemNode*>& items,
+               std::size_t maxItems = static_cast<std::size_t>(-1));
 inline long ParseDidl(std::string& didl, std::vector<ItemNode*>& items) {
     return ParseDidl(didl.data(), didl.size(), items);
 }

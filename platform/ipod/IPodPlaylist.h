@@ -13,10 +13,19 @@
 // UTF-8 boundary), key = its 64-bit id as 16 lowercase hexadecimal digits. Returns 0 with *head
 // set (null when there is no playlist; free with VANUPlayListFree), or -1 with *head null when the
 // mountpoint file is missing or unusable, the database cannot be read or the reader plugin is
-// missing.
+// missing, or the reading took longer than kReadTimeoutMs (one log line naming the mountpoint), or
+// the iPod holds more than kMaxIPodPlaylists playlists (one log line).
 int VANUIPodPlaylistGetAll(PLAYLIST_INFO** head);
 
 namespace harmona::ipod {
+
+// The database is read in a child process that is killed when it has not answered within this
+// time: libgpod's parser can spin for good on a damaged database. A real iPod's database, even of
+// tens of thousands of tracks, is read in well under a second.
+inline constexpr int kReadTimeoutMs = 5000;
+
+// An iPod with more playlists than this is not listed (no real one has that many).
+inline constexpr std::size_t kMaxIPodPlaylists = playlist::kMaxPlaylistRecords;
 
 // The longest first line of the mountpoint file that is accepted (PATH_MAX - 1).
 inline constexpr std::size_t kMaxMountpointBytes = 4095;

@@ -8,26 +8,11 @@
 #include <cstring>
 
 #include "IPodPlaylist.h"
+#include "posix/FileDescriptor.h"
 
 namespace harmona::ipod {
 
 namespace {
-
-// Closes a descriptor when it leaves scope.
-class FileDescriptor {
-  public:
-    explicit FileDescriptor(int fd) : fd_(fd) {}
-    ~FileDescriptor() {
-        if (fd_ >= 0)
-            close(fd_);
-    }
-    FileDescriptor(const FileDescriptor&) = delete;
-    FileDescriptor& operator=(const FileDescriptor&) = delete;
-    int Get() const { return fd_; }
-
-  private:
-    int fd_;
-};
 
 // Reads up to `size` bytes (fewer at the end of the file); -1 on a read error.
 ssize_t ReadUpTo(int fd, char* buffer, std::size_t size) {
@@ -51,7 +36,8 @@ bool ReadMountpoint(const char* path, std::string& mountpoint) {
     mountpoint.clear();
     // O_NONBLOCK: a FIFO planted at the path must not make the request wait; only a regular file
     // is read.
-    const FileDescriptor file(open(path, O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK));
+    const harmona::posix::FileDescriptor file(
+        open(path, O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK));
     if (file.Get() < 0)
         return false;
     struct stat status {};

@@ -9,8 +9,10 @@
 #include "AudioFile.h"
 
 #include <fcntl.h>
+#include <pwd.h>
 #include <sys/random.h>
 #include <sys/stat.h>
+#include <syslog.h>
 #include <time.h>
 #include <unistd.h>
 
@@ -24,12 +26,15 @@
 #include <unordered_set>
 #include <vector>
 
-#include "sqlite/Database.h"
 #include "LibraryDatabase.h"
 #include "PlatformPaths.h"
+#include "posix/FileDescriptor.h"
+#include "sqlite/Database.h"
 
 namespace harmona::playlist {
 namespace {
+
+using harmona::posix::FileDescriptor;
 
 // Artist and title are cut to this many bytes (on a UTF-8 boundary); nothing in the file is
 // trusted, and a display text needs no more.
@@ -267,27 +272,6 @@ bool WriteAll(int fd, const std::string& text) {
     return true;
 }
 
-class Descriptor {
-  public:
-    explicit Descriptor(int fd) : fd_(fd) {}
-    ~Descriptor() {
-        if (fd_ >= 0)
-            close(fd_);
-    }
-    Descriptor(const Descriptor&) = delete;
-    Descriptor& operator=(const Descriptor&) = delete;
-    int Get() const { return fd_; }
-    // Closes now and reports whether the close succeeded (a late write error shows here).
-    bool Close() {
-        const int fd = fd_;
-        fd_ = -1;
-        return close(fd) == 0;
-    }
-
-  private:
-    int fd_;
-};
-
 // A name for the temporary file that no random playlist can have (those begin with "==").
 std::string TemporaryName(const std::string& base, Generator& random) {
     static constexpr char kLetters[] = "abcdefghijklmnopqrstuvwxyz0123456789";
@@ -296,6 +280,29 @@ std::string TemporaryName(const std::string& base, Generator& random) {
     for (int i = 0; i < 8; ++i)
         name += kLetters[letter(random)];
     return name;
+}
+
+// The name of the user `uid`, or "?" when the system does not know it.
+std::string UserNameOf(uid_t uid) {
+    passwd entry{};
+    passwd* found = nullptr;
+    char buffer[1024];
+    if (getpwuid_r(uid, &entry, buffer, sizeof buffer, &found) == 0 && found != nullptr)
+        return found->pw_name;
+    return "?";
+}
+
+// A file (or link) at `path` that another user owns is not ours to replace: in the shared,
+// sticky temporary folder the rename would be refused anyway, and taking over another user's file
+// elsewhere is never wanted. Someone made it on purpose or by mistake; the administrator learns
+// here whose it is, so that he can remove it. True when `base` is absent or ours.
+bool MayReplace(int dirFd, const std::string& path, const std::string& base) {
+    struct stat st {};
+    if (fstatat(dirFd, base.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0 || st.st_uid == geteuid())
+        return true;
+    syslog(LOG_ERR, "random playlist: cannot replace %s: it belongs to user %s (uid %u)",
+           path.c_str(), UserNameOf(st.st_uid).c_str(), static_cast<unsigned>(st.st_uid));
+    return false;
 }
 
 // Writes `text` to a new file in the folder of `path` and renames it over `path`. Both names are
@@ -309,14 +316,14 @@ bool ReplaceFile(const char* path, const std::string& text) {
     if (base.empty() || base == "." || base == "..")
         return false;
 
-    Descriptor dir(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    if (dir.Get() < 0)
+    FileDescriptor dir(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (dir.Get() < 0 || !MayReplace(dir.Get(), full, base))
         return false;
     Generator random = SeededGenerator();
     for (int attempt = 0; attempt < 16; ++attempt) {
         const std::string temporary = TemporaryName(base, random);
-        Descriptor file(openat(dir.Get(), temporary.c_str(),
-                               O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
+        FileDescriptor file(openat(dir.Get(), temporary.c_str(),
+                                   O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
         if (file.Get() < 0) {
             if (errno == EEXIST)
                 continue;
@@ -325,7 +332,11 @@ bool ReplaceFile(const char* path, const std::string& text) {
         const bool written = WriteAll(file.Get(), text) && file.Close();
         if (written && renameat(dir.Get(), temporary.c_str(), dir.Get(), base.c_str()) == 0)
             return true;
+        const int renameError = errno;
         unlinkat(dir.Get(), temporary.c_str(), 0);
+        // Another user's file put there since the test above: say whose, as above.
+        if (written && (renameError == EPERM || renameError == EACCES))
+            MayReplace(dir.Get(), full, base);
         return false;
     }
     return false;

@@ -12,9 +12,9 @@
 #include <string_view>
 #include <vector>
 
-#include "sqlite/Database.h"
 #include "LibraryDatabase.h"
 #include "PlatformPaths.h"
+#include "sqlite/Database.h"
 
 namespace harmona::playlist {
 namespace {
@@ -78,8 +78,11 @@ int ListSharedPlaylists(const char* path, PLAYLIST_INFO** head, int offset, int 
         const std::int64_t id = select.ColumnInt64(0);
         if (select.ColumnType(0) != SQLITE_INTEGER || id < 0 || id > 0xFFFFFFFFll)
             continue;
-        if (!list.Append(static_cast<std::uint32_t>(id), select.ColumnText(1), {}))
+        if (!list.Append(static_cast<std::uint32_t>(id), select.ColumnText(1), {})) {
+            if (list.Full())
+                LogListTooLong(std::string("shared playlists in ") + path, kMaxPlaylistRecords);
             return -1;
+        }
     }
     if (code != SQLITE_DONE)
         return -1;
@@ -98,21 +101,39 @@ int VANUPersonalPlaylistListAll(const char* prefDir, PLAYLIST_INFO** head, int o
     if (prefDir == nullptr)
         return -1;
 
+    // Only a real folder is listed: a symbolic link in its place could show another user's
+    // playlist names (O_NOFOLLOW refuses it with ELOOP, like any folder that cannot be read).
     const std::string folder = std::string(prefDir) + "/playlists";
-    DIR* dir = opendir(folder.c_str());
-    if (dir == nullptr)
+    const int folderFd = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+    if (folderFd < 0)
         return errno == ENOENT ? 0 : -1;
+    DIR* dir = fdopendir(folderFd);
+    if (dir == nullptr) {
+        close(folderFd);
+        return -1;
+    }
 
     std::vector<std::string> names;
     std::string name;
     errno = 0;
+    bool tooMany = false;
     while (const dirent* entry = readdir(dir)) {
-        if (PlaylistNameOf(entry->d_name, name) && IsRegularFile(dirfd(dir), *entry))
+        if (PlaylistNameOf(entry->d_name, name) && IsRegularFile(dirfd(dir), *entry)) {
+            // Counted while the folder is read: a folder of millions of files costs no memory.
+            if (names.size() == kMaxPlaylistRecords) {
+                tooMany = true;
+                break;
+            }
             names.push_back(name);
+        }
         errno = 0;
     }
     const bool readFailed = errno != 0;
     closedir(dir);
+    if (tooMany) {
+        LogListTooLong("playlists in " + folder, kMaxPlaylistRecords);
+        return -1;
+    }
     if (readFailed)
         return -1;
 

@@ -1,5 +1,7 @@
 #include "PlaylistRecord.h"
 
+#include <syslog.h>
+
 #include <cstdlib>
 #include <cstring>
 
@@ -28,7 +30,14 @@ void CopyUtf8Field(char* field, std::size_t size, std::string_view text) {
     field[length] = '\0';
 }
 
+void LogListTooLong(const std::string& what, std::size_t maxRecords) {
+    syslog(LOG_ERR, "playlist list: more than %zu %s; the listing is refused", maxRecords,
+           what.c_str());
+}
+
 bool PlaylistListBuilder::Append(std::uint32_t id, std::string_view name, std::string_view key) {
+    if (Full())
+        return false;
     // Not zero-filled: a record is 4.6 KB of which a listing reads two short NUL-terminated texts,
     // and clearing a thousand of them cost a thousand page faults and most of a root request's
     // time (bench/roottree). Every field that is read is written here.
@@ -44,6 +53,7 @@ bool PlaylistListBuilder::Append(std::uint32_t id, std::string_view name, std::s
     else
         tail_->pNext = record;
     tail_ = record;
+    ++count_;
     return true;
 }
 

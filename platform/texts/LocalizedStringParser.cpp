@@ -1,5 +1,7 @@
 #include "LocalizedStringParser.h"
 
+#include <syslog.h>
+
 #include "ConfFile.h"
 
 namespace VANU::ZET {
@@ -16,13 +18,23 @@ class TextsVisitor : public harmona::conf::ConfVisitor {
     }
     // Keys before the first section belong to no section and have no place in the table.
     void Entry(std::string_view key, std::string_view value) override {
-        if (section_ != nullptr)
-            (*section_)[std::string(key)] = std::string(value);
+        if (section_ == nullptr)
+            return;
+        if (entries_ == kMaxTextEntries) {
+            tooMany_ = true;
+            return;
+        }
+        ++entries_;
+        (*section_)[std::string(key)] = std::string(value);
     }
+
+    bool TooMany() const { return tooMany_; }
 
   private:
     Json::Value& texts_;
     Json::Value* section_ = nullptr;
+    std::size_t entries_ = 0;
+    bool tooMany_ = false;
 };
 
 }  // namespace
@@ -32,6 +44,9 @@ Json::Value LocalizedStringParser::ParseTexts(std::string path) {
     TextsVisitor visitor(texts);
     const std::string file = path + "/strings";
     harmona::conf::ReadConf(file.c_str(), visitor);
+    if (visitor.TooMany())
+        syslog(LOG_ERR, "texts: %s holds more than %zu texts; the rest are ignored", file.c_str(),
+               kMaxTextEntries);
     return texts;
 }
 

@@ -4,17 +4,25 @@
 // itself within its time limit, its peak memory, and that no file changed but the one the action
 // writes.
 #include <gtest/gtest.h>
+#include <zlib.h>
 
+#include <sys/prctl.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
+#include <map>
 
 #include "CgiRunner.h"
 #include "Fixtures.h"
+#include "IPodFixtures.h"
 #include "PlaylistFixtures.h"
+#include "RequestMemory.h"
 #include "ScriptedDaemon.h"
 #include "ScriptedHttpServer.h"
+#include "SoapBrowse.h"
 
 using namespace harmona::test;
 using Strings = std::vector<std::string>;
@@ -254,6 +262,348 @@ TEST_F(Hostile, MediaServerWithTwoHundredThousandObjects) {
     EXPECT_LT(r.peakRssKb, 1024L * 1024 * kMemoryFactor);
 }
 
+// Makes this test process the reaper of its orphaned descendants: a process that the CGI forked
+// and left behind would become its child when the CGI ends.
+void AdoptOrphans() {
+    ASSERT_EQ(prctl(PR_SET_CHILD_SUBREAPER, 1), 0);
+}
+
+// True when this process has no child at all (the CGI was reaped by the test kit; any process it
+// left behind would have been adopted here).
+bool NoProcessLeftBehind() {
+    int status = 0;
+    return waitpid(-1, &status, WNOHANG) == -1 && errno == ECHILD;
+}
+
+// Checks a request over an iPod whose database is never read to its end: the listing fails after
+// the time limit with the log line naming the mountpoint, the category shows its refresh button
+// alone, and no reading process is left behind.
+void ExpectIPodListingCutAtTheTimeLimit(const CgiResult& r, const std::string& mountpoint) {
+    ASSERT_TRUE(r.exited) << "timed out: " << r.timedOut;
+    EXPECT_EQ(r.exitStatus, 1);
+    const std::string cut = "iPod: the database of the iPod mounted at " + mountpoint +
+                            " was not read within 5 seconds; its playlists are not listed";
+    EXPECT_EQ(r.LogMessages(), std::vector<std::string>{cut});
+    EXPECT_GE(r.wallMs, 4900);
+    EXPECT_LT(r.wallMs, 15000);
+    EXPECT_TRUE(NoProcessLeftBehind());
+}
+
+// A database that libgpod waits for forever: a FIFO in its place (libgpod opens it and blocks,
+// as no writer ever comes).
+TEST_F(Hostile, IPodDatabaseThatIsNeverReadToItsEndFailsTheListingAfterFiveSeconds) {
+    const std::string mountpoint = "/tmp/ipod";
+    MakeDirs(mountpoint + "/iPod_Control/iTunes");
+    ASSERT_EQ(mkfifo((mountpoint + "/iPod_Control/iTunes/iTunesDB").c_str(), 0644), 0);
+    WriteFile("/usr/vanu/etc/audio/ipod/mountpoint", mountpoint + "\n");
+    ScriptedDaemon daemon(ServeMediaServers({}));
+    AdoptOrphans();
+
+    CgiRequest root;
+    root.queryString = "action=gettreenode&node=audiotree_root";
+    const CgiResult r = Run(root);
+    ExpectIPodListingCutAtTheTimeLimit(r, mountpoint);
+    // The iPod category holds its refresh button alone, as for any failed listing.
+    ASSERT_TRUE(r.json.isArray());
+    bool sawIPod = false;
+    for (const Json::Value& category : r.json) {
+        if (category["id"] != "ipod_root")
+            continue;
+        sawIPod = true;
+        ASSERT_EQ(category["children"].size(), 1u);
+        EXPECT_EQ(category["children"][0]["id"], "ipod_refresh");
+    }
+    EXPECT_TRUE(sawIPod) << r.body.substr(0, 300);
+
+    CgiRequest refresh;
+    refresh.queryString = "action=refresh&target=ipod";
+    const CgiResult again = Run(refresh);
+    ExpectIPodListingCutAtTheTimeLimit(again, mountpoint);
+    EXPECT_EQ(again.body, "{\"items\":null,\"success\":true}\n");
+}
+
+// The database as libgpod stores it for the iPods that keep it compressed (iTunesCDB, which
+// itdb_parse reads before iTunesDB): the header as it stands with byte 0xa8 set to 1, the rest
+// compressed with zlib at level 1, and the header's total length (bytes 8 to 11, little-endian)
+// set to the compressed file's size. Replaces the iTunesDB that WriteIPodDatabase wrote.
+void CompressIPodDatabase(const std::string& mountpoint) {
+    const std::string plain = ReadFile(IPodDatabasePath(mountpoint));
+    ASSERT_GT(plain.size(), 0xa8u);
+    const auto le32 = [](const std::string& bytes, std::size_t at) {
+        return static_cast<std::uint32_t>(static_cast<unsigned char>(bytes[at])) |
+               static_cast<std::uint32_t>(static_cast<unsigned char>(bytes[at + 1])) << 8 |
+               static_cast<std::uint32_t>(static_cast<unsigned char>(bytes[at + 2])) << 16 |
+               static_cast<std::uint32_t>(static_cast<unsigned char>(bytes[at + 3])) << 24;
+    };
+    const std::uint32_t headerBytes = le32(plain, 4);
+    ASSERT_GT(headerBytes, 0xa8u);
+    ASSERT_LT(headerBytes, plain.size());
+    uLongf compressedBytes = compressBound(plain.size() - headerBytes);
+    std::string file(headerBytes + compressedBytes, '\0');
+    ASSERT_EQ(compress2(reinterpret_cast<Bytef*>(&file[headerBytes]), &compressedBytes,
+                        reinterpret_cast<const Bytef*>(plain.data() + headerBytes),
+                        plain.size() - headerBytes, 1),
+              Z_OK);
+    file.replace(0, headerBytes, plain, 0, headerBytes);
+    file.resize(headerBytes + compressedBytes);
+    file[0xa8] = 1;
+    for (int i = 0; i < 4; ++i)
+        file[8 + i] = static_cast<char>((file.size() >> (8 * i)) & 0xff);
+    WriteFile(mountpoint + "/iPod_Control/iTunes/iTunesCDB", file);
+    ASSERT_EQ(unlink(IPodDatabasePath(mountpoint).c_str()), 0);
+}
+
+// The hang as it was found: two changed bytes of a valid database make libgpod spin at full CPU
+// for good. Here the two bytes are the low half of the compressed database's total length, which
+// then says 256: the compressed part ends early, and libgpod's inflate loop keeps asking zlib for
+// more of it, which never comes. Every root tree and iPod refresh of every user hung while such an
+// iPod was attached.
+TEST_F(Hostile, IPodDatabaseThatSpinsTheParserFailsTheListingAfterFiveSeconds) {
+    const std::string mountpoint = "/tmp/ipod";
+    const std::vector<std::uint64_t> ids = AttachIPod({"Road Trip", "Gym"}, mountpoint);
+    CompressIPodDatabase(mountpoint);
+    ScriptedDaemon daemon(ServeMediaServers({}));
+    AdoptOrphans();
+    CgiRequest refresh;
+    refresh.queryString = "action=refresh&target=ipod";
+
+    // Intact, libgpod reads it: both playlists are listed.
+    const CgiResult intact = Run(refresh);
+    EXPECT_EQ(intact.json["items"].size(), 2u) << intact.body;
+    EXPECT_NE(intact.body.find("\"ipod_" + IPodKey(ids[1]) + "\""), std::string::npos);
+    EXPECT_TRUE(intact.LogMessages().empty());
+
+    const std::string database = mountpoint + "/iPod_Control/iTunes/iTunesCDB";
+    std::string damaged = ReadFile(database);
+    damaged[8] = '\x00';
+    damaged[9] = '\x01';
+    WriteFile(database, damaged);
+
+    CgiRequest root;
+    root.queryString = "action=gettreenode&node=audiotree_root";
+    const CgiResult r = Run(root);
+    ExpectIPodListingCutAtTheTimeLimit(r, mountpoint);
+    EXPECT_NE(r.body.find("\"ipod_refresh\""), std::string::npos);
+    EXPECT_EQ(r.body.find("\"ipod_" + IPodKey(ids[0]) + "\""), std::string::npos);
+
+    const CgiResult again = Run(refresh);
+    ExpectIPodListingCutAtTheTimeLimit(again, mountpoint);
+    EXPECT_EQ(again.body, "{\"items\":null,\"success\":true}\n");
+}
+
+// --- Memory: every request stays within its bound (RequestMemory.h) ----------------------------
+
+// The bound as ru_maxrss counts it (KiB); the sanitizer build sets no address-space limit and needs
+// more for its shadow memory.
+constexpr long kRequestBoundKb =
+    static_cast<long>(harmona::cgi::kRequestMemoryBytes >> 10) * kMemoryFactor;
+
+// A BrowseResponse whose Result holds `count` objects made by `object(i)`, the DIDL-Lite escaped as
+// a media server escapes text (only & < >; quotes need no escape in text). Built as one string
+// and moved into the reply, so that the test process holds it once.
+template <typename Object>
+ScriptedReply PageOf(std::size_t count, std::size_t bytesPerObject, Object object,
+                     std::size_t first = 0, std::size_t total = 0) {
+    std::string body =
+        "<?xml version=\"1.0\" encoding=\"utf-8\"?><s:Envelope "
+        "xmlns:s=\"http://schemas.xmlsoap.org/soap/envelope/\"><s:Body><u:BrowseResponse "
+        "xmlns:u=\"urn:schemas-upnp-org:service:ContentDirectory:1\"><Result>"
+        "&lt;DIDL-Lite xmlns=\"urn:schemas-upnp-org:metadata-1-0/DIDL-Lite/\" "
+        "xmlns:dc=\"http://purl.org/dc/elements/1.1/\" "
+        "xmlns:upnp=\"urn:schemas-upnp-org:metadata-1-0/upnp/\"&gt;";
+    body.reserve(body.size() + count * bytesPerObject + 1024);
+    for (std::size_t i = first; i < first + count; ++i)
+        object(i, body);
+    body += "&lt;/DIDL-Lite&gt;</Result><NumberReturned>" + std::to_string(count) +
+            "</NumberReturned><TotalMatches>" + std::to_string(total > 0 ? total : count) +
+            "</TotalMatches><UpdateID>1</UpdateID></u:BrowseResponse></s:Body></s:Envelope>";
+    ScriptedReply reply;
+    reply.body = std::move(body);
+    return reply;
+}
+
+void TinyObject(std::size_t i, std::string& out) {
+    out += "&lt;item id=\"";
+    out += std::to_string(i);
+    out += "\"/&gt;";
+}
+
+// A track as a real media server describes it: title, class, artist, album and a resource.
+void TrackObject(std::size_t i, std::string& out) {
+    const std::string n = std::to_string(i);
+    out += "&lt;item id=\"64$" + n +
+           "\" parentID=\"64\" restricted=\"1\"&gt;&lt;dc:title&gt;Track " + n +
+           " of a long album title&lt;/dc:title&gt;&lt;upnp:class&gt;object.item.audioItem." +
+           "musicTrack&lt;/upnp:class&gt;&lt;upnp:artist&gt;Artist " + n.substr(0, 3) +
+           "&lt;/upnp:artist&gt;&lt;upnp:album&gt;Album " + n.substr(0, 4) +
+           "&lt;/upnp:album&gt;&lt;res protocolInfo=\"http-get:*:audio/mpeg:*\"&gt;"
+           "http://192.168.1.10:50003/MediaItems/" +
+           n + ".mp3&lt;/res&gt;&lt;/item&gt;";
+}
+
+// Browses "big" on the pages enqueued on `server`.
+CgiResult BrowseBig(ScriptedHttpServer& server) {
+    CgiRequest request;
+    request.queryString = "action=gettreenode&node=musiclib_big";
+    request.timeoutMs = 120000;
+    request.parseJson = false;  // the test process stays small, so that ru_maxrss is the CGI's
+    return RunCgi(request);
+}
+
+CgiResult BrowseBig(ScriptedHttpServer& server, ScriptedReply page) {
+    server.Enqueue(std::move(page));
+    return BrowseBig(server);
+}
+
+// The attack as it was measured: a 61 MiB page (under the 64 MiB reply limit) of 2.5 million tiny
+// objects took 3.2 GB. Now refused before it is parsed, with a log line.
+TEST_F(Hostile, MediaServerPageOfTwoAndAHalfMillionTinyObjectsFailsWithinTheBound) {
+    ScriptedHttpServer server;
+    ASSERT_TRUE(server.Start());
+    ScriptedReply page = PageOf(2500000, 26, TinyObject);
+    EXPECT_GT(page.body.size(), 60u << 20);
+    EXPECT_LT(page.body.size(), harmona::dma::kMaxReplyBytes);
+    const FileSnapshot before = Snapshot();
+    const CgiResult r = BrowseBig(server, std::move(page));
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.body, "[]\n");
+    ASSERT_EQ(r.LogMessages().size(), 1u);
+    EXPECT_NE(r.LogMessages()[0].find("browse: object big of "), std::string::npos);
+    EXPECT_NE(r.LogMessages()[0].find("MiB to parse"), std::string::npos) << r.LogMessages()[0];
+    EXPECT_LT(r.peakRssKb, kRequestBoundKb);
+    EXPECT_TRUE(ChangedPaths(before, Snapshot()).empty());
+    RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
+}
+
+// Objects without attributes parse to less than the tree bound allows, so the object count stops
+// them: the browse ends at the first object past the limit.
+TEST_F(Hostile, MediaServerPageOfBareObjectsFailsAtTheObjectLimitWithinTheBound) {
+    ScriptedHttpServer server;
+    ASSERT_TRUE(server.Start());
+    ScriptedReply page =
+        PageOf(2500000, 13, [](std::size_t, std::string& out) { out += "&lt;item/&gt;"; });
+    const CgiResult r = BrowseBig(server, std::move(page));
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.body, "[]\n");
+    ASSERT_EQ(r.LogMessages().size(), 1u);
+    EXPECT_NE(r.LogMessages()[0].find("more than 200000 objects"), std::string::npos)
+        << r.LogMessages()[0];
+    EXPECT_LT(r.peakRssKb, kRequestBoundKb);
+    RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
+}
+
+// The largest container the bound allows: kMaxBrowseObjects tracks, each described in full, in two
+// pages of 100,000 (a page of 200,000 such objects would pass the 64 MiB reply limit; servers cap
+// their pages). Served whole; one object more is refused.
+TEST_F(Hostile, ContainerOfTwoHundredThousandTracksIsServedWithinTheBound) {
+    ASSERT_EQ(harmona::dma::kMaxBrowseObjects, 200000u);
+    ScriptedHttpServer server;
+    ASSERT_TRUE(server.Start());
+    server.Enqueue(PageOf(100000, 420, TrackObject, 0, 200000));
+    server.Enqueue(PageOf(100000, 420, TrackObject, 100000, 200000));
+    const CgiResult r = BrowseBig(server);
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_EQ(Count(r.body, "\"pid\":\"musiclib_big\""), 200000u);
+    EXPECT_NE(r.body.find("\"text\":\"Track 199999 of a long album title\""), std::string::npos);
+    EXPECT_EQ(r.LogMessages(), std::vector<std::string>{});
+    EXPECT_LT(r.peakRssKb, kRequestBoundKb);
+    RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
+    RecordProperty("wall_ms", std::to_string(static_cast<long>(r.wallMs)));
+
+    server.Enqueue(PageOf(100000, 420, TrackObject, 0, 200001));
+    server.Enqueue(PageOf(100001, 420, TrackObject, 100000, 200001));
+    const CgiResult over = BrowseBig(server);
+    ASSERT_TRUE(over.exited) << over.errors;
+    EXPECT_EQ(over.exitStatus, 0);
+    EXPECT_EQ(over.body, "[]\n");
+    ASSERT_EQ(over.LogMessages().size(), 1u);
+    EXPECT_NE(over.LogMessages()[0].find("more than 200000 objects"), std::string::npos)
+        << over.LogMessages()[0];
+}
+
+// What the readers' bounds let through and still needs more than the bound: one object whose
+// 47 MiB title is all double quotes, which the tree node holds HTML-encoded (six bytes each) twice,
+// as text and tooltip. The address-space limit set at start-up stops it: one log line, no reply at
+// all (the web server answers 500), nothing written.
+TEST_F(Hostile, RequestPastTheAddressSpaceLimitEndsWithALogLineAndNoReply) {
+#ifdef HARMONA_SANITIZE
+    GTEST_SKIP() << "sanitizer builds reserve terabytes of address space and set no limit";
+#endif
+    ScriptedHttpServer server;
+    ASSERT_TRUE(server.Start());
+    const std::size_t titleBytes = 47u << 20;
+    ScriptedReply page = PageOf(1, titleBytes + 100, [&](std::size_t, std::string& out) {
+        out += "&lt;item id=\"q\"&gt;&lt;dc:title&gt;";
+        out.append(titleBytes, '"');
+        out += "&lt;/dc:title&gt;&lt;/item&gt;";
+    });
+    const FileSnapshot before = Snapshot();
+    const CgiResult r = BrowseBig(server, std::move(page));
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.output, "");
+    EXPECT_EQ(r.LogMessages(), std::vector<std::string>{
+                                   "request: out of memory within its bound of 512 MiB; no reply"});
+    EXPECT_TRUE(ChangedPaths(before, Snapshot()).empty());
+}
+
+// The attack as it was measured: an 8 MiB smart playlist file of one-letter sections took 3.0 GB,
+// 15.6 s and a 505 MB reply. Now the file is not listed, with one log line; the ordinary playlists
+// still are.
+TEST_F(Hostile, SmartPlaylistFileOfTwoMillionOneLetterSectionsFailsWithinTheBound) {
+    {
+        std::string sections;
+        sections.reserve(8u << 20);
+        while (sections.size() + 4 <= (8u << 20))
+            sections += "[a]\n";
+        WriteFile(UserSmartPlaylistFile("admin"), sections);
+    }
+    const CgiResult r = RunQuery("action=refresh&target=personal");
+    EXPECT_EQ(r.json["success"], true) << r.body.substr(0, 300);
+    EXPECT_NE(r.body.find("musiclib_music_personal/playlist/Mine"), std::string::npos);
+    EXPECT_EQ(r.body.find("/smart/"), std::string::npos);
+    ASSERT_EQ(r.LogMessages().size(), 1u);
+    EXPECT_EQ(r.LogMessages()[0], "playlist list: more than 10000 smart playlists in " +
+                                      UserSmartPlaylistFile("admin") + "; the listing is refused");
+    EXPECT_LT(r.peakRssKb, kRequestBoundKb);
+    RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
+    RecordProperty("wall_ms", std::to_string(static_cast<long>(r.wallMs)));
+}
+
+TEST_F(Hostile, SmartPlaylistFileOfTenThousandSectionsIsListedWhole) {
+    std::vector<std::string> names;
+    for (int i = 0; i < 10000; ++i)
+        names.push_back("Smart " + std::to_string(100000 + i));
+    WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), names);
+    const CgiResult r = RunQuery("action=refresh&target=personal");
+    EXPECT_EQ(r.json["success"], true);
+    EXPECT_EQ(Count(r.body, "\"musiclib_music_personal/smart/"), 10000u);
+    EXPECT_TRUE(r.LogMessages().empty());
+    RecordProperty("peak_rss_kb", std::to_string(r.peakRssKb));
+}
+
+// A playlists folder of more files than a list may hold is refused while it is read.
+TEST_F(Hostile, PlaylistsFolderOfMoreThanTenThousandPlaylistsFailsWithALogLine) {
+    for (int i = 1; i < 10000; ++i)  // "Mine.m3u" is the first
+        WritePersonalPlaylistFile("admin", "List " + std::to_string(i) + ".m3u");
+    const CgiResult listed = RunQuery("action=refresh&target=personal");
+    EXPECT_EQ(listed.json["success"], true);
+    EXPECT_EQ(Count(listed.body, "\"musiclib_music_personal/playlist/"), 10000u);
+    EXPECT_TRUE(listed.LogMessages().empty());
+    RecordProperty("peak_rss_kb", std::to_string(listed.peakRssKb));
+
+    WritePersonalPlaylistFile("admin", "One too many.m3u");
+    const CgiResult refused = RunQuery("action=refresh&target=personal");
+    EXPECT_EQ(refused.json["success"], false);
+    const std::vector<std::string> log = refused.LogMessages();
+    ASSERT_FALSE(log.empty());
+    EXPECT_EQ(log[0], "playlist list: more than 10000 playlists in " +
+                          PersonalPlaylistDir("admin") + "; the listing is refused");
+}
+
 TEST_F(Hostile, MediaServerBillionLaughs) {
     ScriptedHttpServer server;
     ASSERT_TRUE(server.Start());
@@ -315,6 +665,29 @@ TEST_F(Hostile, HugeTextConfAndSmartPlaylistFiles) {
     EXPECT_LT(r.peakRssKb, 64 * 1024 * kMemoryFactor);
 }
 
+// A damaged text table of 2 million short entries would be parsed by every builder of a root
+// request; the first 20,000 entries are kept and the table says so in the log.
+TEST_F(Hostile, TextTableOfTwoMillionEntriesKeepsTheFirstTwentyThousand) {
+    {
+        std::string table = "[radio]\nradio=Radio\n[x]\n";
+        table.reserve(8u << 20);
+        for (int i = 0; table.size() < (8u << 20) - 16; ++i)
+            table += "k" + std::to_string(i) + "=v\n";
+        WriteFile(std::string(kTextsDir) + "enu/strings", table);
+    }
+    const CgiResult r = RunQuery("action=gettreenode&node=audiotree_root");
+    EXPECT_EQ(r.exitStatus, 1);
+    EXPECT_NE(r.body.find("\"Radio\""), std::string::npos);
+    // One line per parse of the table (the daemon is not running here: its lines are left aside).
+    const std::string tooMany = "texts: " + std::string(kTextsDir) +
+                                "enu/strings holds more than 20000 texts; the rest are ignored";
+    const std::vector<std::string> log = r.LogMessages();
+    EXPECT_GE(std::count(log.begin(), log.end(), tooMany), 1) << ::testing::PrintToString(log);
+    for (const std::string& line : log)
+        EXPECT_TRUE(line == tooMany || line.rfind("ctrl:", 0) == 0) << line;
+    EXPECT_LT(r.peakRssKb, 64 * 1024 * kMemoryFactor);
+}
+
 TEST_F(Hostile, BinaryGarbageInTextConfAndSmartPlaylistFiles) {
     std::string garbage;
     for (int i = 0; i < (4 << 20); ++i)
@@ -367,6 +740,138 @@ TEST_F(Hostile, SymlinkAtTheRandomPathIsReplacedNotFollowed) {
     struct stat st {};
     ASSERT_EQ(lstat("/tmp/==DynaRandom100==.admin", &st), 0);
     EXPECT_TRUE(S_ISREG(st.st_mode));
+}
+
+// A request as a browser sends it when a page (of this host or of another site) makes it.
+CgiRequest BrowserRequest(const std::string& query,
+                          const std::map<std::string, std::string>& headers) {
+    CgiRequest request;
+    request.queryString = query;
+    request.extraEnv = headers;
+    return request;
+}
+
+constexpr const char* kUnauthorized = "Status: 401 Unauthorized\r\n\r\n";
+const std::string kRandomFile = "/tmp/==DynaRandom100==.admin";
+
+TEST_F(Hostile, CrossSiteRequestsAreRefusedBeforeAnyActionRuns) {
+    MakeGeneratedLibrary(150);
+    ScriptedDaemon daemon(
+        [](const DaemonRequest&) { return DaemonAnswer::Reply("{\"success\":true}"); });
+    const std::vector<std::map<std::string, std::string>> foreign = {
+        {{"HTTP_SEC_FETCH_SITE", "cross-site"}},
+        {{"HTTP_SEC_FETCH_SITE", "Cross-Site"}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://evil.example"}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://nas.local.evil.example"}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://nas.local:8081"}, {"HTTP_HOST", "nas.local:8080"}},
+        {{"HTTP_ORIGIN", "https://nas.local"}, {"HTTP_HOST", "nas.local:80"}},
+        {{"HTTP_ORIGIN", "null"}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://nas.local"}},  // no Host to compare with
+        {{"HTTP_ORIGIN", ""}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://nas.local"},
+         {"HTTP_HOST", "nas.local"},
+         {"HTTP_SEC_FETCH_SITE", "cross-site"}},
+    };
+    for (const auto& headers : foreign) {
+        std::string described;
+        for (const auto& [name, value] : headers)
+            described += name + "=" + value + " ";
+        for (const char* query :
+             {"action=rerandom100", "action=refresh&target=mediaserver",
+              "action=refresh&target=personal", "action=gettreenode&node=audiotree_root"}) {
+            const CgiResult r = Run(BrowserRequest(query, headers));
+            EXPECT_EQ(r.output, kUnauthorized) << described << query;
+            EXPECT_EQ(r.exitStatus, 0) << described << query;
+        }
+    }
+    EXPECT_FALSE(Exists(kRandomFile));
+    EXPECT_TRUE(daemon.Requests().empty());
+}
+
+TEST_F(Hostile, SameOriginAndHeaderlessRequestsStillAct) {
+    MakeGeneratedLibrary(150);
+    ScriptedDaemon daemon(
+        [](const DaemonRequest&) { return DaemonAnswer::Reply("{\"success\":true}"); });
+    const std::vector<std::map<std::string, std::string>> own = {
+        {},  // curl, scripts
+        {{"HTTP_HOST", "nas.local"}},
+        {{"HTTP_SEC_FETCH_SITE", "same-origin"}, {"HTTP_HOST", "nas.local:8080"}},
+        {{"HTTP_SEC_FETCH_SITE", "none"}},  // typed into the address bar
+        {{"HTTP_ORIGIN", "http://nas.local:8080"}, {"HTTP_HOST", "nas.local:8080"}},
+        {{"HTTP_ORIGIN", "http://NAS.Local"}, {"HTTP_HOST", "nas.local:80"}},
+        {{"HTTP_ORIGIN", "https://nas.local:443"}, {"HTTP_HOST", "nas.local"}},
+        {{"HTTP_ORIGIN", "http://127.0.0.1:8080"},
+         {"HTTP_HOST", "127.0.0.1:8080"},
+         {"HTTP_SEC_FETCH_SITE", "same-origin"}},
+    };
+    for (const auto& headers : own) {
+        unlink(kRandomFile.c_str());
+        const CgiResult r = Run(BrowserRequest("action=rerandom100", headers), {"/tmp"});
+        EXPECT_EQ(r.json["success"], true) << r.output;
+        EXPECT_TRUE(Exists(kRandomFile));
+    }
+    const CgiResult scan =
+        Run(BrowserRequest("action=refresh&target=mediaserver",
+                           {{"HTTP_ORIGIN", "http://nas.local"}, {"HTTP_HOST", "nas.local"}}));
+    EXPECT_EQ(scan.exitStatus, 1);
+    EXPECT_FALSE(daemon.Requests().empty());
+}
+
+// Another local user made the random playlist's file first (in the shared, sticky /tmp). The draw
+// fails as before, the file stays as it was, and the log says which file and whose it is.
+TEST_F(Hostile, RandomPlaylistFileOfAnotherUserFailsTheDrawWithOneLogLineNamingItsOwner) {
+    MakeGeneratedLibrary(150);
+    const uid_t nobody = 65534;  // "nobody" on Debian
+    WriteFile(kRandomFile, "#EXTM3U\n/volume1/music/planted.mp3\n");
+    ASSERT_EQ(chown(kRandomFile.c_str(), nobody, nobody), 0);
+    const CgiResult r = Run(BrowserRequest("action=rerandom100", {}));
+    EXPECT_EQ(r.json["success"], false) << r.body;
+    EXPECT_EQ(r.json["errinfo"]["key"], "error_create_random100") << r.body;
+    EXPECT_EQ(ReadFile(kRandomFile), "#EXTM3U\n/volume1/music/planted.mp3\n");
+    const std::vector<std::string> log = r.LogMessages();
+    ASSERT_EQ(log.size(), 1u);
+    EXPECT_NE(log[0].find(kRandomFile), std::string::npos) << log[0];
+    EXPECT_NE(log[0].find("user nobody (uid 65534)"), std::string::npos) << log[0];
+
+    // The same for a symbolic link that another user planted there.
+    ASSERT_EQ(unlink(kRandomFile.c_str()), 0);
+    ASSERT_EQ(symlink("/var/packages/Harmona/etc/users.conf", kRandomFile.c_str()), 0);
+    ASSERT_EQ(lchown(kRandomFile.c_str(), 4321, 4321), 0);
+    const CgiResult linked = Run(BrowserRequest("action=rerandom100", {}));
+    EXPECT_EQ(linked.json["success"], false) << linked.body;
+    ASSERT_EQ(linked.LogMessages().size(), 1u);
+    EXPECT_NE(linked.LogMessages()[0].find("(uid 4321)"), std::string::npos);
+}
+
+// The user's playlists folder is a symbolic link to another user's: neither his playlists nor his
+// smart playlists are listed; the listing fails as it does for a folder that cannot be read.
+TEST_F(Hostile, SymlinkedPlaylistsFolderIsRefusedLikeAnUnreadableOne) {
+    WritePersonalPlaylistFile("other", "Secret.m3u");
+    WriteSmartPlaylistFile(UserSmartPlaylistFile("other"), {"Secret smart"});
+    const std::string folder = PersonalPlaylistDir("admin");
+
+    // What an unreadable folder gives: a file where the folder should be.
+    ASSERT_EQ(system(("rm -rf '" + folder + "'").c_str()), 0);
+    WriteFile(folder, "not a folder\n");
+    const CgiResult unreadableRefresh = RunQuery("action=refresh&target=personal");
+    const CgiResult unreadableCategory =
+        RunQuery("action=gettreenode&node=musiclib_music_personal");
+    EXPECT_EQ(unreadableRefresh.json["success"], false) << unreadableRefresh.body;
+
+    ASSERT_EQ(unlink(folder.c_str()), 0);
+    ASSERT_EQ(symlink(PersonalPlaylistDir("other").c_str(), folder.c_str()), 0);
+    for (const char* query :
+         {"action=refresh&target=personal", "action=gettreenode&node=musiclib_music_personal",
+          "action=gettreenode&node=audiotree_root"}) {
+        const CgiResult r = RunQuery(query);
+        EXPECT_EQ(r.body.find("Secret"), std::string::npos) << query << ": " << r.body;
+    }
+    const CgiResult refresh = RunQuery("action=refresh&target=personal");
+    EXPECT_EQ(refresh.body, unreadableRefresh.body);
+    EXPECT_EQ(refresh.LogMessages(), unreadableRefresh.LogMessages());
+    const CgiResult category = RunQuery("action=gettreenode&node=musiclib_music_personal");
+    EXPECT_EQ(category.body, unreadableCategory.body);
+    EXPECT_EQ(category.exitStatus, unreadableCategory.exitStatus);
 }
 
 TEST_F(Hostile, PreferenceDirectoryThatIsASymlinkElsewhere) {

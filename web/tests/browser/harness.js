@@ -11,13 +11,15 @@ mkdirSync(artifacts, { recursive: true });
 
 // A fresh profile per browser: Playwright's launch() gives Chromium a new temporary --user-data-dir
 // of its own (and refuses one in args), so none is passed here.
-export async function launch() {
+// `extraArgs` go to Chromium after the usual ones.
+export async function launch(extraArgs = []) {
   return chromium.launch({
     executablePath: process.env.HARMONA_CHROMIUM ?? "/usr/bin/chromium",
     headless: true,
     args: [
       "--headless", "--no-sandbox", "--disable-gpu", "--disable-quic", "--no-first-run",
       "--disable-background-networking", "--disable-component-update", "--disable-sync",
+      ...extraArgs,
     ],
   });
 }

@@ -1,0 +1,41 @@
+// Move-only owner of a forked child process: a child that its owner lets go of unfinished is
+// killed and reaped, so that no request leaves a process behind (a library call that never
+// returns runs in such a child).
+#pragma once
+
+#include <sys/types.h>
+
+#include <functional>
+
+#include "posix/FileDescriptor.h"
+
+namespace harmona::posix {
+
+class ChildProcess {
+  public:
+    ChildProcess() = default;
+    ~ChildProcess() { Kill(); }
+    ChildProcess(ChildProcess&& other) noexcept : pid_(other.pid_) { other.pid_ = -1; }
+    ChildProcess& operator=(ChildProcess&& other) noexcept;
+    ChildProcess(const ChildProcess&) = delete;
+    ChildProcess& operator=(const ChildProcess&) = delete;
+
+    // Forks; the child runs `work` with the write end of a pipe and ends with _exit(its result),
+    // so that nothing of the parent's (stdio buffers, exit handlers) runs twice. `output` receives
+    // the read end. An empty owner (and a closed `output`) when fork or pipe failed.
+    static ChildProcess Start(const std::function<int(int writeFd)>& work, FileDescriptor& output);
+
+    explicit operator bool() const { return pid_ > 0; }
+
+    // Waits for the child to end; its exit status, or -1 when it was ended by a signal.
+    int Wait();
+
+    // Kills the child (SIGKILL) and reaps it; nothing when there is no child.
+    void Kill();
+
+  private:
+    explicit ChildProcess(pid_t pid) : pid_(pid) {}
+    pid_t pid_ = -1;
+};
+
+}  // namespace harmona::posix
