@@ -172,7 +172,7 @@ bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFi
         upsert.Bind(13, batch[i]->size);
         BindOptionalText(upsert, 14, batch[i]->artPath);
         if (upsert.Step() != SQLITE_DONE) {
-            (db.Execute("ROLLBACK") == SQLITE_OK);
+            db.Execute("ROLLBACK");
             return false;
         }
     }
@@ -194,7 +194,7 @@ bool RefreshRows(Database& db, const std::vector<const FoundFile*>& files) {
             BindOptionalText(refresh, 2, files[i]->artPath);
             refresh.Bind(3, files[i]->path);
             if (refresh.Step() != SQLITE_DONE) {
-                (db.Execute("ROLLBACK") == SQLITE_OK);
+                db.Execute("ROLLBACK");
                 return false;
             }
         }
@@ -215,7 +215,7 @@ bool RemoveRows(Database& db, const std::vector<std::string>& gone) {
             remove.Reset();
             remove.Bind(1, gone[i]);
             if (remove.Step() != SQLITE_DONE) {
-                (db.Execute("ROLLBACK") == SQLITE_OK);
+                db.Execute("ROLLBACK");
                 return false;
             }
         }
@@ -233,7 +233,9 @@ IndexReport Fail(IndexReport report, const std::string& why) {
 
 }  // namespace
 
-IndexReport IndexShare(const std::string& share, const std::string& dbPath) {
+IndexReport IndexShare(const std::string& share, const std::string& dbPath,
+                       const std::atomic<bool>* stop) {
+    const auto stopped = [stop] { return stop != nullptr && stop->load(); };
     IndexReport report;
     const int shareFd = open(share.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     if (shareFd < 0)
@@ -288,12 +290,23 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath) {
     if (!upsert)
         return Fail(report, "cannot prepare the track update: " + db.Error());
     for (std::size_t start = 0; start < toRead.size(); start += kIndexBatchSize) {
+        if (stopped()) {
+            // What was committed is in the library: readers must learn of it.
+            if (start > 0)
+                medialib::BumpLibraryUpdateCount(db);
+            return Fail(report, "stopped");
+        }
         const std::size_t end = std::min(toRead.size(), start + kIndexBatchSize);
         const std::vector<const FoundFile*> batch(toRead.begin() + start, toRead.begin() + end);
         if (!WriteBatch(db, upsert, batch, report))
             return Fail(report, "cannot write tracks: " + db.Error());
     }
 
+    if (stopped()) {
+        if (!toRead.empty())
+            medialib::BumpLibraryUpdateCount(db);
+        return Fail(report, "stopped");
+    }
     std::vector<std::string> gone;
     for (const auto& [path, row] : known) {
         if (!row.seen)
