@@ -1,6 +1,8 @@
 #include "ContentDirectory.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <vector>
@@ -221,7 +223,8 @@ BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
 
 bool ContentDirectory::FileStamp::operator==(const FileStamp& other) const {
     return device == other.device && inode == other.inode && size == other.size &&
-           modified.tv_sec == other.modified.tv_sec && modified.tv_nsec == other.modified.tv_nsec;
+           modified.tv_sec == other.modified.tv_sec && modified.tv_nsec == other.modified.tv_nsec &&
+           changeCounter == other.changeCounter;
 }
 
 ContentDirectory::ContentDirectory(std::string dbPath, std::string sharePath,
@@ -232,15 +235,51 @@ ContentDirectory::ContentDirectory(std::string dbPath, std::string sharePath,
 
 ContentDirectory::~ContentDirectory() = default;
 
-std::shared_ptr<const LibraryView> ContentDirectory::CurrentView() const {
-    FileStamp now;
+// The file's identity and times, and SQLite's file change counter (a 4-byte big-endian number
+// at offset 24 of the header, moved by every committed write), which tells two writes apart
+// even within one tick of the file system's clock.
+ContentDirectory::FileStamp ContentDirectory::StampOfDatabase() const {
+    FileStamp stamp;
+    const int fd = open(dbPath_.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY);
+    if (fd < 0)
+        return stamp;
     struct stat st {};
-    if (stat(dbPath_.c_str(), &st) == 0)
-        now = FileStamp{st.st_dev, st.st_ino, st.st_size, st.st_mtim};
-    std::lock_guard<std::mutex> lock(mutex_);
-    if (loaded_ && now == stamp_)
-        return view_;
+    unsigned char counter[4] = {};
+    if (fstat(fd, &st) == 0) {
+        stamp = FileStamp{st.st_dev, st.st_ino, st.st_size, st.st_mtim, 0};
+        if (pread(fd, counter, sizeof counter, 24) == static_cast<ssize_t>(sizeof counter))
+            stamp.changeCounter = (uint32_t(counter[0]) << 24) | (uint32_t(counter[1]) << 16) |
+                                  (uint32_t(counter[2]) << 8) | counter[3];
+    }
+    close(fd);
+    return stamp;
+}
+
+std::shared_ptr<const LibraryView> ContentDirectory::CurrentView() const {
+    const FileStamp now = StampOfDatabase();
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (loaded_ && now == stamp_)
+            return view_;
+    }
+    std::unique_lock<std::mutex> loading(loadMutex_, std::try_to_lock);
+    if (!loading.owns_lock()) {
+        // Another thread is loading the new state: answer from the last one meanwhile, so that
+        // no request waits for a load it did not start.
+        {
+            std::lock_guard<std::mutex> lock(mutex_);
+            if (view_)
+                return view_;
+        }
+        loading.lock();
+    }
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (loaded_ && now == stamp_)
+            return view_;
+    }
     std::shared_ptr<const LibraryView> fresh = LibraryView::Load(dbPath_, sharePath_);
+    std::lock_guard<std::mutex> lock(mutex_);
     if (!fresh)
         return nullptr;  // tried again on the next call
     if (loaded_ && view_ && fresh->updateId() != view_->updateId())

@@ -73,7 +73,8 @@ class ContentDirectory {
     ~ContentDirectory();
 
     // Thread-safe. The whole tree is loaded from library.db once per change of the file and kept;
-    // a Browse then only reads it.
+    // a Browse then only reads it. While one call loads a changed library, the others answer
+    // from the state before.
     BrowseResult Browse(const BrowseArgs& args) const;
 
     // The index's update count: it moves whenever the indexer changed library.db.
@@ -97,16 +98,19 @@ class ContentDirectory {
         ino_t inode = 0;
         off_t size = -1;
         timespec modified{};
+        uint32_t changeCounter = 0;
         bool operator==(const FileStamp& other) const;
     };
-    // The view of library.db as it is now (reloaded when the file changed); nullptr when it
-    // cannot be read.
+    FileStamp StampOfDatabase() const;
+    // The view of library.db as it is now (reloaded when the file changed; while another thread
+    // reloads it, the one before); nullptr when it cannot be read.
     std::shared_ptr<const LibraryView> CurrentView() const;
 
     std::string dbPath_;
     std::string sharePath_;
     std::string mediaBaseUrl_;
-    mutable std::mutex mutex_;
+    mutable std::mutex mutex_;      // guards the fields below
+    mutable std::mutex loadMutex_;  // held by the one thread that loads a new view
     mutable std::shared_ptr<const LibraryView> view_;
     mutable FileStamp stamp_;
     mutable bool loaded_ = false;

@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <functional>
 #include <map>
 #include <numeric>
 #include <tuple>
@@ -46,14 +47,13 @@ std::string Cut(std::string_view text) {
     return std::string(cgi::CutUtf8(text, kMaxValueBytes));
 }
 
-uint64_t Fnv(uint64_t hash, std::string_view bytes) {
-    for (const char c : bytes) {
-        hash ^= static_cast<unsigned char>(c);
-        hash *= 0x100000001b3ULL;
-    }
-    return hash;
+uint64_t HashOf(std::string_view bytes) {
+    return std::hash<std::string_view>()(bytes);
 }
-constexpr uint64_t kFnvStart = 0xcbf29ce484222325ULL;
+
+uint64_t Combine(uint64_t hash, uint64_t part) {
+    return (hash ^ part) * 0x100000001b3ULL + 0x9e3779b97f4a7c15ULL;
+}
 
 uint64_t SplitMix(uint64_t& state) {
     uint64_t z = (state += 0x9e3779b97f4a7c15ULL);
@@ -141,6 +141,7 @@ class LibraryViewBuilder {
     void BuildAlbums();
     void BuildGenres();
     void BuildAllMusicAndRandom();
+    void RankTitles();
     void SortTracks(std::vector<uint32_t>& tracks, bool byDisc) const;
     void AddTrackChildren(uint32_t container, const std::vector<uint32_t>& tracks);
     void RenderTracks();
@@ -150,7 +151,9 @@ class LibraryViewBuilder {
     LibraryView& view_;
     std::string share_;
     std::vector<Row> rows_;
-    std::vector<uint32_t> category_;  // container index of each kCategories row
+    std::vector<uint32_t> byTitle_;    // every track, by title (NOCASE) and id
+    std::vector<uint32_t> titleRank_;  // each track's place in byTitle_
+    std::vector<uint32_t> category_;   // container index of each kCategories row
     std::unordered_map<std::string, uint32_t> folders_;
     std::vector<std::vector<std::pair<std::string, uint32_t>>> folderChildren_;  // per container
     std::vector<std::vector<uint32_t>> folderTracks_;
@@ -236,6 +239,7 @@ void LibraryViewBuilder::Build() {
         track.artPath = row.artPath;
         view_.trackIndex_.emplace(row.id, static_cast<uint32_t>(i));
     }
+    RankTitles();
     BuildFolders();
     BuildAlbums();
     BuildGenres();
@@ -316,14 +320,26 @@ void LibraryViewBuilder::BuildFolders() {
 
 // --- Albums (by album and album artist), album artists, latest albums ----------------------
 
+// Titles are compared once, for the whole library; every other listing sorts by the rank.
+void LibraryViewBuilder::RankTitles() {
+    byTitle_.resize(rows_.size());
+    std::iota(byTitle_.begin(), byTitle_.end(), 0);
+    std::sort(byTitle_.begin(), byTitle_.end(), [&](uint32_t a, uint32_t b) {
+        const int order = CompareNoCase(rows_[a].title, rows_[b].title);
+        return order != 0 ? order < 0 : rows_[a].id < rows_[b].id;
+    });
+    titleRank_.resize(rows_.size());
+    for (uint32_t rank = 0; rank < byTitle_.size(); ++rank)
+        titleRank_[byTitle_[rank]] = rank;
+}
+
 void LibraryViewBuilder::SortTracks(std::vector<uint32_t>& tracks, bool byDisc) const {
     std::sort(tracks.begin(), tracks.end(), [&](uint32_t a, uint32_t b) {
         const Row& x = rows_[a];
         const Row& y = rows_[b];
         if (byDisc && std::tie(x.discNo, x.trackNo) != std::tie(y.discNo, y.trackNo))
             return std::tie(x.discNo, x.trackNo) < std::tie(y.discNo, y.trackNo);
-        const int order = CompareNoCase(x.title, y.title);
-        return order != 0 ? order < 0 : x.id < y.id;
+        return titleRank_[a] < titleRank_[b];
     });
 }
 
@@ -444,10 +460,7 @@ void LibraryViewBuilder::BuildGenres() {
 // All music by title; "random": 100 tracks drawn with a generator seeded by the update id, so
 // that every page of one listing, and every client, sees the same draw until the library changes.
 void LibraryViewBuilder::BuildAllMusicAndRandom() {
-    std::vector<uint32_t> all(rows_.size());
-    std::iota(all.begin(), all.end(), 0);
-    SortTracks(all, false);
-    AddTrackChildren(category_[0], all);
+    AddTrackChildren(category_[0], byTitle_);
 
     std::vector<uint32_t> drawn(rows_.size());
     std::iota(drawn.begin(), drawn.end(), 0);
@@ -463,6 +476,8 @@ void LibraryViewBuilder::BuildAllMusicAndRandom() {
 }
 
 void LibraryViewBuilder::RenderTracks() {
+    // The type fields depend on the extension alone: worked out once per extension.
+    std::unordered_map<std::string, std::pair<std::string, std::string>> typeOf;
     for (std::size_t i = 0; i < rows_.size(); ++i) {
         const Row& row = rows_[i];
         DidlObject item;
@@ -478,16 +493,24 @@ void LibraryViewBuilder::RenderTracks() {
         item.resPath = ResUrlPath(row.id, row.path);
         if (!row.artPath.empty())
             item.artPath = ArtUrlPath(row.id, row.artPath);
-        item.mimeType = medialib::MimeTypeOfPath(row.path);
-        item.dlnaFeatures = medialib::DlnaContentFeatures(row.path);
+        auto type = typeOf.find(medialib::LowerExtension(row.path));
+        if (type == typeOf.end())
+            type = typeOf
+                       .emplace(medialib::LowerExtension(row.path),
+                                std::make_pair(std::string(medialib::MimeTypeOfPath(row.path)),
+                                               medialib::DlnaContentFeatures(row.path)))
+                       .first;
+        item.mimeType = type->second.first;
+        item.dlnaFeatures = type->second.second;
         view_.tracks_[i].body = DidlItemBody(item);
+        view_.tracks_[i].body.shrink_to_fit();
     }
 }
 
 void LibraryViewBuilder::RenderContainers() {
     std::vector<uint64_t> trackHash(rows_.size());
     for (std::size_t i = 0; i < rows_.size(); ++i)
-        trackHash[i] = Fnv(Fnv(kFnvStart, view_.tracks_[i].body), std::to_string(rows_[i].id));
+        trackHash[i] = Combine(HashOf(view_.tracks_[i].body), static_cast<uint64_t>(rows_[i].id));
     std::map<std::pair<std::string, std::string>, const Album*> albumByKey;
     for (const Album& album : albums_)
         albumByKey[{album.name, album.albumArtist}] = &album;
@@ -512,12 +535,11 @@ void LibraryViewBuilder::RenderContainers() {
     // Children before parents do not exist in every view, so hash in a second pass: a container's
     // hash covers its children's elements (their titles and counts) and its tracks.
     for (ViewContainer& container : view_.containers_) {
-        uint64_t hash = Fnv(kFnvStart, container.element);
+        uint64_t hash = HashOf(container.element);
         for (const ViewChild& child : container.children) {
-            const uint64_t part = child.track
-                                      ? trackHash[child.index]
-                                      : Fnv(kFnvStart, view_.containers_[child.index].element);
-            hash = Fnv(hash, std::string_view(reinterpret_cast<const char*>(&part), sizeof part));
+            const uint64_t part = child.track ? trackHash[child.index]
+                                              : HashOf(view_.containers_[child.index].element);
+            hash = Combine(hash, part);
         }
         container.contentHash = hash;
     }

@@ -105,6 +105,10 @@ int main(int argc, char** argv) {
     harmona::mediad::LiveLibraryOptions live;
     live.sharePath = options.sharePath;
     live.dbPath = options.dbPath;
+    // The changed library is loaded on the live library's thread, not by the next Browse.
+    live.onIndexed = [&server](const harmona::index::IndexReport&) {
+        server.contentDirectory()->SystemUpdateId();
+    };
     harmona::mediad::LiveLibrary liveLibrary(live);
     if (!liveLibrary.Start(&error))
         syslog(LOG_ERR, "the library will not follow the share: %s", error.c_str());

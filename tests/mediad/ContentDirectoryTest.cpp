@@ -6,9 +6,12 @@
 #include <utime.h>
 
 #include <algorithm>
+#include <atomic>
+#include <chrono>
 #include <deque>
 #include <set>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "ContentDirectory.h"
@@ -511,6 +514,44 @@ TEST(UpdateIds, OnlyAnIndexerPassThatChangedSomethingMovesTheSystemUpdateId) {
         << changed;
     EXPECT_EQ(changed.find("genre:Jazz,"), std::string::npos) << changed;
     EXPECT_NE(FindTitle(Objects(Browse(directory, "music_all")), "Second, renamed"), nullptr);
+}
+
+TEST(UpdateIds, BrowsesDuringLibraryChangesAnswerFromOneWholeStateEach) {
+    WriteLibrary(ManyTracks(2000));
+    const ContentDirectory directory = Directory();
+    std::atomic<bool> done{false};
+    std::atomic<int> answers{0};
+    std::vector<std::thread> readers;
+    for (int i = 0; i < 3; ++i) {
+        readers.emplace_back([&] {
+            while (!done) {
+                const BrowseResult all = Browse(directory, "music_all", false, 0, 10);
+                // One state: 2,000 tracks before, 2,001 to 2,005 after each insert below.
+                const bool whole = all.error == 0 && all.numberReturned == 10 &&
+                                   all.totalMatches >= 2000 && all.totalMatches <= 2005 &&
+                                   ParseDidl(all.didl).objects.size() == 10;
+                EXPECT_TRUE(whole) << all.error << " " << all.totalMatches;
+                ++answers;
+            }
+        });
+    }
+    for (int change = 1; change <= 5; ++change) {
+        sqlite::Database db = sqlite::Database::Open(kLibraryDb, SQLITE_OPEN_READWRITE, 5000);
+        ASSERT_TRUE(db);
+        ASSERT_EQ(db.Execute(("BEGIN IMMEDIATE; INSERT INTO track (path, title) VALUES ('" +
+                              std::string(kShare) + "/new" + std::to_string(change) +
+                              ".mp3', 'New " + std::to_string(change) + "');")
+                                 .c_str()),
+                  SQLITE_OK);
+        ASSERT_TRUE(medialib::BumpLibraryUpdateCount(db));
+        ASSERT_EQ(db.Execute("COMMIT"), SQLITE_OK);
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    }
+    done = true;
+    for (std::thread& reader : readers)
+        reader.join();
+    EXPECT_GT(answers.load(), 0);
+    EXPECT_EQ(Browse(directory, "music_all").totalMatches, 2005u);
 }
 
 TEST(UpdateIds, AMissingDatabaseIsAnEmptyLibraryAndAnUnreadableOneAnError) {

@@ -183,6 +183,12 @@ TEST_F(LiveShare, BeyondTheWatchLimitAPeriodicRescanStillFindsNewFiles) {
                   {"Found By Rescan", "Trio", "Blue", "", "Jazz"});
     ASSERT_TRUE(WaitUntil([&] { return HasTitle(directory_, "Found By Rescan"); }));
     EXPECT_EQ(live_->watchedFolders(), 1u);
+    int limitLines = 0;
+    for (const LogLine& line : TakeLogLines(200)) {
+        if (line.message.find("live library: watching 1 folders, the most allowed") == 0)
+            ++limitLines;
+    }
+    EXPECT_EQ(limitLines, 1) << "the limit is logged once";
 }
 
 TEST_F(LiveShare, StopEndsTheThreadAndLaterChangesWaitForTheNextStart) {
