@@ -68,9 +68,9 @@ int64_t LibraryUpdateCount(Database& db) {
 
 bool BumpLibraryUpdateCount(Database& db) {
     return db.Execute(
-               "DELETE FROM library_update WHERE id < (SELECT MAX(id) FROM "
-               "library_update); INSERT INTO library_update (id) SELECT "
-               "COALESCE(MAX(id), 0) + 1 FROM library_update") == SQLITE_OK;
+               "INSERT INTO library_update (id) SELECT COALESCE(MAX(id), 0) + 1 FROM "
+               "library_update; DELETE FROM library_update WHERE id < (SELECT MAX(id) "
+               "FROM library_update)") == SQLITE_OK;
 }
 
 bool EnsureLibrarySchema(Database& db) {
