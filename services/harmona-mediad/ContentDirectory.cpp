@@ -11,9 +11,13 @@
 #include "LibraryView.h"
 #include "MediaFiles.h"
 #include "ObjectIds.h"
+#include "sqlite/Database.h"
 
 namespace harmona::mediad {
 namespace {
+
+// A file request waits this long for an indexer that holds library.db locked.
+constexpr int kLookUpBusyTimeoutMs = 3000;
 
 enum class SortKey { Title, Artist, Album, TrackNumber, Date };
 
@@ -128,19 +132,19 @@ std::vector<ViewChild> SortedChildren(const LibraryView& view, const ViewContain
 }
 
 void AppendTrackIn(std::string& out, const LibraryView& view, uint32_t container,
-                   const ViewTrack& track, std::string_view mediaBase) {
+                   const ViewTrack& track, const DidlPieces& pieces) {
     const std::string& containerId = view.containers()[container].id;
     const bool own = container == view.allMusic();
     AppendItem(out, TrackIdIn(containerId, track.id), containerId,
-               own ? std::string() : TrackId(track.id), track.body, mediaBase);
+               own ? std::string() : TrackId(track.id), track.body, pieces);
 }
 
 void AppendChild(std::string& out, const LibraryView& view, uint32_t container,
-                 const ViewChild& child, std::string_view mediaBase) {
+                 const ViewChild& child, const DidlPieces& pieces) {
     if (child.track)
-        AppendTrackIn(out, view, container, view.tracks()[child.index], mediaBase);
+        AppendTrackIn(out, view, container, view.tracks()[child.index], pieces);
     else
-        AppendWithMediaBase(out, view.containers()[child.index].element, mediaBase);
+        AppendExpanded(out, view.containers()[child.index].element, pieces);
 }
 
 BrowseResult Error(int code, const char* text) {
@@ -169,17 +173,17 @@ const ViewTrack* FindItem(const LibraryView& view, const std::string& id, uint32
     return track != nullptr && view.Lists(*container, *track) ? track : nullptr;
 }
 
-BrowseResult Metadata(const LibraryView& view, const std::string& id, std::string_view mediaBase) {
+BrowseResult Metadata(const LibraryView& view, const std::string& id, const DidlPieces& pieces) {
     BrowseResult result;
     result.didl = kDidlBegin;
     if (const ViewContainer* container = view.FindContainer(id)) {
-        AppendWithMediaBase(result.didl, container->element, mediaBase);
+        AppendExpanded(result.didl, container->element, pieces);
     } else {
         uint32_t listing = kNoIndex;
         const ViewTrack* track = FindItem(view, id, &listing);
         if (track == nullptr)
             return Error(kErrorNoSuchObject, "No such object");
-        AppendTrackIn(result.didl, view, listing, *track, mediaBase);
+        AppendTrackIn(result.didl, view, listing, *track, pieces);
     }
     result.didl += kDidlEnd;
     result.numberReturned = 1;
@@ -188,7 +192,7 @@ BrowseResult Metadata(const LibraryView& view, const std::string& id, std::strin
 }
 
 BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
-                      const std::vector<SortField>& sort, std::string_view mediaBase) {
+                      const std::vector<SortField>& sort, const DidlPieces& pieces) {
     const uint32_t index = view.ContainerIndex(args.objectId);
     if (index == kNoIndex) {
         uint32_t listing = kNoIndex;
@@ -207,11 +211,11 @@ BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
     result.didl = kDidlBegin;
     if (sort.empty()) {
         for (std::size_t i = first; i < last; ++i)
-            AppendChild(result.didl, view, index, container.children[i], mediaBase);
+            AppendChild(result.didl, view, index, container.children[i], pieces);
     } else {
         const std::vector<ViewChild> sorted = SortedChildren(view, container, sort);
         for (std::size_t i = first; i < last; ++i)
-            AppendChild(result.didl, view, index, sorted[i], mediaBase);
+            AppendChild(result.didl, view, index, sorted[i], pieces);
     }
     result.didl += kDidlEnd;
     result.numberReturned = ClampCount(last - first);
@@ -308,24 +312,29 @@ BrowseResult ContentDirectory::Browse(const BrowseArgs& args) const {
     const std::shared_ptr<const LibraryView> view = CurrentView();
     if (!view)
         return Error(kErrorActionFailed, "The library database cannot be read");
-    const std::string_view mediaBase =
-        args.mediaBaseUrl.empty() ? mediaBaseUrl_ : args.mediaBaseUrl;
-    BrowseResult result = args.metadata ? Metadata(*view, args.objectId, mediaBase)
-                                        : Children(*view, args, sort, mediaBase);
+    const DidlPieces pieces{args.mediaBaseUrl.empty() ? mediaBaseUrl_ : args.mediaBaseUrl,
+                            &view->protocolInfos()};
+    BrowseResult result = args.metadata ? Metadata(*view, args.objectId, pieces)
+                                        : Children(*view, args, sort, pieces);
     if (result.error == 0)
         result.updateId = view->updateId();
     return result;
 }
 
+// The track's row, read from library.db itself: the file-serving side needs the path as the
+// index has it now, and the tree does not keep paths (memory).
 bool ContentDirectory::LookUpTrack(int64_t id, TrackFile* file) const {
-    const std::shared_ptr<const LibraryView> view = CurrentView();
-    const ViewTrack* track = view ? view->FindTrack(id) : nullptr;
-    if (track == nullptr || track->path.empty())
+    sqlite::Database db = sqlite::Database::OpenReadOnly(dbPath_.c_str(), kLookUpBusyTimeoutMs);
+    sqlite::Statement row =
+        db ? db.Prepare("SELECT path, size FROM track WHERE id = ?1") : sqlite::Statement();
+    if (!row || row.Bind(1, id) != SQLITE_OK || row.Step() != SQLITE_ROW)
         return false;
-    file->path = track->path;
-    file->size = track->size;
-    file->mimeType = medialib::MimeTypeOfPath(track->path);
-    file->contentFeatures = medialib::DlnaContentFeatures(track->path);
+    file->path = std::string(row.ColumnText(0));
+    file->size = row.ColumnType(1) == SQLITE_INTEGER ? row.ColumnInt64(1) : -1;
+    if (file->path.empty())
+        return false;
+    file->mimeType = medialib::MimeTypeOfPath(file->path);
+    file->contentFeatures = medialib::DlnaContentFeatures(file->path);
     return true;
 }
 
@@ -338,12 +347,14 @@ bool ContentDirectory::LookUpTrackFile(int64_t id, std::string* path) const {
 }
 
 bool ContentDirectory::LookUpArtFile(int64_t id, std::string* path) const {
-    const std::shared_ptr<const LibraryView> view = CurrentView();
-    const ViewTrack* track = view ? view->FindTrack(id) : nullptr;
-    if (track == nullptr || track->artPath.empty())
+    sqlite::Database db = sqlite::Database::OpenReadOnly(dbPath_.c_str(), kLookUpBusyTimeoutMs);
+    // An index of an older indexer has no art_path column: then no track has art.
+    sqlite::Statement row =
+        db ? db.Prepare("SELECT art_path FROM track WHERE id = ?1") : sqlite::Statement();
+    if (!row || row.Bind(1, id) != SQLITE_OK || row.Step() != SQLITE_ROW)
         return false;
-    *path = track->artPath;
-    return true;
+    *path = std::string(row.ColumnText(0));
+    return !path->empty();
 }
 
 }  // namespace harmona::mediad

@@ -9,6 +9,8 @@ namespace harmona::mediad {
 namespace {
 
 constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
+constexpr std::string_view kTrackClassElement =
+    "<upnp:class>object.item.audioItem.musicTrack</upnp:class>";
 
 // The code point of the well-formed sequence of `length` bytes at text[i].
 char32_t DecodeUtf8(std::string_view text, std::size_t i, std::size_t length) {
@@ -96,10 +98,14 @@ void AppendPeopleAndDate(std::string& out, const DidlObject& object) {
 void AppendRes(std::string& out, const DidlObject& object) {
     if (object.resPath.empty())
         return;
-    out += "<res protocolInfo=\"http-get:*:";
-    AppendXmlText(out, object.mimeType);
-    out += ':';
-    AppendXmlText(out, object.dlnaFeatures.empty() ? "*" : object.dlnaFeatures);
+    out += "<res protocolInfo=\"";
+    if (object.protocolInfoIndex >= 0 &&
+        static_cast<std::size_t>(object.protocolInfoIndex) < kMaxSharedProtocolInfos) {
+        out += kProtocolInfoMark;
+        out += static_cast<char>(object.protocolInfoIndex + 1);
+    } else {
+        out += ProtocolInfo(object.mimeType, object.dlnaFeatures);
+    }
     out += '"';
     if (object.size >= 0)
         out += " size=\"" + std::to_string(object.size) + '"';
@@ -111,6 +117,14 @@ void AppendRes(std::string& out, const DidlObject& object) {
 }
 
 }  // namespace
+
+std::string ProtocolInfo(const std::string& mimeType, const std::string& dlnaFeatures) {
+    std::string out = "http-get:*:";
+    AppendXmlText(out, mimeType);
+    out += ':';
+    AppendXmlText(out, dlnaFeatures.empty() ? "*" : dlnaFeatures);
+    return out;
+}
 
 void AppendXmlText(std::string& out, std::string_view text) {
     for (std::size_t i = 0; i < text.size();) {
@@ -144,9 +158,14 @@ std::string DidlItemBody(const DidlObject& object) {
     out.reserve(256 + object.title.size() + object.artist.size() + object.album.size());
     out += "<dc:title>";
     AppendXmlText(out, object.title);
-    out += "</dc:title><upnp:class>";
-    AppendXmlText(out, object.upnpClass);
-    out += "</upnp:class>";
+    out += "</dc:title>";
+    if (object.upnpClass == kMusicTrackClass) {
+        out += kTrackClassMark;
+    } else {
+        out += "<upnp:class>";
+        AppendXmlText(out, object.upnpClass);
+        out += "</upnp:class>";
+    }
     AppendPeopleAndDate(out, object);
     AppendNumberElement(out, "upnp:originalTrackNumber", object.trackNo);
     AppendRes(out, object);
@@ -156,8 +175,12 @@ std::string DidlItemBody(const DidlObject& object) {
 std::string DidlElement(const DidlObject& object) {
     std::string out;
     if (!object.container) {
+        // Only the media base stays marked: the item stands alone.
+        DidlObject alone = object;
+        alone.protocolInfoIndex = -1;
+        const DidlPieces keepBase{std::string_view(&kMediaBaseMark, 1), nullptr};
         AppendItem(out, XmlText(object.id), XmlText(object.parentId), XmlText(object.refId),
-                   DidlItemBody(object), std::string_view(&kMediaBaseMark, 1));
+                   DidlItemBody(alone), keepBase);
         return out;
     }
     out += "<container id=\"";
@@ -177,22 +200,29 @@ std::string DidlElement(const DidlObject& object) {
     return out;
 }
 
-void AppendWithMediaBase(std::string& out, std::string_view piece, std::string_view mediaBase) {
-    while (!piece.empty()) {
-        const void* mark = std::memchr(piece.data(), kMediaBaseMark, piece.size());
-        if (mark == nullptr) {
-            out.append(piece);
-            return;
+void AppendExpanded(std::string& out, std::string_view piece, const DidlPieces& pieces) {
+    std::size_t copied = 0;
+    for (std::size_t i = 0; i < piece.size(); ++i) {
+        const char c = piece[i];
+        if (c != kMediaBaseMark && c != kTrackClassMark && c != kProtocolInfoMark)
+            continue;
+        out.append(piece.data() + copied, i - copied);
+        if (c == kMediaBaseMark) {
+            out.append(pieces.mediaBase);
+        } else if (c == kTrackClassMark) {
+            out.append(kTrackClassElement);
+        } else if (i + 1 < piece.size()) {
+            const std::size_t index = static_cast<unsigned char>(piece[++i]) - 1u;
+            if (pieces.protocolInfos != nullptr && index < pieces.protocolInfos->size())
+                out.append((*pieces.protocolInfos)[index]);
         }
-        const std::size_t at = static_cast<const char*>(mark) - piece.data();
-        out.append(piece.substr(0, at));
-        out.append(mediaBase);
-        piece.remove_prefix(at + 1);
+        copied = i + 1;
     }
+    out.append(piece.data() + copied, piece.size() - copied);
 }
 
 void AppendItem(std::string& out, std::string_view id, std::string_view parentId,
-                std::string_view refId, std::string_view body, std::string_view mediaBase) {
+                std::string_view refId, std::string_view body, const DidlPieces& pieces) {
     out += "<item id=\"";
     out += id;
     out += "\" parentID=\"";
@@ -204,14 +234,14 @@ void AppendItem(std::string& out, std::string_view id, std::string_view parentId
         out += '"';
     }
     out += " restricted=\"1\">";
-    AppendWithMediaBase(out, body, mediaBase);
+    AppendExpanded(out, body, pieces);
     out += "</item>";
 }
 
 std::string WriteDidl(const std::vector<DidlObject>& objects, std::string_view mediaBase) {
     std::string out(kDidlBegin);
     for (const DidlObject& object : objects)
-        AppendWithMediaBase(out, DidlElement(object), mediaBase);
+        AppendExpanded(out, DidlElement(object), DidlPieces{mediaBase, nullptr});
     out += kDidlEnd;
     return out;
 }

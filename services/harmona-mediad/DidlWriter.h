@@ -19,10 +19,20 @@ inline constexpr std::string_view kDidlBegin =
     "xmlns:dlna=\"urn:schemas-dlna-org:metadata-1-0/\">";
 inline constexpr std::string_view kDidlEnd = "</DIDL-Lite>";
 
-// Stands, in a pre-written piece, where the server's media base URL goes
-// ("http://host:port/media/"), so that one piece serves every address the server answers on. Never
-// part of escaped text.
+// Pre-written pieces hold control bytes (which escaped text never does) where a reply puts text
+// that is the same for many objects and so is stored once: the media base URL of the request
+// ("http://host:port/media/", so that one piece serves every address the server answers on),
+// a track's upnp:class element, and the res protocolInfo of one file type (the mark is followed
+// by one byte, 1 + the type's index in DidlPieces::protocolInfos).
 inline constexpr char kMediaBaseMark = '\x01';
+inline constexpr char kTrackClassMark = '\x02';
+inline constexpr char kProtocolInfoMark = '\x03';
+inline constexpr std::size_t kMaxSharedProtocolInfos = 255;
+
+struct DidlPieces {
+    std::string_view mediaBase;
+    const std::vector<std::string>* protocolInfos = nullptr;  // escaped
+};
 
 struct DidlObject {
     bool container = false;
@@ -34,8 +44,14 @@ struct DidlObject {
     std::string resPath;       // the res URL after the media base
     std::string artPath;       // the album art URL after the media base, "" when none
     std::string mimeType;      // of the res
-    std::string dlnaFeatures;  // the protocolInfo's fourth field, "*" when empty
+    std::string dlnaFeatures;  // the protocolInfo's fourth field, "*" when empty    // >= 0: the
+                               // protocolInfo is DidlPieces::protocolInfos[protocolInfoIndex],
+                               // written as a mark.
+    int protocolInfoIndex = -1;
 };
+
+// The escaped protocolInfo of a res: "http-get:*:<mime>:<fourth field>".
+std::string ProtocolInfo(const std::string& mimeType, const std::string& dlnaFeatures);
 
 // Appends `text` as XML 1.0 character data, fit for an element or a double-quoted attribute: the
 // five special characters and tab, LF and CR as references; bytes that are not UTF-8 become
@@ -48,17 +64,18 @@ std::string XmlText(std::string_view text);
 // The whole element of `object` (<container> or <item>), media URLs marked with kMediaBaseMark.
 std::string DidlElement(const DidlObject& object);
 
-// An item's children, from <dc:title> to </res>, media URLs marked with kMediaBaseMark; the
-// start tag, which names the item's id and parent, is written per listing (AppendItem).
+// An item's children, from <dc:title> to </res>, with marks for the shared pieces (a
+// musicTrack's class, a shared protocolInfo, the media base); the start tag, which names the
+// item's id and parent, is written per listing (AppendItem).
 std::string DidlItemBody(const DidlObject& object);
 
 // Appends <item id=.. parentID=.. [refID=..] restricted="1">body</item>; the ids must be plain
-// (object ids are: see ObjectIds.h); kMediaBaseMark in `body` becomes `mediaBase`.
+// (object ids are: see ObjectIds.h); the marks in `body` are expanded from `pieces`.
 void AppendItem(std::string& out, std::string_view id, std::string_view parentId,
-                std::string_view refId, std::string_view body, std::string_view mediaBase);
+                std::string_view refId, std::string_view body, const DidlPieces& pieces);
 
-// Appends `piece` with every kMediaBaseMark replaced by `mediaBase`.
-void AppendWithMediaBase(std::string& out, std::string_view piece, std::string_view mediaBase);
+// Appends `piece` with every mark replaced by what it stands for.
+void AppendExpanded(std::string& out, std::string_view piece, const DidlPieces& pieces);
 
 // The whole DIDL-Lite document of `objects`.
 std::string WriteDidl(const std::vector<DidlObject>& objects, std::string_view mediaBase);

@@ -229,14 +229,12 @@ void LibraryViewBuilder::Build() {
         const Row& row = rows_[i];
         ViewTrack& track = view_.tracks_[i];
         track.id = row.id;
-        track.path = row.path;
         track.title = row.title;
         track.artist = row.artist;
         track.album = row.album;
         track.year = row.year;
         track.trackNo = row.trackNo;
         track.size = row.size;
-        track.artPath = row.artPath;
         view_.trackIndex_.emplace(row.id, static_cast<uint32_t>(i));
     }
     RankTitles();
@@ -476,8 +474,13 @@ void LibraryViewBuilder::BuildAllMusicAndRandom() {
 }
 
 void LibraryViewBuilder::RenderTracks() {
-    // The type fields depend on the extension alone: worked out once per extension.
-    std::unordered_map<std::string, std::pair<std::string, std::string>> typeOf;
+    // The type fields depend on the extension alone: worked out once per extension, and the
+    // protocolInfo stored once in the view.
+    struct FileType {
+        std::string mimeType, dlnaFeatures;
+        int protocolInfoIndex = -1;
+    };
+    std::unordered_map<std::string, FileType> typeOf;
     for (std::size_t i = 0; i < rows_.size(); ++i) {
         const Row& row = rows_[i];
         DidlObject item;
@@ -493,15 +496,21 @@ void LibraryViewBuilder::RenderTracks() {
         item.resPath = ResUrlPath(row.id, row.path);
         if (!row.artPath.empty())
             item.artPath = ArtUrlPath(row.id, row.artPath);
-        auto type = typeOf.find(medialib::LowerExtension(row.path));
-        if (type == typeOf.end())
-            type = typeOf
-                       .emplace(medialib::LowerExtension(row.path),
-                                std::make_pair(std::string(medialib::MimeTypeOfPath(row.path)),
-                                               medialib::DlnaContentFeatures(row.path)))
-                       .first;
-        item.mimeType = type->second.first;
-        item.dlnaFeatures = type->second.second;
+        const std::string extension = medialib::LowerExtension(row.path);
+        auto type = typeOf.find(extension);
+        if (type == typeOf.end()) {
+            FileType fileType{medialib::MimeTypeOfPath(row.path),
+                              medialib::DlnaContentFeatures(row.path), -1};
+            auto& shared = view_.protocolInfos_;
+            if (shared.size() < kMaxSharedProtocolInfos) {
+                fileType.protocolInfoIndex = static_cast<int>(shared.size());
+                shared.push_back(ProtocolInfo(fileType.mimeType, fileType.dlnaFeatures));
+            }
+            type = typeOf.emplace(extension, std::move(fileType)).first;
+        }
+        item.mimeType = type->second.mimeType;
+        item.dlnaFeatures = type->second.dlnaFeatures;
+        item.protocolInfoIndex = type->second.protocolInfoIndex;
         view_.tracks_[i].body = DidlItemBody(item);
         view_.tracks_[i].body.shrink_to_fit();
     }

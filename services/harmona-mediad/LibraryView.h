@@ -21,11 +21,9 @@ int CompareNoCase(std::string_view a, std::string_view b);
 
 struct ViewTrack {
     int64_t id = 0;
-    std::string path;                  // as library.db has it
     std::string title, artist, album;  // for sorting; as indexed
     int64_t year = 0, trackNo = 0, size = -1;
-    std::string artPath;  // the folder's cover image, "" when none
-    std::string body;     // the item's DIDL-Lite children (DidlItemBody)
+    std::string body;  // the item's DIDL-Lite children (DidlItemBody)
     // The containers that list this track (kNoIndex when none).
     uint32_t folderIn = kNoIndex, albumIn = kNoIndex, artistAlbumIn = kNoIndex,
              latestAlbumIn = kNoIndex, genreIn = kNoIndex;
@@ -56,6 +54,8 @@ class LibraryView {
     uint32_t updateId() const { return updateId_; }
     const std::vector<ViewContainer>& containers() const { return containers_; }
     const std::vector<ViewTrack>& tracks() const { return tracks_; }
+    // The res protocolInfo of each file type, which the track bodies mark (DidlPieces).
+    const std::vector<std::string>& protocolInfos() const { return protocolInfos_; }
 
     const ViewContainer* FindContainer(const std::string& id) const;
     uint32_t ContainerIndex(const std::string& id) const;
@@ -74,6 +74,7 @@ class LibraryView {
     uint32_t updateId_ = 0;
     std::vector<ViewContainer> containers_;
     std::vector<ViewTrack> tracks_;
+    std::vector<std::string> protocolInfos_;
     std::unordered_map<std::string, uint32_t> containerIndex_;
     std::unordered_map<int64_t, uint32_t> trackIndex_;
     uint32_t allMusic_ = kNoIndex, random_ = kNoIndex;

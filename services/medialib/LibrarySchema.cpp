@@ -80,7 +80,7 @@ bool EnsureLibrarySchema(Database& db) {
     if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
         return false;
     if (!(db.Execute(kSchema) == SQLITE_OK) || !AddLaterColumns(db)) {
-        (db.Execute("ROLLBACK") == SQLITE_OK);
+        db.Execute("ROLLBACK");
         return false;
     }
     return (db.Execute("COMMIT") == SQLITE_OK);
