@@ -220,9 +220,14 @@ void LiveLibrary::WatchTree(const std::string& path, int depth) {
         std::lock_guard<std::mutex> lock(watchesMutex_);
         watches_[wd] = path;
     }
-    DIR* dir = opendir(path.c_str());
-    if (dir == nullptr)
+    // Not through a link swapped in since the watch was set: only the share's own folders.
+    const int fd = open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+    DIR* dir = fd >= 0 ? fdopendir(fd) : nullptr;
+    if (dir == nullptr) {
+        if (fd >= 0)
+            close(fd);
         return;
+    }
     while (const dirent* entry = readdir(dir)) {
         if (IsSkippedName(entry->d_name))
             continue;
