@@ -279,6 +279,22 @@ TEST(OneParent, TrackIdsOfOneContainerAreUnknownInAnother) {
               harmona::mediad::kErrorNoSuchObject);
 }
 
+TEST(OneParent, PathsOutsideTheShareShowInNoFolderButEverywhereElse) {
+    const std::string share = kShare;
+    WriteLibrary({{share + "/Good/ok.mp3", "Inside", "A", "X", "", "Pop", 0, 1, 1},
+                  {share + "/../etc/passwd.mp3", "Dots", "A", "X", "", "Pop", 0, 2, 2},
+                  {share + "//Double/slash.mp3", "Double", "A", "X", "", "Pop", 0, 3, 3},
+                  {"/elsewhere/outside.mp3", "Outside", "A", "X", "", "Pop", 0, 4, 4},
+                  {share + "music/prefix.mp3", "Prefix", "A", "X", "", "Pop", 0, 5, 5}});
+    const ContentDirectory directory = Directory();
+    EXPECT_EQ(Titles(Objects(Browse(directory, "music_file"))), std::vector<std::string>{"Good"});
+    EXPECT_EQ(Objects(Browse(directory, "music_all")).size(), 5u);
+    const std::vector<DidlObjectRecord> albums = Objects(Browse(directory, "music_album"));
+    ASSERT_EQ(albums.size(), 1u);
+    EXPECT_EQ(albums[0].childCount, 5);
+    CheckEveryObjectHasOneParent(directory);
+}
+
 // --- Random 100 -------------------------------------------------------------------------------
 
 std::vector<HandTrack> ManyTracks(int count) {
