@@ -9,6 +9,8 @@
 #include <algorithm>
 #include <cerrno>
 #include <chrono>
+#include <condition_variable>
+#include <cstdio>
 #include <cstring>
 #include <functional>
 #include <mutex>
@@ -79,8 +81,11 @@ class LiveShare : public ::testing::Test {
         options.maxWatches = maxWatches;
         options.unwatchedRescan = unwatchedRescan;
         options.onIndexed = [this](const index::IndexReport& report) {
-            std::lock_guard<std::mutex> lock(mutex_);
-            reports_.push_back(report);
+            {
+                std::lock_guard<std::mutex> lock(mutex_);
+                reports_.push_back(report);
+            }
+            HoldWhileAsked();
         };
         live_ = std::make_unique<LiveLibrary>(options);
         std::string error;
@@ -90,12 +95,33 @@ class LiveShare : public ::testing::Test {
         EXPECT_EQ(Reports().front().added, 5u);
     }
 
+    // While `hold_` is set, a finished pass keeps the live library's thread here (up to the time
+    // limit) until Release(): its inotify queue then fills up unread.
+    void HoldWhileAsked() {
+        std::unique_lock<std::mutex> lock(mutex_);
+        if (!hold_)
+            return;
+        held_ = true;
+        changed_.notify_all();
+        changed_.wait_for(lock, kTimeLimit, [this] { return !hold_; });
+    }
+    bool WaitUntilHeld() {
+        std::unique_lock<std::mutex> lock(mutex_);
+        return changed_.wait_for(lock, kTimeLimit, [this] { return held_; });
+    }
+    void Release() {
+        std::lock_guard<std::mutex> lock(mutex_);
+        hold_ = false;
+        changed_.notify_all();
+    }
+
     std::vector<index::IndexReport> Reports() {
         std::lock_guard<std::mutex> lock(mutex_);
         return reports_;
     }
 
     void TearDown() override {
+        Release();
         if (live_)
             live_->Stop();
     }
@@ -103,6 +129,8 @@ class LiveShare : public ::testing::Test {
     ContentDirectory directory_{kLibraryDb, kShare, "http://127.0.0.1:50003/media/"};
     std::unique_ptr<LiveLibrary> live_;
     std::mutex mutex_;
+    std::condition_variable changed_;
+    bool hold_ = false, held_ = false;
     std::vector<index::IndexReport> reports_;
 };
 
@@ -189,6 +217,48 @@ TEST_F(LiveShare, BeyondTheWatchLimitAPeriodicRescanStillFindsNewFiles) {
             ++limitLines;
     }
     EXPECT_EQ(limitLines, 1) << "the limit is logged once";
+}
+
+long MaxQueuedEvents() {
+    FILE* file = std::fopen("/proc/sys/fs/inotify/max_queued_events", "r");
+    long value = -1;
+    if (file != nullptr) {
+        if (std::fscanf(file, "%ld", &value) != 1)
+            value = -1;
+        std::fclose(file);
+    }
+    return value;
+}
+
+TEST_F(LiveShare, AnOverflowedEventQueueRewatchesAndRescansTheShare) {
+    const long queue = MaxQueuedEvents();
+    if (queue <= 0 || queue > 200000)
+        GTEST_SKIP() << "fs.inotify.max_queued_events is " << queue;
+    StartLive();
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        hold_ = true;
+    }
+    WriteFile(std::string(kShare) + "/Jazz/trigger.txt", "start a pass\n");
+    ASSERT_TRUE(WaitUntilHeld());
+    // More events than the kernel queues while nobody reads them...
+    for (long i = 0; i < queue + 100; ++i)
+        WriteFile(std::string(kShare) + "/Jazz/flood-" + std::to_string(i), "");
+    // ...so the new folder's own event is lost: only the rescan after the overflow finds it.
+    MakeAudioFile(std::string(kShare) + "/Late Arrival/first.ogg",
+                  {"Arrived In The Flood", "Late", "Flood", "", "Pop"});
+    Release();
+    ASSERT_TRUE(WaitUntil([&] { return HasTitle(directory_, "Arrived In The Flood"); }));
+    int overflowLines = 0;
+    for (const LogLine& line : TakeLogLines(200)) {
+        if (line.message.find("live library: event queue overflowed") == 0)
+            ++overflowLines;
+    }
+    EXPECT_GE(overflowLines, 1);
+    // The folder is watched from then on.
+    MakeAudioFile(std::string(kShare) + "/Late Arrival/second.ogg",
+                  {"Arrived After", "Late", "Flood", "", "Pop"});
+    ASSERT_TRUE(WaitUntil([&] { return HasTitle(directory_, "Arrived After"); }));
 }
 
 TEST_F(LiveShare, StopEndsTheThreadAndLaterChangesWaitForTheNextStart) {
