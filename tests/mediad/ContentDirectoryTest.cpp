@@ -138,6 +138,12 @@ TEST(DidlText, NonCharactersControlsAndBrokenBytesNeverReachAReply) {
         const BrowseResult result = Browse(directory, id);
         ASSERT_EQ(result.error, 0) << id;
         EXPECT_TRUE(IsStrictXmlText(result.didl)) << id << ": " << result.didl;
+        std::string error;
+        EXPECT_TRUE(ParsesStrictlyWithLibxml2(result.didl, &error)) << id << ": " << error;
+        const GupnpAvDocument gupnpAv = ParseWithGupnpAv(result.didl);
+        EXPECT_TRUE(gupnpAv.parsed) << id;
+        EXPECT_EQ(gupnpAv.messages, "") << id;
+        EXPECT_EQ(gupnpAv.objects.size(), 1u) << id;
         const std::vector<DidlObjectRecord> objects = Objects(result);
         ASSERT_EQ(objects.size(), 1u) << id;
     }
@@ -155,6 +161,8 @@ TEST(DidlText, AUFFFETitleWrittenIntoTheFileParsesAfterIndexing) {
     ASSERT_EQ(RunIndexer().exitStatus, 0);
     const BrowseResult result = Browse(Directory(), "music_all");
     EXPECT_TRUE(IsStrictXmlText(result.didl)) << result.didl;
+    std::string error;
+    EXPECT_TRUE(ParsesStrictlyWithLibxml2(result.didl, &error)) << error;
     const std::vector<DidlObjectRecord> objects = Objects(result);
     ASSERT_EQ(objects.size(), 1u);
     EXPECT_EQ(objects[0].title.rfind("Odd", 0), 0u) << objects[0].title;
@@ -220,6 +228,17 @@ void CheckEveryObjectHasOneParent(const ContentDirectory& directory) {
         const BrowseResult children = Browse(directory, container.id);
         ASSERT_EQ(children.error, 0) << container.id;
         EXPECT_EQ(static_cast<long>(children.totalMatches), container.childCount) << container.id;
+        // GUPnP-AV's parser, as a GUPnP control point reads the reply, sees the same objects.
+        const GupnpAvDocument gupnpAv = ParseWithGupnpAv(children.didl);
+        EXPECT_TRUE(gupnpAv.parsed && gupnpAv.messages.empty()) << gupnpAv.messages;
+        const std::vector<DidlObjectRecord> byPugixml = Objects(children);
+        ASSERT_EQ(gupnpAv.objects.size(), byPugixml.size()) << container.id;
+        for (std::size_t i = 0; i < byPugixml.size(); ++i) {
+            EXPECT_EQ(gupnpAv.objects[i].id, byPugixml[i].id);
+            EXPECT_EQ(gupnpAv.objects[i].parentId, byPugixml[i].parentId);
+            EXPECT_EQ(gupnpAv.objects[i].refId, byPugixml[i].refId);
+            EXPECT_EQ(gupnpAv.objects[i].title, byPugixml[i].title);
+        }
         for (const DidlObjectRecord& child : Objects(children)) {
             EXPECT_EQ(child.parentId, container.id) << child.id;
             EXPECT_TRUE(listed.insert(child.id).second) << child.id << " is listed twice";

@@ -1,6 +1,13 @@
 #include "DidlDocument.h"
 
+#include <libgupnp-av/gupnp-av.h>
+#include <libxml/parser.h>
+#include <libxml/xmlerror.h>
+
 #include <pugixml.hpp>
+
+#include "gupnp/Object.h"
+#include "gupnp/Signal.h"
 
 namespace harmona::test::mediad {
 namespace {
@@ -34,7 +41,66 @@ DidlObjectRecord ReadObject(pugi::xml_node node) {
     return object;
 }
 
+// Collects libxml2's messages while it lives (libxml2 keeps one handler per thread).
+class Libxml2Messages {
+  public:
+    Libxml2Messages() { xmlSetStructuredErrorFunc(this, &Libxml2Messages::Collect); }
+    ~Libxml2Messages() { xmlSetStructuredErrorFunc(nullptr, nullptr); }
+    const std::string& text() const { return text_; }
+
+  private:
+    static void Collect(void* self, xmlErrorPtr error) {
+        auto* messages = static_cast<Libxml2Messages*>(self);
+        if (error != nullptr && error->message != nullptr)
+            messages->text_ += error->message;
+    }
+    std::string text_;
+};
+
+std::string Text(const char* text) {
+    return text != nullptr ? text : "";
+}
+
+void OnObjectAvailable(GUPnPDIDLLiteParser*, GUPnPDIDLLiteObject* object, gpointer data) {
+    auto* objects = static_cast<std::vector<DidlObjectRecord>*>(data);
+    DidlObjectRecord record;
+    record.container = GUPNP_IS_DIDL_LITE_CONTAINER(object);
+    record.id = Text(gupnp_didl_lite_object_get_id(object));
+    record.parentId = Text(gupnp_didl_lite_object_get_parent_id(object));
+    record.title = Text(gupnp_didl_lite_object_get_title(object));
+    record.upnpClass = Text(gupnp_didl_lite_object_get_upnp_class(object));
+    if (GUPNP_IS_DIDL_LITE_ITEM(object))
+        record.refId = Text(gupnp_didl_lite_item_get_ref_id(GUPNP_DIDL_LITE_ITEM(object)));
+    if (GUPNP_IS_DIDL_LITE_CONTAINER(object))
+        record.childCount =
+            gupnp_didl_lite_container_get_child_count(GUPNP_DIDL_LITE_CONTAINER(object));
+    objects->push_back(std::move(record));
+}
+
 }  // namespace
+
+bool ParsesStrictlyWithLibxml2(const std::string& didl, std::string* error) {
+    Libxml2Messages messages;
+    xmlDocPtr document = xmlReadMemory(didl.data(), static_cast<int>(didl.size()), "didl.xml",
+                                       nullptr, XML_PARSE_NONET | XML_PARSE_HUGE);
+    const bool parsed = document != nullptr && messages.text().empty();
+    if (document != nullptr)
+        xmlFreeDoc(document);
+    *error = messages.text();
+    return parsed;
+}
+
+GupnpAvDocument ParseWithGupnpAv(const std::string& didl) {
+    GupnpAvDocument result;
+    Libxml2Messages messages;
+    auto parser = gupnp::ObjectRef<GUPnPDIDLLiteParser>::Adopt(gupnp_didl_lite_parser_new());
+    gupnp::SignalConnection available(parser.get(), "object-available",
+                                      G_CALLBACK(OnObjectAvailable), &result.objects);
+    gupnp::Error error;
+    result.parsed = gupnp_didl_lite_parser_parse_didl(parser.get(), didl.c_str(), error.out());
+    result.messages = messages.text() + error.message();
+    return result;
+}
 
 DidlDocument ParseDidl(const std::string& didl) {
     DidlDocument document;

@@ -27,4 +27,18 @@ DidlDocument ParseDidl(const std::string& didl);
 // U+10000..U+10FFFF), the text is well-formed UTF-8, and none is a Unicode non-character.
 bool IsStrictXmlText(const std::string& text);
 
+// libxml2 (the parser under GUPnP-AV and many renderers) in its strict mode: true when the
+// document is well-formed XML 1.0; otherwise false with libxml2's first message in `error`.
+bool ParsesStrictlyWithLibxml2(const std::string& didl, std::string* error);
+
+// The objects GUPnP-AV's DIDL-Lite parser (what GUPnP control points use) reports, and every
+// message libxml2 gave while it parsed (GUPnP-AV parses in recovery mode, so a document it
+// had to repair still yields objects; `messages` tells).
+struct GupnpAvDocument {
+    bool parsed = false;
+    std::string messages;
+    std::vector<DidlObjectRecord> objects;  // id, parentId, refId, title, upnpClass
+};
+GupnpAvDocument ParseWithGupnpAv(const std::string& didl);
+
 }  // namespace harmona::test::mediad
