@@ -551,6 +551,34 @@ TEST(UpdateIds, OnlyAnIndexerPassThatChangedSomethingMovesTheSystemUpdateId) {
     EXPECT_NE(FindTitle(Objects(Browse(directory, "music_all")), "Second, renamed"), nullptr);
 }
 
+TEST(UpdateIds, ContainerUpdateIdsNameAtMostAHundredContainersHigherOnesFirst) {
+    WriteLibrary(ManyTracks(300));
+    const ContentDirectory directory = Directory();
+    directory.SystemUpdateId();
+    // Every title changes: every container that lists tracks changes.
+    sqlite::Database db = sqlite::Database::Open(kLibraryDb, SQLITE_OPEN_READWRITE, 1000);
+    ASSERT_EQ(db.Execute("UPDATE track SET title = title || ' (live)'"), SQLITE_OK);
+    ASSERT_TRUE(medialib::BumpLibraryUpdateCount(db));
+    const uint32_t updateId = directory.SystemUpdateId();
+    const std::string changed = directory.ContainerUpdateIds();
+    std::vector<std::string> fields;
+    std::size_t start = 0;
+    while (start <= changed.size()) {
+        const std::size_t comma = std::min(changed.find(',', start), changed.size());
+        fields.push_back(changed.substr(start, comma - start));
+        start = comma + 1;
+    }
+    ASSERT_EQ(fields.size() % 2, 0u) << changed;
+    EXPECT_EQ(fields.size() / 2, harmona::mediad::kMaxContainerUpdates);
+    // The root's own children (the categories, their counts) did not change; theirs did.
+    EXPECT_EQ(fields[0], "music_all");
+    EXPECT_EQ(fields[2], "random");
+    for (std::size_t i = 0; i < fields.size(); i += 2)
+        EXPECT_NE(fields[i], "0");
+    for (std::size_t i = 1; i < fields.size(); i += 2)
+        EXPECT_EQ(fields[i], std::to_string(updateId));
+}
+
 TEST(UpdateIds, BrowsesDuringLibraryChangesAnswerFromOneWholeStateEach) {
     WriteLibrary(ManyTracks(2000));
     const ContentDirectory directory = Directory();
