@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <deque>
 #include <vector>
 
 #include "DidlWriter.h"
@@ -191,8 +192,9 @@ BrowseResult Metadata(const LibraryView& view, const std::string& id, const Didl
     return result;
 }
 
+// `sorted`: the container's children in the requested order, nullptr for the default order.
 BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
-                      const std::vector<SortField>& sort, const DidlPieces& pieces) {
+                      const std::vector<ViewChild>* sorted, const DidlPieces& pieces) {
     const uint32_t index = view.ContainerIndex(args.objectId);
     if (index == kNoIndex) {
         uint32_t listing = kNoIndex;
@@ -209,21 +211,60 @@ BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
     BrowseResult result;
     result.didl.reserve(kDidlBegin.size() + (last - first) * 640);
     result.didl = kDidlBegin;
-    if (sort.empty()) {
-        for (std::size_t i = first; i < last; ++i)
-            AppendChild(result.didl, view, index, container.children[i], pieces);
-    } else {
-        const std::vector<ViewChild> sorted = SortedChildren(view, container, sort);
-        for (std::size_t i = first; i < last; ++i)
-            AppendChild(result.didl, view, index, sorted[i], pieces);
-    }
+    const std::vector<ViewChild>& children = sorted != nullptr ? *sorted : container.children;
+    std::size_t end = first;
+    while (end < last && (end == first || result.didl.size() < kMaxResultBytes))
+        AppendChild(result.didl, view, index, children[end++], pieces);
     result.didl += kDidlEnd;
-    result.numberReturned = ClampCount(last - first);
+    result.numberReturned = ClampCount(end - first);
     result.totalMatches = ClampCount(total);
     return result;
 }
 
+// One text per distinct criteria: "+dc:title, -upnp:album" and "dc:title,-upnp:album" agree.
+std::string SortKeyText(const std::vector<SortField>& sort) {
+    std::string key;
+    for (const SortField& field : sort) {
+        key += static_cast<char>('a' + static_cast<int>(field.key));
+        key += field.descending ? '-' : '+';
+    }
+    return key;
+}
+
+constexpr std::size_t kSortedListingsKept = 4;
+
 }  // namespace
+
+struct ContentDirectory::SortedListings {
+    struct Entry {
+        uint64_t viewSerial = 0;
+        uint32_t container = 0;
+        std::string key;
+        std::shared_ptr<const std::vector<ViewChild>> children;
+    };
+    std::mutex mutex;
+    std::deque<Entry> entries;  // the most recent first
+
+    std::shared_ptr<const std::vector<ViewChild>> Get(const LibraryView& view, uint32_t container,
+                                                      const std::vector<SortField>& sort) {
+        const std::string key = SortKeyText(sort);
+        {
+            std::lock_guard<std::mutex> lock(mutex);
+            for (const Entry& entry : entries) {
+                if (entry.viewSerial == view.serial() && entry.container == container &&
+                    entry.key == key)
+                    return entry.children;
+            }
+        }
+        auto children = std::make_shared<const std::vector<ViewChild>>(
+            SortedChildren(view, view.containers()[container], sort));
+        std::lock_guard<std::mutex> lock(mutex);
+        entries.push_front({view.serial(), container, key, children});
+        if (entries.size() > kSortedListingsKept)
+            entries.pop_back();
+        return children;
+    }
+};
 
 bool ContentDirectory::FileStamp::operator==(const FileStamp& other) const {
     return device == other.device && inode == other.inode && size == other.size &&
@@ -235,7 +276,8 @@ ContentDirectory::ContentDirectory(std::string dbPath, std::string sharePath,
                                    std::string mediaBaseUrl)
     : dbPath_(std::move(dbPath)),
       sharePath_(std::move(sharePath)),
-      mediaBaseUrl_(std::move(mediaBaseUrl)) {}
+      mediaBaseUrl_(std::move(mediaBaseUrl)),
+      sortedListings_(std::make_unique<SortedListings>()) {}
 
 ContentDirectory::~ContentDirectory() = default;
 
@@ -314,8 +356,12 @@ BrowseResult ContentDirectory::Browse(const BrowseArgs& args) const {
         return Error(kErrorActionFailed, "The library database cannot be read");
     const DidlPieces pieces{args.mediaBaseUrl.empty() ? mediaBaseUrl_ : args.mediaBaseUrl,
                             &view->protocolInfos()};
+    std::shared_ptr<const std::vector<ViewChild>> sorted;
+    const uint32_t container = view->ContainerIndex(args.objectId);
+    if (!args.metadata && !sort.empty() && container != kNoIndex)
+        sorted = sortedListings_->Get(*view, container, sort);
     BrowseResult result = args.metadata ? Metadata(*view, args.objectId, pieces)
-                                        : Children(*view, args, sort, pieces);
+                                        : Children(*view, args, sorted.get(), pieces);
     if (result.error == 0)
         result.updateId = view->updateId();
     return result;

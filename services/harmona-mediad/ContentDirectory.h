@@ -33,6 +33,12 @@ inline constexpr const char* kSearchCapabilities = "";
 // the tree first); a control point that misses a deeper one still sees SystemUpdateID move.
 inline constexpr std::size_t kMaxContainerUpdates = 100;
 
+// A Browse returns fewer objects than asked for once its DIDL-Lite reaches this size (always at
+// least one), as ContentDirectory:1 allows: a client pages on from NumberReturned, and no reply,
+// once escaped into its SOAP envelope, comes near the 64 MiB a client such as the tree's CGI
+// accepts, however large the container.
+inline constexpr std::size_t kMaxResultBytes = 16u * 1024u * 1024u;
+
 struct BrowseArgs {
     std::string objectId;
     bool metadata = false;  // BrowseMetadata; else BrowseDirectChildren
@@ -106,6 +112,8 @@ class ContentDirectory {
     // reloads it, the one before); nullptr when it cannot be read.
     std::shared_ptr<const LibraryView> CurrentView() const;
 
+    struct SortedListings;
+
     std::string dbPath_;
     std::string sharePath_;
     std::string mediaBaseUrl_;
@@ -115,6 +123,8 @@ class ContentDirectory {
     mutable FileStamp stamp_;
     mutable bool loaded_ = false;
     mutable std::string containerUpdateIds_;
+    // The last few sorted listings: the pages of one sorted listing are sorted once.
+    std::unique_ptr<SortedListings> sortedListings_;
 };
 
 }  // namespace harmona::mediad

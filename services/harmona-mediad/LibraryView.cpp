@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <atomic>
 #include <functional>
 #include <map>
 #include <numeric>
@@ -556,7 +557,9 @@ void LibraryViewBuilder::RenderContainers() {
 
 std::unique_ptr<LibraryView> LibraryView::Load(const std::string& dbPath,
                                                const std::string& share) {
+    static std::atomic<uint64_t> loads{0};
     auto view = std::unique_ptr<LibraryView>(new LibraryView());
+    view->serial_ = ++loads;
     LibraryViewBuilder builder(*view, share);
     if (!builder.Read(dbPath))
         return nullptr;

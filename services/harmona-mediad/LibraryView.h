@@ -52,6 +52,8 @@ class LibraryView {
     static std::unique_ptr<LibraryView> Load(const std::string& dbPath, const std::string& share);
 
     uint32_t updateId() const { return updateId_; }
+    // Different for every view this process loads: what caches made of a view are keyed by.
+    uint64_t serial() const { return serial_; }
     const std::vector<ViewContainer>& containers() const { return containers_; }
     const std::vector<ViewTrack>& tracks() const { return tracks_; }
     // The res protocolInfo of each file type, which the track bodies mark (DidlPieces).
@@ -72,6 +74,7 @@ class LibraryView {
   private:
     friend class LibraryViewBuilder;
     uint32_t updateId_ = 0;
+    uint64_t serial_ = 0;
     std::vector<ViewContainer> containers_;
     std::vector<ViewTrack> tracks_;
     std::vector<std::string> protocolInfos_;

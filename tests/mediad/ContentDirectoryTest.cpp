@@ -342,6 +342,39 @@ std::vector<std::string> PagedIds(const ContentDirectory& directory, const std::
     return ids;
 }
 
+// --- Paging ---------------------------------------------------------------------------------
+
+TEST(Paging, AReplyEndsNearItsByteBudgetAndTheNextPagesBringTheRest) {
+    // 20,000 tracks with 1 KiB titles: more DIDL-Lite than one reply may hold.
+    std::vector<HandTrack> tracks = ManyTracks(20000);
+    for (HandTrack& track : tracks)
+        track.title += " " + std::string(1000, 'x');
+    WriteLibrary(tracks);
+    const ContentDirectory directory = Directory();
+    const BrowseResult first = Browse(directory, "music_all");
+    ASSERT_EQ(first.error, 0);
+    EXPECT_EQ(first.totalMatches, 20000u);
+    EXPECT_LT(first.numberReturned, 20000u);
+    EXPECT_GT(first.numberReturned, 0u);
+    EXPECT_LT(first.didl.size(), harmona::mediad::kMaxResultBytes + 4096);
+    EXPECT_EQ(Objects(first).size(), first.numberReturned);
+    // A client that pages on from NumberReturned gets every track once, in order.
+    std::set<std::string> ids;
+    uint32_t start = 0;
+    int pages = 0;
+    while (start < first.totalMatches && pages < 100) {
+        const BrowseResult page = Browse(directory, "music_all", false, start, 0);
+        ASSERT_EQ(page.error, 0);
+        ASSERT_GT(page.numberReturned, 0u);
+        for (const DidlObjectRecord& object : Objects(page))
+            EXPECT_TRUE(ids.insert(object.id).second) << object.id;
+        start += page.numberReturned;
+        ++pages;
+    }
+    EXPECT_EQ(ids.size(), 20000u);
+    EXPECT_GE(pages, 2);
+}
+
 TEST(RandomContainer, PagesOfOneListingShowEveryDrawnTrackOnceInOneOrder) {
     WriteLibrary(ManyTracks(300));
     const ContentDirectory directory = Directory();
