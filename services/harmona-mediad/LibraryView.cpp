@@ -235,7 +235,6 @@ void LibraryViewBuilder::Build() {
         track.album = row.album;
         track.year = row.year;
         track.trackNo = row.trackNo;
-        track.size = row.size;
         view_.trackIndex_.emplace(row.id, static_cast<uint32_t>(i));
     }
     RankTitles();

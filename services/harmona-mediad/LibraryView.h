@@ -22,7 +22,7 @@ int CompareNoCase(std::string_view a, std::string_view b);
 struct ViewTrack {
     int64_t id = 0;
     std::string title, artist, album;  // for sorting; as indexed
-    int64_t year = 0, trackNo = 0, size = -1;
+    int64_t year = 0, trackNo = 0;
     std::string body;  // the item's DIDL-Lite children (DidlItemBody)
     // The containers that list this track (kNoIndex when none).
     uint32_t folderIn = kNoIndex, albumIn = kNoIndex, artistAlbumIn = kNoIndex,
