@@ -138,6 +138,16 @@ void BindOptionalNumber(Statement& stmt, int index, int64_t value) {
         stmt.Bind(index, value);
 }
 
+// Every write transaction also moves the library's update count, so that a reader never sees
+// changed rows under the update count of before (the media server's SystemUpdateID).
+bool CommitWithUpdate(Database& db) {
+    if (!medialib::BumpLibraryUpdateCount(db)) {
+        db.Execute("ROLLBACK");
+        return false;
+    }
+    return db.Execute("COMMIT") == SQLITE_OK;
+}
+
 // Reads the batch's tags (outside any transaction: the slow part), then writes the batch in one.
 bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFile*>& batch,
                 IndexReport& report) {
@@ -176,7 +186,7 @@ bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFi
             return false;
         }
     }
-    return (db.Execute("COMMIT") == SQLITE_OK);
+    return CommitWithUpdate(db);
 }
 
 // Rows whose file is unchanged but whose size was not recorded yet or whose folder's cover image
@@ -198,7 +208,7 @@ bool RefreshRows(Database& db, const std::vector<const FoundFile*>& files) {
                 return false;
             }
         }
-        if (!(db.Execute("COMMIT") == SQLITE_OK))
+        if (!CommitWithUpdate(db))
             return false;
     }
     return true;
@@ -219,7 +229,7 @@ bool RemoveRows(Database& db, const std::vector<std::string>& gone) {
                 return false;
             }
         }
-        if (!(db.Execute("COMMIT") == SQLITE_OK))
+        if (!CommitWithUpdate(db))
             return false;
     }
     return true;
@@ -290,23 +300,16 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath,
     if (!upsert)
         return Fail(report, "cannot prepare the track update: " + db.Error());
     for (std::size_t start = 0; start < toRead.size(); start += kIndexBatchSize) {
-        if (stopped()) {
-            // What was committed is in the library: readers must learn of it.
-            if (start > 0)
-                medialib::BumpLibraryUpdateCount(db);
+        if (stopped())
             return Fail(report, "stopped");
-        }
         const std::size_t end = std::min(toRead.size(), start + kIndexBatchSize);
         const std::vector<const FoundFile*> batch(toRead.begin() + start, toRead.begin() + end);
         if (!WriteBatch(db, upsert, batch, report))
             return Fail(report, "cannot write tracks: " + db.Error());
     }
 
-    if (stopped()) {
-        if (!toRead.empty())
-            medialib::BumpLibraryUpdateCount(db);
+    if (stopped())
         return Fail(report, "stopped");
-    }
     std::vector<std::string> gone;
     for (const auto& [path, row] : known) {
         if (!row.seen)
@@ -317,8 +320,8 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath,
         return Fail(report, "cannot remove tracks: " + db.Error());
     if (!RefreshRows(db, toRefresh))
         return Fail(report, "cannot update tracks: " + db.Error());
-    const bool changed = !toRead.empty() || !gone.empty() || !toRefresh.empty();
-    if ((changed || medialib::LibraryUpdateCount(db) < 0) && !medialib::BumpLibraryUpdateCount(db))
+    // A first run over an empty share still gives the library an update count.
+    if (medialib::LibraryUpdateCount(db) < 0 && !medialib::BumpLibraryUpdateCount(db))
         return Fail(report, "cannot record the library update: " + db.Error());
     report.ok = true;
     return report;
