@@ -16,5 +16,8 @@ bool IsValidUtf8(std::string_view text);
 // Each byte that does not start a well-formed sequence becomes U+FFFD.
 std::string RepairUtf8(std::string_view text);
 
+// The longest prefix of `text` of at most `maxBytes` bytes that does not end inside a multi-byte
+// sequence, so that a cut never makes valid UTF-8 invalid.
+std::string_view CutUtf8(std::string_view text, std::size_t maxBytes);
 
 }  // namespace harmona::cgi

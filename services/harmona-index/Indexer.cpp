@@ -7,9 +7,11 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <cctype>
 #include <cerrno>
 #include <cstdio>
 #include <ctime>
+#include <iterator>
 #include <unordered_map>
 #include <vector>
 
@@ -30,10 +32,14 @@ constexpr int kBusyTimeoutMs = 10000;
 struct FoundFile {
     std::string path;
     int64_t mtime = 0;
+    int64_t size = 0;
+    std::string artPath;  // the folder's cover image, "" when it has none
 };
 
 struct KnownRow {
     int64_t mtime = 0;
+    int64_t size = -1;  // -1: not recorded yet (a database of an older indexer)
+    std::string artPath;
     bool seen = false;
 };
 
@@ -44,14 +50,38 @@ void MakeParentDirs(const std::string& file) {
     }
 }
 
+// Cover image names players and taggers write beside the tracks, best first; any letter case,
+// extension .jpg, .jpeg or .png.
+constexpr const char* kCoverNames[] = {"cover", "folder", "front", "albumart", "album"};
+constexpr int kNoCover = 1000;
+
+// The rank of `name` as a cover image (lower is better), kNoCover when it is none.
+int CoverRank(const std::string& name) {
+    const std::string extension = medialib::LowerExtension(name);
+    if (extension != "jpg" && extension != "jpeg" && extension != "png")
+        return kNoCover;
+    std::string stem = name.substr(0, name.size() - extension.size() - 1);
+    for (char& c : stem)
+        c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+    for (std::size_t i = 0; i < std::size(kCoverNames); ++i) {
+        if (stem == kCoverNames[i])
+            return static_cast<int>(i) * 2 + (extension == "png" ? 1 : 0);
+    }
+    return kNoCover;
+}
+
 // Depth-first walk that never follows a symbolic link and skips hidden names (".", "..",
-// ".Trash", the "@eaDir"-style system folders start with "@" and are skipped too).
+// ".Trash", the "@eaDir"-style system folders start with "@" and are skipped too). Each audio
+// file carries the cover image of its folder, if there is one.
 void WalkFolder(int dirFd, const std::string& path, int depth, std::vector<FoundFile>& found) {
     DIR* dir = fdopendir(dirFd);
     if (dir == nullptr) {
         close(dirFd);
         return;
     }
+    std::vector<FoundFile> here;
+    std::string cover;
+    int coverRank = kNoCover;
     while (const dirent* entry = readdir(dir)) {
         const char* name = entry->d_name;
         if (name[0] == '.' || name[0] == '@')
@@ -66,17 +96,31 @@ void WalkFolder(int dirFd, const std::string& path, int depth, std::vector<Found
             if (childFd >= 0)
                 WalkFolder(childFd, child, depth + 1, found);
         } else if (S_ISREG(st.st_mode) && medialib::IsIndexableAudioFile(child)) {
-            found.push_back({child, static_cast<int64_t>(st.st_mtime)});
+            here.push_back(
+                {child, static_cast<int64_t>(st.st_mtime), static_cast<int64_t>(st.st_size), {}});
+        } else if (S_ISREG(st.st_mode)) {
+            const int rank = CoverRank(name);
+            if (rank < coverRank || (rank == coverRank && rank < kNoCover && child < cover)) {
+                coverRank = rank;
+                cover = child;
+            }
         }
     }
     closedir(dir);
+    for (FoundFile& file : here) {
+        file.artPath = cover;
+        found.push_back(std::move(file));
+    }
 }
 
 std::unordered_map<std::string, KnownRow> LoadKnownRows(Database& db) {
     std::unordered_map<std::string, KnownRow> known;
-    Statement stmt = db.Prepare("SELECT path, mtime FROM track");
-    while (stmt && stmt.Step() == SQLITE_ROW)
-        known[std::string(stmt.ColumnText(0))] = KnownRow{stmt.ColumnInt64(1), false};
+    Statement stmt = db.Prepare("SELECT path, mtime, size, art_path FROM track");
+    while (stmt && stmt.Step() == SQLITE_ROW) {
+        const int64_t size = stmt.ColumnType(2) == SQLITE_NULL ? -1 : stmt.ColumnInt64(2);
+        known[std::string(stmt.ColumnText(0))] =
+            KnownRow{stmt.ColumnInt64(1), size, std::string(stmt.ColumnText(3)), false};
+    }
     return known;
 }
 
@@ -92,6 +136,16 @@ void BindOptionalNumber(Statement& stmt, int index, int64_t value) {
         stmt.BindNull(index);
     else
         stmt.Bind(index, value);
+}
+
+// Every write transaction also moves the library's update count, so that a reader never sees
+// changed rows under the update count of before (the media server's SystemUpdateID).
+bool CommitWithUpdate(Database& db) {
+    if (!medialib::BumpLibraryUpdateCount(db)) {
+        db.Execute("ROLLBACK");
+        return false;
+    }
+    return db.Execute("COMMIT") == SQLITE_OK;
 }
 
 // Reads the batch's tags (outside any transaction: the slow part), then writes the batch in one.
@@ -125,12 +179,39 @@ bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFi
         BindOptionalNumber(upsert, 10, t.durationMs);
         upsert.Bind(11, batch[i]->mtime);
         upsert.Bind(12, now);
+        upsert.Bind(13, batch[i]->size);
+        BindOptionalText(upsert, 14, batch[i]->artPath);
         if (upsert.Step() != SQLITE_DONE) {
-            (db.Execute("ROLLBACK") == SQLITE_OK);
+            db.Execute("ROLLBACK");
             return false;
         }
     }
-    return (db.Execute("COMMIT") == SQLITE_OK);
+    return CommitWithUpdate(db);
+}
+
+// Rows whose file is unchanged but whose size was not recorded yet or whose folder's cover image
+// changed: updated without reading a tag.
+bool RefreshRows(Database& db, const std::vector<const FoundFile*>& files) {
+    Statement refresh = db.Prepare("UPDATE track SET size = ?1, art_path = ?2 WHERE path = ?3");
+    if (!refresh)
+        return false;
+    for (std::size_t start = 0; start < files.size(); start += kIndexBatchSize) {
+        if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
+            return false;
+        for (std::size_t i = start; i < files.size() && i < start + kIndexBatchSize; ++i) {
+            refresh.Reset();
+            refresh.Bind(1, files[i]->size);
+            BindOptionalText(refresh, 2, files[i]->artPath);
+            refresh.Bind(3, files[i]->path);
+            if (refresh.Step() != SQLITE_DONE) {
+                db.Execute("ROLLBACK");
+                return false;
+            }
+        }
+        if (!CommitWithUpdate(db))
+            return false;
+    }
+    return true;
 }
 
 bool RemoveRows(Database& db, const std::vector<std::string>& gone) {
@@ -144,11 +225,11 @@ bool RemoveRows(Database& db, const std::vector<std::string>& gone) {
             remove.Reset();
             remove.Bind(1, gone[i]);
             if (remove.Step() != SQLITE_DONE) {
-                (db.Execute("ROLLBACK") == SQLITE_OK);
+                db.Execute("ROLLBACK");
                 return false;
             }
         }
-        if (!(db.Execute("COMMIT") == SQLITE_OK))
+        if (!CommitWithUpdate(db))
             return false;
     }
     return true;
@@ -162,7 +243,9 @@ IndexReport Fail(IndexReport report, const std::string& why) {
 
 }  // namespace
 
-IndexReport IndexShare(const std::string& share, const std::string& dbPath) {
+IndexReport IndexShare(const std::string& share, const std::string& dbPath,
+                       const std::atomic<bool>* stop) {
+    const auto stopped = [stop] { return stop != nullptr && stop->load(); };
     IndexReport report;
     const int shareFd = open(share.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     if (shareFd < 0)
@@ -186,6 +269,7 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath) {
 
     std::unordered_map<std::string, KnownRow> known = LoadKnownRows(db);
     std::vector<const FoundFile*> toRead;
+    std::vector<const FoundFile*> toRefresh;
     for (const FoundFile& file : found) {
         auto row = known.find(file.path);
         if (row == known.end()) {
@@ -194,29 +278,38 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath) {
             continue;
         }
         row->second.seen = true;
-        if (row->second.mtime != file.mtime) {
+        const KnownRow& stored = row->second;
+        if (stored.mtime != file.mtime || (stored.size >= 0 && stored.size != file.size)) {
             toRead.push_back(&file);
             ++report.updated;
+        } else if (stored.size < 0 || stored.artPath != file.artPath) {
+            toRefresh.push_back(&file);
         }
     }
 
     // A re-read keeps the row's id and its "added" (the first time the file was seen).
     Statement upsert = db.Prepare(
         "INSERT INTO track (path, title, artist, album, album_artist, genre, year, track_no, "
-        "disc_no, duration_ms, mtime, added) VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, "
-        "?11, ?12) ON CONFLICT(path) DO UPDATE SET title = excluded.title, artist = "
+        "disc_no, duration_ms, mtime, added, size, art_path) VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, "
+        "?8, ?9, ?10, ?11, ?12, ?13, ?14) ON CONFLICT(path) DO UPDATE SET title = excluded.title, "
+        "artist = "
         "excluded.artist, album = excluded.album, album_artist = excluded.album_artist, genre = "
         "excluded.genre, year = excluded.year, track_no = excluded.track_no, disc_no = "
-        "excluded.disc_no, duration_ms = excluded.duration_ms, mtime = excluded.mtime");
+        "excluded.disc_no, duration_ms = excluded.duration_ms, mtime = excluded.mtime, size = "
+        "excluded.size, art_path = excluded.art_path");
     if (!upsert)
         return Fail(report, "cannot prepare the track update: " + db.Error());
     for (std::size_t start = 0; start < toRead.size(); start += kIndexBatchSize) {
+        if (stopped())
+            return Fail(report, "stopped");
         const std::size_t end = std::min(toRead.size(), start + kIndexBatchSize);
         const std::vector<const FoundFile*> batch(toRead.begin() + start, toRead.begin() + end);
         if (!WriteBatch(db, upsert, batch, report))
             return Fail(report, "cannot write tracks: " + db.Error());
     }
 
+    if (stopped())
+        return Fail(report, "stopped");
     std::vector<std::string> gone;
     for (const auto& [path, row] : known) {
         if (!row.seen)
@@ -225,6 +318,11 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath) {
     report.removed = gone.size();
     if (!RemoveRows(db, gone))
         return Fail(report, "cannot remove tracks: " + db.Error());
+    if (!RefreshRows(db, toRefresh))
+        return Fail(report, "cannot update tracks: " + db.Error());
+    // A first run over an empty share still gives the library an update count.
+    if (medialib::LibraryUpdateCount(db) < 0 && !medialib::BumpLibraryUpdateCount(db))
+        return Fail(report, "cannot record the library update: " + db.Error());
     report.ok = true;
     return report;
 }

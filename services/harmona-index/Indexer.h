@@ -1,6 +1,7 @@
 // The library indexer: keeps the track table of library.db in step with the audio share.
 #pragma once
 
+#include <atomic>
 #include <cstddef>
 #include <string>
 
@@ -26,8 +27,10 @@ inline constexpr std::size_t kIndexBatchSize = 500;
 // added, files whose mtime changed are re-read (keeping their id and "added"), rows of files no
 // longer on the share are removed; the playlist tables' rows are never touched. A share that is
 // not a directory is an error and changes nothing (an unmounted volume must not empty the
-// library).
-IndexReport IndexShare(const std::string& share, const std::string& dbPath);
+// library). When `stop` becomes true the pass ends at its next batch (whatever was committed
+// stays, the rest is picked up by the next pass) with ok false and error "stopped".
+IndexReport IndexShare(const std::string& share, const std::string& dbPath,
+                       const std::atomic<bool>* stop = nullptr);
 
 // One line for the log and standard output: "files=N added=A updated=U removed=R tagreads=T
 // broken=B".

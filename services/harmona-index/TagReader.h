@@ -1,10 +1,15 @@
 // Reads one audio file's tags with TagLib.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <string>
 
 namespace harmona::index {
+
+// A tag value is cut to this many bytes (on a UTF-8 character boundary) when read: a display text
+// needs no more, and a file with a 5 MB title must not make every reply that lists it huge.
+inline constexpr std::size_t kMaxTagBytes = 1024;
 
 struct TrackTags {
     std::string title;  // never empty: the file name without its extension when the tag has none

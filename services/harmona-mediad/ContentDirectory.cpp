@@ -1,13 +1,15 @@
 #include "ContentDirectory.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
-#include <map>
-#include <set>
+#include <deque>
 #include <vector>
 
 #include "DidlWriter.h"
+#include "LibraryView.h"
 #include "MediaFiles.h"
 #include "ObjectIds.h"
 #include "sqlite/Database.h"
@@ -15,448 +17,135 @@
 namespace harmona::mediad {
 namespace {
 
-using sqlite::Database;
-using sqlite::Statement;
+// A file request waits this long for an indexer that holds library.db locked.
+constexpr int kLookUpBusyTimeoutMs = 3000;
 
-constexpr int kBusyTimeoutMs = 5000;
-constexpr int64_t kRandomCount = 100;
-constexpr int64_t kLatestAlbumCount = 50;
+enum class SortKey { Title, Artist, Album, TrackNumber, Date };
 
-// The album artist that groups albums: the album artist tag, else the track artist.
-constexpr const char* kAlbumArtistSql =
-    "COALESCE(NULLIF(album_artist, ''), NULLIF(artist, ''), '')";
-constexpr const char* kTrackColumns =
-    "id, path, title, artist, album, genre, track_no, duration_ms";
-
-constexpr const char* kFolderClass = "object.container.storageFolder";
-constexpr const char* kAlbumClass = "object.container.album.musicAlbum";
-constexpr const char* kArtistClass = "object.container.person.musicArtist";
-constexpr const char* kGenreClass = "object.container.genre.musicGenre";
-
-struct Category {
-    const char* id;
-    const char* title;
-};
-constexpr Category kCategories[] = {
-    {kAllMusicId, "All Music"},         {kFoldersId, "Folders"}, {kAlbumsId, "Albums"},
-    {kAlbumArtistsId, "Album Artists"}, {kGenresId, "Genres"},   {kRandomId, "Random 100"},
-    {kLatestAlbumsId, "Latest Albums"},
+struct SortField {
+    SortKey key;
+    bool descending;
 };
 
-enum class SortOrder { Default, TitleAscending, TitleDescending };
+struct SortProperty {
+    const char* name;
+    SortKey key;
+};
+constexpr SortProperty kSortProperties[] = {
+    {"dc:title", SortKey::Title},   {"upnp:artist", SortKey::Artist},
+    {"upnp:album", SortKey::Album}, {"upnp:originalTrackNumber", SortKey::TrackNumber},
+    {"dc:date", SortKey::Date},
+};
 
-bool ParseSortCriteria(const std::string& criteria, SortOrder* order) {
-    *order = SortOrder::Default;
+std::string Trimmed(const std::string& text) {
+    const std::size_t first = text.find_first_not_of(" \t\r\n");
+    if (first == std::string::npos)
+        return {};
+    return text.substr(first, text.find_last_not_of(" \t\r\n") - first + 1);
+}
+
+// "+upnp:album,+upnp:originalTrackNumber" -> its fields; false when a property is not one of the
+// sort capabilities.
+bool ParseSortCriteria(const std::string& criteria, std::vector<SortField>* fields) {
     std::size_t start = 0;
     while (start < criteria.size()) {
         std::size_t end = criteria.find(',', start);
         if (end == std::string::npos)
             end = criteria.size();
-        std::string field = criteria.substr(start, end - start);
+        std::string field = Trimmed(criteria.substr(start, end - start));
         start = end + 1;
-        field.erase(0, field.find_first_not_of(" \t"));
-        field.erase(field.find_last_not_of(" \t") + 1);
         if (field.empty())
             continue;
         bool descending = false;
         if (field[0] == '+' || field[0] == '-') {
             descending = field[0] == '-';
-            field.erase(0, 1);
+            field = Trimmed(field.substr(1));
         }
-        if (field != "dc:title")
+        const auto property = std::find_if(std::begin(kSortProperties), std::end(kSortProperties),
+                                           [&](const SortProperty& p) { return field == p.name; });
+        if (property == std::end(kSortProperties))
             return false;
-        if (*order == SortOrder::Default)
-            *order = descending ? SortOrder::TitleDescending : SortOrder::TitleAscending;
+        fields->push_back({property->key, descending});
     }
     return true;
 }
 
-// The ORDER BY of a query whose title column is `titleSql` (keyed further by `tieSql`).
-std::string OrderBy(SortOrder order, const std::string& defaultOrder, const std::string& titleSql,
-                    const std::string& tieSql) {
-    switch (order) {
-        case SortOrder::TitleAscending:
-            return " ORDER BY " + titleSql + " COLLATE NOCASE ASC, " + tieSql + " ASC";
-        case SortOrder::TitleDescending:
-            return " ORDER BY " + titleSql + " COLLATE NOCASE DESC, " + tieSql + " DESC";
-        case SortOrder::Default:
-            break;
-    }
-    return defaultOrder.empty() ? std::string() : " ORDER BY " + defaultOrder;
-}
-
-std::string LimitOffset(uint32_t start, uint32_t count) {
-    const long long limit = count == 0 ? -1 : static_cast<long long>(count);
-    return " LIMIT " + std::to_string(limit) + " OFFSET " + std::to_string(start);
-}
-
-std::string LowerAscii(std::string text) {
-    for (char& c : text) {
-        if (c >= 'A' && c <= 'Z')
-            c = static_cast<char>(c - 'A' + 'a');
-    }
-    return text;
-}
-
-class Library {
-  public:
-    Library(const std::string& dbPath, const std::string& share, const std::string& mediaBase)
-        : share_(share), mediaBase_(mediaBase) {
-        struct stat st {};
-        // A missing database is an empty library, not an error: the indexer has not run yet.
-        if (stat(dbPath.c_str(), &st) == 0) {
-            db_ = Database::OpenReadOnly(dbPath.c_str(), kBusyTimeoutMs);
-            opened_ = static_cast<bool>(db_);
-        } else
-            opened_ = true;
-    }
-    bool ok() const { return opened_; }
-
-    int64_t Count(const std::string& sql, const std::vector<std::string>& binds) {
-        Statement stmt = Prepare(sql, binds);
-        return stmt && stmt.Step() == SQLITE_ROW ? stmt.ColumnInt64(0) : 0;
-    }
-
-    DidlObject TrackObject(const Statement& row, const std::string& parentId) const {
-        DidlObject item;
-        item.id = TrackId(row.ColumnInt64(0));
-        item.parentId = parentId;
-        const std::string path = std::string(row.ColumnText(1));
-        item.title = std::string(row.ColumnText(2));
-        item.artist = std::string(row.ColumnText(3));
-        item.album = std::string(row.ColumnText(4));
-        item.genre = std::string(row.ColumnText(5));
-        item.trackNo = row.ColumnInt64(6);
-        item.durationMs = row.ColumnInt64(7);
-        item.upnpClass = kMusicTrackClass;
-        item.mimeType = medialib::MimeTypeOfPath(path);
-        const std::string extension = medialib::LowerExtension(path);
-        item.resUrl = mediaBase_ + std::to_string(row.ColumnInt64(0));
-        if (!extension.empty() && extension.size() <= 5 &&
-            extension.find_first_not_of("abcdefghijklmnopqrstuvwxyz0123456789") ==
-                std::string::npos)
-            item.resUrl += "." + extension;
-        return item;
-    }
-
-    std::vector<DidlObject> Tracks(const std::string& sql, const std::vector<std::string>& binds,
-                                   const std::string& parentId) {
-        std::vector<DidlObject> items;
-        Statement stmt = Prepare(sql, binds);
-        while (stmt && stmt.Step() == SQLITE_ROW)
-            items.push_back(TrackObject(stmt, parentId));
-        return items;
-    }
-
-    // Rows of (name, album artist or "", child count) turned into containers by `make`.
-    template <typename Make>
-    std::vector<DidlObject> Groups(const std::string& sql, const std::vector<std::string>& binds,
-                                   Make make) {
-        std::vector<DidlObject> containers;
-        Statement stmt = Prepare(sql, binds);
-        while (stmt && stmt.Step() == SQLITE_ROW)
-            containers.push_back(make(stmt));
-        return containers;
-    }
-
-    Statement Prepare(const std::string& sql, const std::vector<std::string>& binds) {
-        if (!db_)
-            return Statement();
-        Statement stmt = db_.Prepare(sql.c_str());
-        for (std::size_t i = 0; stmt && i < binds.size(); ++i)
-            stmt.Bind(static_cast<int>(i + 1), binds[i]);
-        return stmt;
-    }
-
-    const std::string& share() const { return share_; }
-
-  private:
-    Database db_;
-    bool opened_ = false;
-    std::string share_;
-    std::string mediaBase_;
+// What a child is sorted by: tracks by their tags; albums by name, album artist and year; other
+// containers by title alone (their artist, album, number and date are empty).
+struct SortValues {
+    std::string_view title, artist, album;
+    int64_t trackNo = 0, year = 0;
 };
 
-// --- The containers' children ---------------------------------------------------------------
-
-struct Page {
-    std::vector<DidlObject> objects;
-    int64_t total = 0;
-};
-
-DidlObject MakeContainer(const std::string& id, const std::string& parentId,
-                         const std::string& title, const char* upnpClass, int64_t childCount,
-                         const std::string& artist = "") {
-    DidlObject container;
-    container.container = true;
-    container.id = id;
-    container.parentId = parentId;
-    container.title = title;
-    container.upnpClass = upnpClass;
-    container.childCount = childCount;
-    container.artist = artist;
-    return container;
+SortValues ValuesOf(const LibraryView& view, const ViewChild& child) {
+    if (child.track) {
+        const ViewTrack& track = view.tracks()[child.index];
+        return {track.title, track.artist, track.album, track.trackNo, track.year};
+    }
+    const ViewContainer& container = view.containers()[child.index];
+    return {container.title, container.artist,
+            container.album ? std::string_view(container.title) : std::string_view(), 0,
+            container.year};
 }
 
-std::string WhereClause(const std::string& where) {
-    return where.empty() ? std::string() : " WHERE " + where;
+int CompareBy(SortKey key, const SortValues& a, const SortValues& b) {
+    switch (key) {
+        case SortKey::Title:
+            return CompareNoCase(a.title, b.title);
+        case SortKey::Artist:
+            return CompareNoCase(a.artist, b.artist);
+        case SortKey::Album:
+            return CompareNoCase(a.album, b.album);
+        case SortKey::TrackNumber:
+            return a.trackNo == b.trackNo ? 0 : a.trackNo < b.trackNo ? -1 : 1;
+        case SortKey::Date:
+            return a.year == b.year ? 0 : a.year < b.year ? -1 : 1;
+    }
+    return 0;
 }
 
-Page TrackPage(Library& lib, const std::string& where, const std::vector<std::string>& binds,
-               const std::string& defaultOrder, const std::string& parentId, SortOrder order,
-               uint32_t start, uint32_t count) {
-    Page page;
-    page.total = lib.Count("SELECT COUNT(*) FROM track" + WhereClause(where), binds);
-    page.objects =
-        lib.Tracks(std::string("SELECT ") + kTrackColumns + " FROM track" + WhereClause(where) +
-                       OrderBy(order, defaultOrder, "title", "id") + LimitOffset(start, count),
-                   binds, parentId);
-    return page;
-}
-
-Page RandomPage(Library& lib, SortOrder order, uint32_t start, uint32_t count) {
-    Page page = TrackPage(lib, "id IN (SELECT id FROM track ORDER BY random() LIMIT 100)", {},
-                          "random()", kRandomId, order, start, count);
-    page.total = std::min<int64_t>(page.total, kRandomCount);
-    return page;
-}
-
-// Albums are grouped by (album, album artist); tracks without an album belong to none.
-std::string AlbumSource(const std::string& extraWhere) {
-    return std::string("(SELECT album, ") + kAlbumArtistSql +
-           " AS aa, added FROM track WHERE album <> ''" + extraWhere + ")";
-}
-
-std::vector<DidlObject> AlbumRows(Library& lib, const std::string& sql,
-                                  const std::vector<std::string>& binds,
-                                  const std::string& parentId) {
-    return lib.Groups(sql, binds, [&](const Statement& row) {
-        const std::string album = std::string(row.ColumnText(0));
-        const std::string albumArtist = std::string(row.ColumnText(1));
-        return MakeContainer(AlbumId(albumArtist, album), parentId, album, kAlbumClass,
-                             row.ColumnInt64(2), albumArtist);
+// The children in the requested order; equal ones keep the default order, so that the order is
+// the same on every page of a listing.
+std::vector<ViewChild> SortedChildren(const LibraryView& view, const ViewContainer& container,
+                                      const std::vector<SortField>& fields) {
+    std::vector<ViewChild> children = container.children;
+    if (fields.empty())
+        return children;
+    std::vector<SortValues> values(children.size());
+    std::vector<uint32_t> order(children.size());
+    for (uint32_t i = 0; i < children.size(); ++i) {
+        values[i] = ValuesOf(view, children[i]);
+        order[i] = i;
+    }
+    std::stable_sort(order.begin(), order.end(), [&](uint32_t a, uint32_t b) {
+        for (const SortField& field : fields) {
+            const int result = CompareBy(field.key, values[a], values[b]);
+            if (result != 0)
+                return field.descending ? result > 0 : result < 0;
+        }
+        return false;
     });
+    std::vector<ViewChild> sorted;
+    sorted.reserve(children.size());
+    for (const uint32_t i : order)
+        sorted.push_back(children[i]);
+    return sorted;
 }
 
-Page AlbumPage(Library& lib, const std::string& extraWhere, const std::vector<std::string>& binds,
-               const std::string& parentId, SortOrder order, uint32_t start, uint32_t count) {
-    const std::string source = AlbumSource(extraWhere);
-    Page page;
-    page.total =
-        lib.Count("SELECT COUNT(*) FROM (SELECT 1 FROM " + source + " GROUP BY album, aa)", binds);
-    page.objects = AlbumRows(lib,
-                             "SELECT album, aa, COUNT(*) FROM " + source + " GROUP BY album, aa" +
-                                 OrderBy(order, "album COLLATE NOCASE, aa", "album", "aa") +
-                                 LimitOffset(start, count),
-                             binds, parentId);
-    return page;
+void AppendTrackIn(std::string& out, const LibraryView& view, uint32_t container,
+                   const ViewTrack& track, const DidlPieces& pieces) {
+    const std::string& containerId = view.containers()[container].id;
+    const bool own = container == view.allMusic();
+    AppendItem(out, TrackIdIn(containerId, track.id), containerId,
+               own ? std::string() : TrackId(track.id), track.body, pieces);
 }
 
-Page LatestAlbumPage(Library& lib, SortOrder order, uint32_t start, uint32_t count) {
-    const std::string source = AlbumSource("");
-    const std::string latest =
-        "SELECT album, aa, COUNT(*) AS n, MAX(added) AS latest FROM " + source +
-        " GROUP BY album, aa ORDER BY latest DESC, album COLLATE NOCASE, aa LIMIT " +
-        std::to_string(kLatestAlbumCount);
-    Page page;
-    page.total = lib.Count("SELECT COUNT(*) FROM (" + latest + ")", {});
-    page.objects =
-        AlbumRows(lib,
-                  "SELECT album, aa, n FROM (" + latest + ")" +
-                      OrderBy(order, "latest DESC, album COLLATE NOCASE, aa", "album", "aa") +
-                      LimitOffset(start, count),
-                  {}, kLatestAlbumsId);
-    return page;
-}
-
-Page ArtistPage(Library& lib, SortOrder order, uint32_t start, uint32_t count) {
-    const std::string source = std::string("(SELECT ") + kAlbumArtistSql +
-                               " AS aa, album FROM track WHERE album <> '') WHERE aa <> ''";
-    Page page;
-    page.total = lib.Count("SELECT COUNT(DISTINCT aa) FROM " + source, {});
-    page.objects = lib.Groups(
-        "SELECT aa, COUNT(DISTINCT album) FROM " + source + " GROUP BY aa" +
-            OrderBy(order, "aa COLLATE NOCASE, aa", "aa", "aa") + LimitOffset(start, count),
-        {}, [](const Statement& row) {
-            return MakeContainer(ArtistId(std::string(row.ColumnText(0))), kAlbumArtistsId,
-                                 std::string(row.ColumnText(0)), kArtistClass, row.ColumnInt64(1));
-        });
-    return page;
-}
-
-Page GenrePage(Library& lib, SortOrder order, uint32_t start, uint32_t count) {
-    Page page;
-    page.total = lib.Count("SELECT COUNT(DISTINCT genre) FROM track WHERE genre <> ''", {});
-    page.objects = lib.Groups("SELECT genre, COUNT(*) FROM track WHERE genre <> '' GROUP BY genre" +
-                                  OrderBy(order, "genre COLLATE NOCASE, genre", "genre", "genre") +
-                                  LimitOffset(start, count),
-                              {}, [](const Statement& row) {
-                                  return MakeContainer(GenreId(std::string(row.ColumnText(0))),
-                                                       kGenresId, std::string(row.ColumnText(0)),
-                                                       kGenreClass, row.ColumnInt64(1));
-                              });
-    return page;
-}
-
-void SortAndSlice(Page& page, SortOrder order, uint32_t start, uint32_t count) {
-    if (order != SortOrder::Default) {
-        std::vector<std::pair<std::string, std::size_t>> keys;
-        for (std::size_t i = 0; i < page.objects.size(); ++i)
-            keys.emplace_back(LowerAscii(page.objects[i].title), i);
-        std::stable_sort(keys.begin(), keys.end(), [&](const auto& a, const auto& b) {
-            return order == SortOrder::TitleAscending ? a.first < b.first : b.first < a.first;
-        });
-        std::vector<DidlObject> sorted;
-        sorted.reserve(keys.size());
-        for (const auto& key : keys)
-            sorted.push_back(std::move(page.objects[key.second]));
-        page.objects = std::move(sorted);
-    }
-    page.total = static_cast<int64_t>(page.objects.size());
-    const std::size_t first = std::min<std::size_t>(start, page.objects.size());
-    const std::size_t last =
-        count == 0 ? page.objects.size() : std::min(page.objects.size(), first + count);
-    page.objects = std::vector<DidlObject>(std::make_move_iterator(page.objects.begin() + first),
-                                           std::make_move_iterator(page.objects.begin() + last));
-}
-
-// The share's folder `relative` ("" for the share itself): its subfolders (those that hold audio
-// files somewhere below), then its own tracks, in path order.
-Page FolderPage(Library& lib, const std::string& relative, const std::string& folderId,
-                SortOrder order, uint32_t start, uint32_t count) {
-    const std::string prefix = lib.share() + "/" + (relative.empty() ? "" : relative + "/");
-    std::string upper = prefix;
-    upper.back() = '0';  // the byte after "/": every path below the prefix sorts before it
-    std::map<std::string, std::set<std::string>> subfolders;  // name -> names of its children
-    Page page;
-    std::vector<DidlObject> items;
-    Statement stmt = lib.Prepare(std::string("SELECT ") + kTrackColumns +
-                                     " FROM track WHERE path > ?1 AND path < ?2 ORDER BY path",
-                                 {prefix, upper});
-    while (stmt && stmt.Step() == SQLITE_ROW) {
-        const std::string rest = std::string(stmt.ColumnText(1)).substr(prefix.size());
-        const std::size_t slash = rest.find('/');
-        if (slash == std::string::npos) {
-            items.push_back(lib.TrackObject(stmt, folderId));
-        } else if (slash > 0) {
-            const std::string below = rest.substr(slash + 1);
-            subfolders[rest.substr(0, slash)].insert(below.substr(0, below.find('/')));
-        }
-    }
-    for (const auto& [name, children] : subfolders) {
-        const std::string childPath = relative.empty() ? name : relative + "/" + name;
-        page.objects.push_back(MakeContainer(FolderId(childPath), folderId, name, kFolderClass,
-                                             static_cast<int64_t>(children.size())));
-    }
-    for (DidlObject& item : items)
-        page.objects.push_back(std::move(item));
-    SortAndSlice(page, order, start, count);
-    return page;
-}
-
-Page CategoryPage(Library& lib, const std::string& category, SortOrder order, uint32_t start,
-                  uint32_t count) {
-    if (category == kAllMusicId)
-        return TrackPage(lib, "", {}, "title COLLATE NOCASE, id", kAllMusicId, order, start, count);
-    if (category == kFoldersId)
-        return FolderPage(lib, "", kFoldersId, order, start, count);
-    if (category == kAlbumsId)
-        return AlbumPage(lib, "", {}, kAlbumsId, order, start, count);
-    if (category == kAlbumArtistsId)
-        return ArtistPage(lib, order, start, count);
-    if (category == kGenresId)
-        return GenrePage(lib, order, start, count);
-    if (category == kRandomId)
-        return RandomPage(lib, order, start, count);
-    return LatestAlbumPage(lib, order, start, count);
-}
-
-Page RootPage(Library& lib, SortOrder order, uint32_t start, uint32_t count) {
-    Page page;
-    for (const Category& category : kCategories) {
-        const int64_t children = CategoryPage(lib, category.id, SortOrder::Default, 0, 1).total;
-        page.objects.push_back(
-            MakeContainer(category.id, kRootId, category.title, kFolderClass, children));
-    }
-    SortAndSlice(page, order, start, count);
-    return page;
-}
-
-Page ChildrenOf(Library& lib, const ObjectRef& ref, const std::string& id, SortOrder order,
-                uint32_t start, uint32_t count) {
-    switch (ref.kind) {
-        case ObjectKind::Root:
-            return RootPage(lib, order, start, count);
-        case ObjectKind::Category:
-            return CategoryPage(lib, ref.category, order, start, count);
-        case ObjectKind::Folder:
-            return FolderPage(lib, ref.folder, id, order, start, count);
-        case ObjectKind::Album:
-            return TrackPage(lib, std::string("album = ?1 AND ") + kAlbumArtistSql + " = ?2",
-                             {ref.name, ref.albumArtist},
-                             "disc_no, track_no, title COLLATE NOCASE, id", id, order, start,
-                             count);
-        case ObjectKind::Artist:
-            return AlbumPage(lib, std::string(" AND ") + kAlbumArtistSql + " = ?1",
-                             {ref.albumArtist}, id, order, start, count);
-        case ObjectKind::Genre:
-            return TrackPage(lib, "genre = ?1", {ref.name}, "title COLLATE NOCASE, id", id, order,
-                             start, count);
-        case ObjectKind::Track:
-        case ObjectKind::Invalid:
-            break;
-    }
-    return Page{};
-}
-
-// --- BrowseMetadata -----------------------------------------------------------------------------
-
-bool MetadataOf(Library& lib, const ObjectRef& ref, const std::string& id, DidlObject* object) {
-    if (ref.kind == ObjectKind::Track) {
-        std::vector<DidlObject> tracks =
-            lib.Tracks(std::string("SELECT ") + kTrackColumns + " FROM track WHERE id = ?1",
-                       {std::to_string(ref.trackId)}, kAllMusicId);
-        if (tracks.empty())
-            return false;
-        *object = std::move(tracks.front());
-        return true;
-    }
-    const int64_t children = ChildrenOf(lib, ref, id, SortOrder::Default, 0, 1).total;
-    switch (ref.kind) {
-        case ObjectKind::Root:
-            *object = MakeContainer(kRootId, "-1", "Music", kFolderClass, children);
-            return true;
-        case ObjectKind::Category:
-            for (const Category& category : kCategories) {
-                if (ref.category == category.id)
-                    *object =
-                        MakeContainer(category.id, kRootId, category.title, kFolderClass, children);
-            }
-            return true;
-        case ObjectKind::Folder: {
-            const std::size_t slash = ref.folder.rfind('/');
-            const std::string parent =
-                slash == std::string::npos ? kFoldersId : FolderId(ref.folder.substr(0, slash));
-            const std::string name =
-                slash == std::string::npos ? ref.folder : ref.folder.substr(slash + 1);
-            *object = MakeContainer(id, parent, name, kFolderClass, children);
-            return children > 0;
-        }
-        case ObjectKind::Album:
-            *object =
-                MakeContainer(id, kAlbumsId, ref.name, kAlbumClass, children, ref.albumArtist);
-            return children > 0;
-        case ObjectKind::Artist:
-            *object = MakeContainer(id, kAlbumArtistsId, ref.albumArtist, kArtistClass, children);
-            return children > 0;
-        case ObjectKind::Genre:
-            *object = MakeContainer(id, kGenresId, ref.name, kGenreClass, children);
-            return children > 0;
-        case ObjectKind::Track:
-        case ObjectKind::Invalid:
-            break;
-    }
-    return false;
+void AppendChild(std::string& out, const LibraryView& view, uint32_t container,
+                 const ViewChild& child, const DidlPieces& pieces) {
+    if (child.track)
+        AppendTrackIn(out, view, container, view.tracks()[child.index], pieces);
+    else
+        AppendExpanded(out, view.containers()[child.index].element, pieces);
 }
 
 BrowseResult Error(int code, const char* text) {
@@ -466,69 +155,251 @@ BrowseResult Error(int code, const char* text) {
     return result;
 }
 
-uint32_t ClampCount(int64_t value) {
-    return value < 0 ? 0 : value > 0xffffffffLL ? 0xffffffffU : static_cast<uint32_t>(value);
+uint32_t ClampCount(std::size_t value) {
+    return value > 0xffffffffULL ? 0xffffffffU : static_cast<uint32_t>(value);
 }
 
+// The track an item id names, with the container it is listed in; nullptr when the id names no
+// item of this view.
+const ViewTrack* FindItem(const LibraryView& view, const std::string& id, uint32_t* container) {
+    const ObjectRef ref = ParseObjectId(id);
+    if (ref.kind == ObjectKind::Track) {
+        *container = view.allMusic();
+    } else if (ref.kind == ObjectKind::TrackIn) {
+        *container = view.ContainerIndex(ref.container);
+    } else {
+        return nullptr;
+    }
+    const ViewTrack* track = view.FindTrack(ref.trackId);
+    return track != nullptr && view.Lists(*container, *track) ? track : nullptr;
+}
+
+BrowseResult Metadata(const LibraryView& view, const std::string& id, const DidlPieces& pieces) {
+    BrowseResult result;
+    result.didl = kDidlBegin;
+    if (const ViewContainer* container = view.FindContainer(id)) {
+        AppendExpanded(result.didl, container->element, pieces);
+    } else {
+        uint32_t listing = kNoIndex;
+        const ViewTrack* track = FindItem(view, id, &listing);
+        if (track == nullptr)
+            return Error(kErrorNoSuchObject, "No such object");
+        AppendTrackIn(result.didl, view, listing, *track, pieces);
+    }
+    result.didl += kDidlEnd;
+    result.numberReturned = 1;
+    result.totalMatches = 1;
+    return result;
+}
+
+// `sorted`: the container's children in the requested order, nullptr for the default order.
+BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
+                      const std::vector<ViewChild>* sorted, const DidlPieces& pieces) {
+    const uint32_t index = view.ContainerIndex(args.objectId);
+    if (index == kNoIndex) {
+        uint32_t listing = kNoIndex;
+        return FindItem(view, args.objectId, &listing) != nullptr
+                   ? Error(kErrorNoSuchContainer, "No such container")
+                   : Error(kErrorNoSuchObject, "No such object");
+    }
+    const ViewContainer& container = view.containers()[index];
+    const std::size_t total = container.children.size();
+    const std::size_t first = std::min<std::size_t>(args.startingIndex, total);
+    const std::size_t last = args.requestedCount == 0
+                                 ? total
+                                 : std::min<std::size_t>(total, first + args.requestedCount);
+    BrowseResult result;
+    result.didl.reserve(kDidlBegin.size() + (last - first) * 640);
+    result.didl = kDidlBegin;
+    const std::vector<ViewChild>& children = sorted != nullptr ? *sorted : container.children;
+    std::size_t end = first;
+    while (end < last && (end == first || result.didl.size() < kMaxResultBytes))
+        AppendChild(result.didl, view, index, children[end++], pieces);
+    result.didl += kDidlEnd;
+    result.numberReturned = ClampCount(end - first);
+    result.totalMatches = ClampCount(total);
+    return result;
+}
+
+// One text per distinct criteria: "+dc:title, -upnp:album" and "dc:title,-upnp:album" agree.
+std::string SortKeyText(const std::vector<SortField>& sort) {
+    std::string key;
+    for (const SortField& field : sort) {
+        key += static_cast<char>('a' + static_cast<int>(field.key));
+        key += field.descending ? '-' : '+';
+    }
+    return key;
+}
+
+constexpr std::size_t kSortedListingsKept = 4;
+
 }  // namespace
+
+struct ContentDirectory::SortedListings {
+    struct Entry {
+        uint64_t viewSerial = 0;
+        uint32_t container = 0;
+        std::string key;
+        std::shared_ptr<const std::vector<ViewChild>> children;
+    };
+    std::mutex mutex;
+    std::deque<Entry> entries;  // the most recent first
+
+    std::shared_ptr<const std::vector<ViewChild>> Get(const LibraryView& view, uint32_t container,
+                                                      const std::vector<SortField>& sort) {
+        const std::string key = SortKeyText(sort);
+        {
+            std::lock_guard<std::mutex> lock(mutex);
+            for (const Entry& entry : entries) {
+                if (entry.viewSerial == view.serial() && entry.container == container &&
+                    entry.key == key)
+                    return entry.children;
+            }
+        }
+        auto children = std::make_shared<const std::vector<ViewChild>>(
+            SortedChildren(view, view.containers()[container], sort));
+        std::lock_guard<std::mutex> lock(mutex);
+        entries.push_front({view.serial(), container, key, children});
+        if (entries.size() > kSortedListingsKept)
+            entries.pop_back();
+        return children;
+    }
+};
+
+bool ContentDirectory::FileStamp::operator==(const FileStamp& other) const {
+    return device == other.device && inode == other.inode && size == other.size &&
+           modified.tv_sec == other.modified.tv_sec && modified.tv_nsec == other.modified.tv_nsec &&
+           changeCounter == other.changeCounter;
+}
 
 ContentDirectory::ContentDirectory(std::string dbPath, std::string sharePath,
                                    std::string mediaBaseUrl)
     : dbPath_(std::move(dbPath)),
       sharePath_(std::move(sharePath)),
-      mediaBaseUrl_(std::move(mediaBaseUrl)) {}
+      mediaBaseUrl_(std::move(mediaBaseUrl)),
+      sortedListings_(std::make_unique<SortedListings>()) {}
+
+ContentDirectory::~ContentDirectory() = default;
+
+// The file's identity and times, and SQLite's file change counter (a 4-byte big-endian number
+// at offset 24 of the header, moved by every committed write), which tells two writes apart
+// even within one tick of the file system's clock.
+ContentDirectory::FileStamp ContentDirectory::StampOfDatabase() const {
+    FileStamp stamp;
+    const int fd = open(dbPath_.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY);
+    if (fd < 0)
+        return stamp;
+    struct stat st {};
+    unsigned char counter[4] = {};
+    if (fstat(fd, &st) == 0) {
+        stamp = FileStamp{st.st_dev, st.st_ino, st.st_size, st.st_mtim, 0};
+        if (pread(fd, counter, sizeof counter, 24) == static_cast<ssize_t>(sizeof counter))
+            stamp.changeCounter = (uint32_t(counter[0]) << 24) | (uint32_t(counter[1]) << 16) |
+                                  (uint32_t(counter[2]) << 8) | counter[3];
+    }
+    close(fd);
+    return stamp;
+}
+
+std::shared_ptr<const LibraryView> ContentDirectory::CurrentView() const {
+    const FileStamp now = StampOfDatabase();
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (loaded_ && now == stamp_)
+            return view_;
+    }
+    std::unique_lock<std::mutex> loading(loadMutex_, std::try_to_lock);
+    if (!loading.owns_lock()) {
+        // Another thread is loading the new state: answer from the last one meanwhile, so that
+        // no request waits for a load it did not start.
+        {
+            std::lock_guard<std::mutex> lock(mutex_);
+            if (view_)
+                return view_;
+        }
+        loading.lock();
+    }
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (loaded_ && now == stamp_)
+            return view_;
+    }
+    std::shared_ptr<const LibraryView> fresh = LibraryView::Load(dbPath_, sharePath_);
+    std::lock_guard<std::mutex> lock(mutex_);
+    if (!fresh)
+        return nullptr;  // tried again on the next call
+    if (loaded_ && view_ && fresh->updateId() != view_->updateId())
+        containerUpdateIds_ = fresh->ChangedContainers(view_.get(), kMaxContainerUpdates);
+    view_ = std::move(fresh);
+    stamp_ = now;
+    loaded_ = true;
+    return view_;
+}
 
 uint32_t ContentDirectory::SystemUpdateId() const {
-    struct stat st {};
-    if (stat(dbPath_.c_str(), &st) != 0)
-        return 0;
-    return static_cast<uint32_t>(st.st_mtime) & 0x7fffffffU;
+    const std::shared_ptr<const LibraryView> view = CurrentView();
+    return view ? view->updateId() : 0;
+}
+
+std::string ContentDirectory::ContainerUpdateIds() const {
+    CurrentView();
+    std::lock_guard<std::mutex> lock(mutex_);
+    return containerUpdateIds_;
 }
 
 BrowseResult ContentDirectory::Browse(const BrowseArgs& args) const {
-    SortOrder order = SortOrder::Default;
-    if (!ParseSortCriteria(args.sortCriteria, &order))
+    std::vector<SortField> sort;
+    if (!ParseSortCriteria(args.sortCriteria, &sort))
         return Error(kErrorUnsupportedSort, "Unsupported or invalid sort criteria");
-    const ObjectRef ref = ParseObjectId(args.objectId);
-    if (ref.kind == ObjectKind::Invalid)
-        return Error(kErrorNoSuchObject, "No such object");
-    Library lib(dbPath_, sharePath_, mediaBaseUrl_);
-    if (!lib.ok())
+    const std::shared_ptr<const LibraryView> view = CurrentView();
+    if (!view)
         return Error(kErrorActionFailed, "The library database cannot be read");
-
-    BrowseResult result;
-    result.updateId = SystemUpdateId();
-    if (args.metadata) {
-        DidlObject object;
-        if (!MetadataOf(lib, ref, args.objectId, &object))
-            return Error(kErrorNoSuchObject, "No such object");
-        result.didl = WriteDidl({object});
-        result.numberReturned = 1;
-        result.totalMatches = 1;
-        return result;
-    }
-    if (ref.kind == ObjectKind::Track) {
-        DidlObject track;
-        return MetadataOf(lib, ref, args.objectId, &track)
-                   ? Error(kErrorNoSuchContainer, "No such container")
-                   : Error(kErrorNoSuchObject, "No such object");
-    }
-    Page page = ChildrenOf(lib, ref, args.objectId, order, args.startingIndex, args.requestedCount);
-    const bool mayBeEmpty = ref.kind == ObjectKind::Root || ref.kind == ObjectKind::Category;
-    if (page.total == 0 && !mayBeEmpty)
-        return Error(kErrorNoSuchObject, "No such object");
-    result.didl = WriteDidl(page.objects);
-    result.numberReturned = ClampCount(static_cast<int64_t>(page.objects.size()));
-    result.totalMatches = ClampCount(page.total);
+    const DidlPieces pieces{args.mediaBaseUrl.empty() ? mediaBaseUrl_ : args.mediaBaseUrl,
+                            &view->protocolInfos()};
+    std::shared_ptr<const std::vector<ViewChild>> sorted;
+    const uint32_t container = view->ContainerIndex(args.objectId);
+    if (!args.metadata && !sort.empty() && container != kNoIndex)
+        sorted = sortedListings_->Get(*view, container, sort);
+    BrowseResult result = args.metadata ? Metadata(*view, args.objectId, pieces)
+                                        : Children(*view, args, sorted.get(), pieces);
+    if (result.error == 0)
+        result.updateId = view->updateId();
     return result;
 }
 
-bool ContentDirectory::LookUpTrackFile(int64_t id, std::string* path) const {
-    Library lib(dbPath_, sharePath_, mediaBaseUrl_);
-    Statement stmt = lib.Prepare("SELECT path FROM track WHERE id = ?1", {std::to_string(id)});
-    if (!stmt || stmt.Step() != SQLITE_ROW)
+// The track's row, read from library.db itself: the file-serving side needs the path as the
+// index has it now, and the tree does not keep paths (memory).
+bool ContentDirectory::LookUpTrack(int64_t id, TrackFile* file) const {
+    sqlite::Database db = sqlite::Database::OpenReadOnly(dbPath_.c_str(), kLookUpBusyTimeoutMs);
+    sqlite::Statement row =
+        db ? db.Prepare("SELECT path, size FROM track WHERE id = ?1") : sqlite::Statement();
+    if (!row || row.Bind(1, id) != SQLITE_OK || row.Step() != SQLITE_ROW)
         return false;
-    *path = std::string(stmt.ColumnText(0));
+    file->path = std::string(row.ColumnText(0));
+    file->size = row.ColumnType(1) == SQLITE_INTEGER ? row.ColumnInt64(1) : -1;
+    if (file->path.empty())
+        return false;
+    file->mimeType = medialib::MimeTypeOfPath(file->path);
+    file->contentFeatures = medialib::DlnaContentFeatures(file->path);
+    return true;
+}
+
+bool ContentDirectory::LookUpTrackFile(int64_t id, std::string* path) const {
+    TrackFile file;
+    if (!LookUpTrack(id, &file))
+        return false;
+    *path = file.path;
+    return true;
+}
+
+bool ContentDirectory::LookUpArtFile(int64_t id, std::string* path) const {
+    sqlite::Database db = sqlite::Database::OpenReadOnly(dbPath_.c_str(), kLookUpBusyTimeoutMs);
+    // An index of an older indexer has no art_path column: then no track has art.
+    sqlite::Statement row =
+        db ? db.Prepare("SELECT art_path FROM track WHERE id = ?1") : sqlite::Statement();
+    if (!row || row.Bind(1, id) != SQLITE_OK || row.Step() != SQLITE_ROW)
+        return false;
+    *path = std::string(row.ColumnText(0));
     return !path->empty();
 }
 

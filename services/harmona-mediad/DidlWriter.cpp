@@ -1,66 +1,250 @@
 #include "DidlWriter.h"
 
-#include <pugixml.hpp>
-
 #include <cstdio>
-#include <sstream>
+#include <cstring>
 
 #include "Utf8.h"
 
 namespace harmona::mediad {
 namespace {
 
-std::string XmlSafe(const std::string& text) {
-    std::string safe = cgi::IsValidUtf8(text) ? text : cgi::RepairUtf8(text);
-    for (char& c : safe) {
-        const unsigned char byte = static_cast<unsigned char>(c);
-        if (byte < 0x20 && c != '\t' && c != '\n' && c != '\r')
-            c = ' ';
+constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
+constexpr std::string_view kTrackClassElement =
+    "<upnp:class>object.item.audioItem.musicTrack</upnp:class>";
+
+// The code point of the well-formed sequence of `length` bytes at text[i].
+char32_t DecodeUtf8(std::string_view text, std::size_t i, std::size_t length) {
+    const auto byte = [&](std::size_t k) { return static_cast<unsigned char>(text[i + k]); };
+    switch (length) {
+        case 2:
+            return (char32_t(byte(0) & 0x1F) << 6) | (byte(1) & 0x3F);
+        case 3:
+            return (char32_t(byte(0) & 0x0F) << 12) | (char32_t(byte(1) & 0x3F) << 6) |
+                   (byte(2) & 0x3F);
+        default:
+            return (char32_t(byte(0) & 0x07) << 18) | (char32_t(byte(1) & 0x3F) << 12) |
+                   (char32_t(byte(2) & 0x3F) << 6) | (byte(3) & 0x3F);
     }
-    return safe;
 }
 
-void AddText(pugi::xml_node parent, const char* name, const std::string& text) {
-    if (!text.empty())
-        parent.append_child(name).text().set(XmlSafe(text).c_str());
+bool IsNonCharacter(char32_t code) {
+    return (code >= 0xFDD0 && code <= 0xFDEF) || (code & 0xFFFE) == 0xFFFE;
 }
 
-void AddObject(pugi::xml_node didl, const DidlObject& object) {
-    pugi::xml_node node = didl.append_child(object.container ? "container" : "item");
-    node.append_attribute("id").set_value(XmlSafe(object.id).c_str());
-    node.append_attribute("parentID").set_value(XmlSafe(object.parentId).c_str());
-    node.append_attribute("restricted").set_value("1");
-    if (object.container && object.childCount >= 0)
-        node.append_attribute("childCount").set_value(static_cast<long long>(object.childCount));
-    node.append_child("dc:title").text().set(XmlSafe(object.title).c_str());
-    node.append_child("upnp:class").text().set(object.upnpClass.c_str());
-    AddText(node, "upnp:artist", object.artist);
-    AddText(node, "upnp:album", object.album);
-    AddText(node, "upnp:genre", object.genre);
-    if (object.container)
+void AppendAscii(std::string& out, char c) {
+    switch (c) {
+        case '&':
+            out += "&amp;";
+            break;
+        case '<':
+            out += "&lt;";
+            break;
+        case '>':
+            out += "&gt;";
+            break;
+        case '"':
+            out += "&quot;";
+            break;
+        case '\t':
+            out += "&#9;";
+            break;
+        case '\n':
+            out += "&#10;";
+            break;
+        case '\r':
+            out += "&#13;";
+            break;
+        default:
+            out += static_cast<unsigned char>(c) < 0x20 ? ' ' : c;
+    }
+}
+
+void AppendElement(std::string& out, const char* name, std::string_view text) {
+    if (text.empty())
         return;
-    if (object.trackNo > 0)
-        node.append_child("upnp:originalTrackNumber")
-            .text()
-            .set(static_cast<long long>(object.trackNo));
-    if (object.resUrl.empty())
+    out += '<';
+    out += name;
+    out += '>';
+    AppendXmlText(out, text);
+    out += "</";
+    out += name;
+    out += '>';
+}
+
+void AppendNumberElement(std::string& out, const char* name, int64_t value) {
+    if (value > 0)
+        AppendElement(out, name, std::to_string(value));
+}
+
+void AppendMediaUrl(std::string& out, std::string_view path) {
+    out += kMediaBaseMark;
+    AppendXmlText(out, path);
+}
+
+// The elements an item and a container share, after dc:title and upnp:class.
+void AppendPeopleAndDate(std::string& out, const DidlObject& object) {
+    AppendElement(out, "dc:creator", object.artist);
+    AppendElement(out, "upnp:artist", object.artist);
+    AppendElement(out, "upnp:album", object.album);
+    AppendElement(out, "upnp:genre", object.genre);
+    AppendElement(out, "dc:date", object.date);
+    if (!object.artPath.empty()) {
+        out += "<upnp:albumArtURI>";
+        AppendMediaUrl(out, object.artPath);
+        out += "</upnp:albumArtURI>";
+    }
+}
+
+void AppendRes(std::string& out, const DidlObject& object) {
+    if (object.resPath.empty())
         return;
-    pugi::xml_node res = node.append_child("res");
-    res.append_attribute("protocolInfo")
-        .set_value(("http-get:*:" + object.mimeType + ":*").c_str());
+    out += "<res protocolInfo=\"";
+    if (object.protocolInfoIndex >= 0 &&
+        static_cast<std::size_t>(object.protocolInfoIndex) < kMaxSharedProtocolInfos) {
+        out += kProtocolInfoMark;
+        out += static_cast<char>(object.protocolInfoIndex + 1);
+    } else {
+        out += ProtocolInfo(object.mimeType, object.dlnaFeatures);
+    }
+    out += '"';
+    if (object.size >= 0)
+        out += " size=\"" + std::to_string(object.size) + '"';
     if (object.durationMs > 0)
-        res.append_attribute("duration").set_value(FormatDuration(object.durationMs).c_str());
-    res.text().set(object.resUrl.c_str());
+        out += " duration=\"" + FormatDuration(object.durationMs) + '"';
+    out += '>';
+    AppendMediaUrl(out, object.resPath);
+    out += "</res>";
 }
-
-struct StringWriter : pugi::xml_writer {
-    std::string out;
-    void write(const void* data, size_t size) override {
-        out.append(static_cast<const char*>(data), size);
-    }
-};
 
 }  // namespace
+
+std::string ProtocolInfo(const std::string& mimeType, const std::string& dlnaFeatures) {
+    std::string out = "http-get:*:";
+    AppendXmlText(out, mimeType);
+    out += ':';
+    AppendXmlText(out, dlnaFeatures.empty() ? "*" : dlnaFeatures);
+    return out;
+}
+
+void AppendXmlText(std::string& out, std::string_view text) {
+    for (std::size_t i = 0; i < text.size();) {
+        const char c = text[i];
+        if (static_cast<unsigned char>(c) < 0x80) {
+            AppendAscii(out, c);
+            ++i;
+            continue;
+        }
+        const std::size_t length = cgi::Utf8SequenceLength(text, i);
+        if (length == 0) {
+            out += kReplacement;
+            ++i;
+            continue;
+        }
+        if (!IsNonCharacter(DecodeUtf8(text, i, length)))
+            out.append(text.data() + i, length);
+        i += length;
+    }
+}
+
+std::string XmlText(std::string_view text) {
+    std::string out;
+    out.reserve(text.size());
+    AppendXmlText(out, text);
+    return out;
+}
+
+std::string DidlItemBody(const DidlObject& object) {
+    std::string out;
+    out.reserve(256 + object.title.size() + object.artist.size() + object.album.size());
+    out += "<dc:title>";
+    AppendXmlText(out, object.title);
+    out += "</dc:title>";
+    if (object.upnpClass == kMusicTrackClass) {
+        out += kTrackClassMark;
+    } else {
+        out += "<upnp:class>";
+        AppendXmlText(out, object.upnpClass);
+        out += "</upnp:class>";
+    }
+    AppendPeopleAndDate(out, object);
+    AppendNumberElement(out, "upnp:originalTrackNumber", object.trackNo);
+    AppendRes(out, object);
+    return out;
+}
+
+std::string DidlElement(const DidlObject& object) {
+    std::string out;
+    if (!object.container) {
+        // Only the media base stays marked: the item stands alone.
+        DidlObject alone = object;
+        alone.protocolInfoIndex = -1;
+        const DidlPieces keepBase{std::string_view(&kMediaBaseMark, 1), nullptr};
+        AppendItem(out, XmlText(object.id), XmlText(object.parentId), XmlText(object.refId),
+                   DidlItemBody(alone), keepBase);
+        return out;
+    }
+    out += "<container id=\"";
+    AppendXmlText(out, object.id);
+    out += "\" parentID=\"";
+    AppendXmlText(out, object.parentId);
+    out += "\" restricted=\"1\"";
+    if (object.childCount >= 0)
+        out += " childCount=\"" + std::to_string(object.childCount) + '"';
+    out += " searchable=\"0\"><dc:title>";
+    AppendXmlText(out, object.title);
+    out += "</dc:title><upnp:class>";
+    AppendXmlText(out, object.upnpClass);
+    out += "</upnp:class>";
+    AppendPeopleAndDate(out, object);
+    out += "</container>";
+    return out;
+}
+
+void AppendExpanded(std::string& out, std::string_view piece, const DidlPieces& pieces) {
+    std::size_t copied = 0;
+    for (std::size_t i = 0; i < piece.size(); ++i) {
+        const char c = piece[i];
+        if (c != kMediaBaseMark && c != kTrackClassMark && c != kProtocolInfoMark)
+            continue;
+        out.append(piece.data() + copied, i - copied);
+        if (c == kMediaBaseMark) {
+            out.append(pieces.mediaBase);
+        } else if (c == kTrackClassMark) {
+            out.append(kTrackClassElement);
+        } else if (i + 1 < piece.size()) {
+            const std::size_t index = static_cast<unsigned char>(piece[++i]) - 1u;
+            if (pieces.protocolInfos != nullptr && index < pieces.protocolInfos->size())
+                out.append((*pieces.protocolInfos)[index]);
+        }
+        copied = i + 1;
+    }
+    out.append(piece.data() + copied, piece.size() - copied);
+}
+
+void AppendItem(std::string& out, std::string_view id, std::string_view parentId,
+                std::string_view refId, std::string_view body, const DidlPieces& pieces) {
+    out += "<item id=\"";
+    out += id;
+    out += "\" parentID=\"";
+    out += parentId;
+    out += '"';
+    if (!refId.empty()) {
+        out += " refID=\"";
+        out += refId;
+        out += '"';
+    }
+    out += " restricted=\"1\">";
+    AppendExpanded(out, body, pieces);
+    out += "</item>";
+}
+
+std::string WriteDidl(const std::vector<DidlObject>& objects, std::string_view mediaBase) {
+    std::string out(kDidlBegin);
+    for (const DidlObject& object : objects)
+        AppendExpanded(out, DidlElement(object), DidlPieces{mediaBase, nullptr});
+    out += kDidlEnd;
+    return out;
+}
 
 std::string FormatDuration(int64_t milliseconds) {
     char text[48];
@@ -70,20 +254,6 @@ std::string FormatDuration(int64_t milliseconds) {
                   static_cast<long long>(seconds % 60),
                   static_cast<long long>(milliseconds % 1000));
     return text;
-}
-
-std::string WriteDidl(const std::vector<DidlObject>& objects) {
-    pugi::xml_document document;
-    pugi::xml_node didl = document.append_child("DIDL-Lite");
-    didl.append_attribute("xmlns").set_value("urn:schemas-upnp-org:metadata-1-0/DIDL-Lite/");
-    didl.append_attribute("xmlns:dc").set_value("http://purl.org/dc/elements/1.1/");
-    didl.append_attribute("xmlns:upnp").set_value("urn:schemas-upnp-org:metadata-1-0/upnp/");
-    for (const DidlObject& object : objects)
-        AddObject(didl, object);
-    StringWriter writer;
-    writer.out.reserve(256 + objects.size() * 400);
-    document.save(writer, "", pugi::format_raw | pugi::format_no_declaration);
-    return writer.out;
 }
 
 }  // namespace harmona::mediad

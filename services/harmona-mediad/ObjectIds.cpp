@@ -112,11 +112,76 @@ std::string GenreId(const std::string& genre) {
     return "genre:" + EscapeIdPart(genre);
 }
 
+std::string LatestAlbumId(const std::string& albumArtist, const std::string& album) {
+    return "latest:" + EscapeIdPart(albumArtist) + "/" + EscapeIdPart(album);
+}
+
+std::string ArtistAlbumId(const std::string& albumArtist, const std::string& album) {
+    return ArtistId(albumArtist) + "/" + EscapeIdPart(album);
+}
+
 std::string TrackId(int64_t id) {
     return "track:" + std::to_string(id);
 }
 
+std::string TrackIdIn(const std::string& containerId, int64_t trackId) {
+    if (containerId == kAllMusicId)
+        return TrackId(trackId);
+    return containerId + "/" + TrackId(trackId);
+}
+
+namespace {
+
+bool ParseTrackNumber(const std::string& digits, int64_t* id) {
+    if (digits.empty() || digits.size() > 18 ||
+        digits.find_first_not_of("0123456789") != std::string::npos)
+        return false;
+    *id = std::strtoll(digits.c_str(), nullptr, 10);
+    return true;
+}
+
+// "AA/NAME" of an album id: both parts unescaped, the name not empty.
+bool ParseAlbumParts(const std::string& rest, ObjectRef* ref) {
+    const std::size_t slash = rest.find('/');
+    return slash != std::string::npos && UnescapeIdPart(rest.substr(0, slash), &ref->albumArtist) &&
+           UnescapeIdPart(rest.substr(slash + 1), &ref->name) && !ref->name.empty();
+}
+
+ObjectRef ParseContainerOrTrackId(const std::string& id);
+
+// "<container id>/track:N", the container being one that lists tracks.
+bool ParseTrackIn(const std::string& id, ObjectRef* ref) {
+    const std::size_t at = id.rfind("/track:");
+    if (at == std::string::npos || !ParseTrackNumber(id.substr(at + 7), &ref->trackId))
+        return false;
+    ref->container = id.substr(0, at);
+    const ObjectRef listing = ParseContainerOrTrackId(ref->container);
+    switch (listing.kind) {
+        case ObjectKind::Category:
+            return ref->container != kAllMusicId;
+        case ObjectKind::Folder:
+        case ObjectKind::Album:
+        case ObjectKind::Genre:
+            return true;
+        default:
+            return false;
+    }
+}
+
+}  // namespace
+
 ObjectRef ParseObjectId(const std::string& id) {
+    ObjectRef ref;
+    if (ParseTrackIn(id, &ref)) {
+        ref.kind = ObjectKind::TrackIn;
+        return ref;
+    }
+    return ParseContainerOrTrackId(id);
+}
+
+namespace {
+
+ObjectRef ParseContainerOrTrackId(const std::string& id) {
     ObjectRef ref;
     std::string rest;
     if (id == kRootId) {
@@ -134,25 +199,31 @@ ObjectRef ParseObjectId(const std::string& id) {
         if (ParseFolder(rest, &ref.folder))
             ref.kind = ObjectKind::Folder;
     } else if (StartsWith(id, "album:", &rest)) {
-        const std::size_t slash = rest.find('/');
-        if (slash != std::string::npos && UnescapeIdPart(rest.substr(0, slash), &ref.albumArtist) &&
-            UnescapeIdPart(rest.substr(slash + 1), &ref.name) && !ref.name.empty())
+        if (ParseAlbumParts(rest, &ref))
             ref.kind = ObjectKind::Album;
+    } else if (StartsWith(id, "latest:", &rest)) {
+        if (ParseAlbumParts(rest, &ref)) {
+            ref.kind = ObjectKind::Album;
+            ref.albumView = AlbumView::Latest;
+        }
     } else if (StartsWith(id, "artist:", &rest)) {
-        if (UnescapeIdPart(rest, &ref.albumArtist) && !ref.albumArtist.empty())
+        if (rest.find('/') != std::string::npos) {
+            if (ParseAlbumParts(rest, &ref) && !ref.albumArtist.empty()) {
+                ref.kind = ObjectKind::Album;
+                ref.albumView = AlbumView::Artist;
+            }
+        } else if (UnescapeIdPart(rest, &ref.albumArtist) && !ref.albumArtist.empty())
             ref.kind = ObjectKind::Artist;
     } else if (StartsWith(id, "genre:", &rest)) {
         if (UnescapeIdPart(rest, &ref.name) && !ref.name.empty())
             ref.kind = ObjectKind::Genre;
     } else if (StartsWith(id, "track:", &rest)) {
-        const bool digits = !rest.empty() && rest.size() <= 18 &&
-                            rest.find_first_not_of("0123456789") == std::string::npos;
-        if (digits) {
-            ref.trackId = std::strtoll(rest.c_str(), nullptr, 10);
+        if (ParseTrackNumber(rest, &ref.trackId))
             ref.kind = ObjectKind::Track;
-        }
     }
     return ref;
 }
+
+}  // namespace
 
 }  // namespace harmona::mediad

@@ -13,6 +13,7 @@
 #include <cstring>
 #include <string>
 
+#include "LiveLibrary.h"
 #include "MediaFiles.h"
 #include "MediaServer.h"
 #include "PlatformPaths.h"
@@ -99,10 +100,23 @@ int main(int argc, char** argv) {
         syslog(LOG_ERR, "cannot write %s", PidFilePath().c_str());
     syslog(LOG_INFO, "serving %s on %s", options.sharePath.c_str(),
            server.contentDirectory()->mediaBaseUrl().c_str());
+    // Files added, changed or removed in the share reach library.db, and so every Browse, within
+    // seconds.
+    harmona::mediad::LiveLibraryOptions live;
+    live.sharePath = options.sharePath;
+    live.dbPath = options.dbPath;
+    // The changed library is loaded on the live library's thread, not by the next Browse.
+    live.onIndexed = [&server](const harmona::index::IndexReport&) {
+        server.contentDirectory()->SystemUpdateId();
+    };
+    harmona::mediad::LiveLibrary liveLibrary(live);
+    if (!liveLibrary.Start(&error))
+        syslog(LOG_ERR, "the library will not follow the share: %s", error.c_str());
 
     int received = 0;
     while (sigwait(&stopSignals, &received) != 0) {
     }
+    liveLibrary.Stop();
     RemovePidFile();
     server.Stop();
     syslog(LOG_INFO, "stopped by signal %d", received);

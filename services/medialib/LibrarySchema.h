@@ -3,6 +3,8 @@
 // the media server's queries use.
 #pragma once
 
+#include <cstdint>
+
 #include "sqlite/Database.h"
 
 namespace harmona::medialib {
@@ -13,5 +15,13 @@ inline constexpr int kLibrarySchemaVersion = 1;
 // rows already there, the playlist tables' included, are never touched. False on failure, or when
 // the file carries a user_version other than 0 or 1.
 bool EnsureLibrarySchema(sqlite::Database& db);
+
+// The library's update count: table library_update holds one row whose id grows by one with every
+// indexer transaction that changed the track table (in that transaction), so that readers (the
+// media server's SystemUpdateID) learn of a change without comparing rows and never see changed
+// rows under the count of before. -1 when the table is missing or empty.
+int64_t LibraryUpdateCount(sqlite::Database& db);
+// Adds one to the update count (the first becomes 1); run it inside the writer's transaction.
+bool BumpLibraryUpdateCount(sqlite::Database& db);
 
 }  // namespace harmona::medialib

@@ -22,6 +22,10 @@ constexpr MimeEntry kMimeTypes[] = {
     {"ape", "audio/x-ape"}, {"ra", "audio/x-pn-realaudio"}, {"ram", "audio/x-pn-realaudio"},
 };
 
+// DLNA.ORG_FLAGS: DLNA 1.5 (0x00100000), connection stalling (0x00200000), background
+// (0x00400000) and streaming (0x01000000) transfer modes; 24 reserved hex digits follow.
+constexpr const char* kDlnaAudioFlags = "01700000000000000000000000000000";
+
 }  // namespace
 
 std::string AudioSharePath() {
@@ -56,6 +60,17 @@ const char* MimeTypeOfPath(const std::string& path) {
             return entry.mime;
     }
     return "application/octet-stream";
+}
+
+const char* DlnaProfileOfPath(const std::string& path) {
+    return LowerExtension(path) == "mp3" ? "MP3" : nullptr;
+}
+
+std::string DlnaContentFeatures(const std::string& path) {
+    std::string features;
+    if (const char* profile = DlnaProfileOfPath(path))
+        features = std::string("DLNA.ORG_PN=") + profile + ";";
+    return features + "DLNA.ORG_OP=01;DLNA.ORG_CI=0;DLNA.ORG_FLAGS=" + kDlnaAudioFlags;
 }
 
 }  // namespace harmona::medialib

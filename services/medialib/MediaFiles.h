@@ -16,6 +16,18 @@ bool IsIndexableAudioFile(const std::string& path);
 // "application/octet-stream" for an unknown one.
 const char* MimeTypeOfPath(const std::string& path);
 
+// The DLNA media format profile (DLNA.ORG_PN) of a file, where its type fixes one: "MP3" for an
+// MP3 file (MPEG-1 layer 3, the profile of nearly every MP3 in a music library); nullptr when the
+// profile would depend on more than the file type (bit rate, container), so none is claimed.
+const char* DlnaProfileOfPath(const std::string& path);
+
+// The fourth field of the file's protocolInfo, which is also the value of the
+// contentFeatures.dlna.org header when the file is served: the profile where known, byte seeking
+// (DLNA.ORG_OP=01: the server answers Range requests), not transcoded (DLNA.ORG_CI=0), and the
+// flags of a streamed audio file (DLNA 1.5, streaming and background transfer, connection
+// stalling).
+std::string DlnaContentFeatures(const std::string& path);
+
 // The extension of the path's file name in lower case, without the dot; "" when none.
 std::string LowerExtension(const std::string& path);
 

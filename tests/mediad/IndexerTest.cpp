@@ -221,5 +221,76 @@ TEST(Indexer, AMissingShareFailsAndLeavesTheLibraryAsItWas) {
     EXPECT_EQ(TrackRows().size(), 5u);
 }
 
+TEST(Indexer, RecordsEachFilesSizeAndTheBestCoverImageOfItsFolder) {
+    MakeStandardShare();
+    WriteFile(SharePath("Rock/Alpha & Omega/folder.png"), "png");
+    WriteFile(SharePath("Rock/Alpha & Omega/COVER.jpg"), "jpeg");
+    WriteFile(SharePath("Rock/Alpha & Omega/booklet.jpg"), "not a cover name");
+    WriteFile(SharePath("Jazz/Blue/front.jpeg"), "jpeg");
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    const auto rows = TrackRows();
+    for (const auto& [path, row] : rows) {
+        struct stat st {};
+        ASSERT_EQ(stat(path.c_str(), &st), 0);
+        EXPECT_EQ(row.columns.at("size"), std::to_string(st.st_size)) << path;
+    }
+    EXPECT_EQ(rows.at(SharePath("Rock/Alpha & Omega/01 First.flac")).columns.at("art_path"),
+              SharePath("Rock/Alpha & Omega/COVER.jpg"));
+    EXPECT_EQ(rows.at(SharePath("Jazz/Blue/04 Fourth.wav")).columns.at("art_path"),
+              SharePath("Jazz/Blue/front.jpeg"));
+    // A cover belongs to its own folder only.
+    EXPECT_EQ(rows.at(SharePath("Jazz/Blue/Late/03 Third.mp3")).columns.at("art_path"), "<null>");
+    EXPECT_EQ(rows.at(SharePath("loose.ogg")).columns.at("art_path"), "<null>");
+}
+
+TEST(Indexer, TheUpdateCountMovesOnlyWithARunThatChangedTheLibrary) {
+    MakeStandardShare();
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    EXPECT_EQ(Scalar("SELECT MAX(id) FROM library_update"), 1);
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    EXPECT_EQ(Scalar("SELECT MAX(id) FROM library_update"), 1);
+    // A new cover image is a change without a tag read.
+    WriteFile(SharePath("Jazz/Blue/cover.jpg"), "jpeg");
+    const IndexRun cover = RunIndexer();
+    ASSERT_EQ(cover.exitStatus, 0);
+    EXPECT_EQ(cover.counts.at("tagreads"), 0);
+    EXPECT_EQ(Scalar("SELECT MAX(id) FROM library_update"), 2);
+    ASSERT_EQ(unlink(SharePath("loose.ogg").c_str()), 0);
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    EXPECT_EQ(Scalar("SELECT MAX(id) FROM library_update"), 3);
+    EXPECT_EQ(Scalar("SELECT COUNT(*) FROM library_update"), 1);
+}
+
+TEST(Indexer, AnIndexOfAnOlderIndexerGetsTheNewColumnsWithoutATagRead) {
+    MakeStandardShare();
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    const auto before = TrackRows();
+    // The same rows in the first release's schema: no size, no art_path, no update count.
+    sqlite3* db = nullptr;
+    ASSERT_EQ(sqlite3_open(kLibraryDb, &db), SQLITE_OK);
+    const char* downgrade =
+        "CREATE TABLE old_track (id INTEGER PRIMARY KEY, path TEXT NOT NULL UNIQUE, title TEXT, "
+        "artist TEXT, album TEXT, album_artist TEXT, genre TEXT, year INTEGER, track_no "
+        "INTEGER, disc_no INTEGER, duration_ms INTEGER, mtime INTEGER, added INTEGER); "
+        "INSERT INTO old_track SELECT id, path, title, artist, album, album_artist, genre, year, "
+        "track_no, disc_no, duration_ms, mtime, added FROM track; DROP TABLE track; "
+        "DROP TABLE library_update; ALTER TABLE old_track RENAME TO track;";
+    ASSERT_EQ(sqlite3_exec(db, downgrade, nullptr, nullptr, nullptr), SQLITE_OK)
+        << sqlite3_errmsg(db);
+    sqlite3_close(db);
+
+    const IndexRun run = RunIndexer();
+    ASSERT_EQ(run.exitStatus, 0) << run.output;
+    EXPECT_EQ(run.counts.at("tagreads"), 0);
+    const auto after = TrackRows();
+    ASSERT_EQ(after.size(), before.size());
+    for (const auto& [path, row] : before) {
+        EXPECT_EQ(after.at(path).columns.at("size"), row.columns.at("size")) << path;
+        EXPECT_EQ(after.at(path).columns.at("title"), row.columns.at("title")) << path;
+        EXPECT_EQ(after.at(path).id, row.id) << path;
+    }
+    EXPECT_GE(Scalar("SELECT MAX(id) FROM library_update"), 1);
+}
+
 }  // namespace
 }  // namespace harmona::test::mediad

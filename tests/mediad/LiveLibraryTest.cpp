@@ -1,0 +1,278 @@
+// The live library: files added, changed and removed in the share reach library.db, and so
+// ContentDirectory's Browse and SystemUpdateID, within seconds, through inotify and the
+// indexer's incremental pass; run over a share generated with sox and TagLib.
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <utime.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <condition_variable>
+#include <cstdio>
+#include <cstring>
+#include <functional>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "ContentDirectory.h"
+#include "DidlDocument.h"
+#include "Fixtures.h"
+#include "LiveLibrary.h"
+#include "MediadTestKit.h"
+#include "PlaylistFixtures.h"
+#include "Sandbox.h"
+
+namespace harmona::test::mediad {
+namespace {
+
+using harmona::mediad::BrowseArgs;
+using harmona::mediad::ContentDirectory;
+using harmona::mediad::LiveLibrary;
+using harmona::mediad::LiveLibraryOptions;
+using namespace std::chrono_literals;
+
+// Every wait of these tests ends after this long: a change must show well within it.
+constexpr auto kTimeLimit = 20s;
+
+bool WaitUntil(const std::function<bool()>& condition) {
+    const auto deadline = std::chrono::steady_clock::now() + kTimeLimit;
+    while (std::chrono::steady_clock::now() < deadline) {
+        if (condition())
+            return true;
+        std::this_thread::sleep_for(50ms);
+    }
+    return condition();
+}
+
+std::vector<std::string> AllTitles(const ContentDirectory& directory) {
+    BrowseArgs args;
+    args.objectId = "music_all";
+    const DidlDocument document = ParseDidl(directory.Browse(args).didl);
+    std::vector<std::string> titles;
+    for (const DidlObjectRecord& object : document.objects)
+        titles.push_back(object.title);
+    return titles;
+}
+
+bool HasTitle(const ContentDirectory& directory, const std::string& title) {
+    for (const std::string& each : AllTitles(directory)) {
+        if (each == title)
+            return true;
+    }
+    return false;
+}
+
+class LiveShare : public ::testing::Test {
+  protected:
+    void SetUp() override { MakeStandardShare(); }
+
+    void StartLive(std::size_t maxWatches = 100000,
+                   std::chrono::milliseconds unwatchedRescan = std::chrono::minutes(10),
+                   std::chrono::milliseconds quietPeriod = 200ms) {
+        LiveLibraryOptions options;
+        options.sharePath = kShare;
+        options.dbPath = kLibraryDb;
+        options.quietPeriod = quietPeriod;
+        options.maxDelay = std::max<std::chrono::milliseconds>(quietPeriod, 2s);
+        options.maxWatches = maxWatches;
+        options.unwatchedRescan = unwatchedRescan;
+        options.onIndexed = [this](const index::IndexReport& report) {
+            {
+                std::lock_guard<std::mutex> lock(mutex_);
+                reports_.push_back(report);
+            }
+            HoldWhileAsked();
+        };
+        live_ = std::make_unique<LiveLibrary>(options);
+        std::string error;
+        ASSERT_TRUE(live_->Start(&error)) << error;
+        ASSERT_TRUE(WaitUntil([&] { return live_->passes() >= 1; }));
+        ASSERT_TRUE(Reports().front().ok) << Reports().front().error;
+        EXPECT_EQ(Reports().front().added, 5u);
+    }
+
+    // While `hold_` is set, a finished pass keeps the live library's thread here (up to the time
+    // limit) until Release(): its inotify queue then fills up unread.
+    void HoldWhileAsked() {
+        std::unique_lock<std::mutex> lock(mutex_);
+        if (!hold_)
+            return;
+        held_ = true;
+        changed_.notify_all();
+        changed_.wait_for(lock, kTimeLimit, [this] { return !hold_; });
+    }
+    bool WaitUntilHeld() {
+        std::unique_lock<std::mutex> lock(mutex_);
+        return changed_.wait_for(lock, kTimeLimit, [this] { return held_; });
+    }
+    void Release() {
+        std::lock_guard<std::mutex> lock(mutex_);
+        hold_ = false;
+        changed_.notify_all();
+    }
+
+    std::vector<index::IndexReport> Reports() {
+        std::lock_guard<std::mutex> lock(mutex_);
+        return reports_;
+    }
+
+    void TearDown() override {
+        Release();
+        if (live_)
+            live_->Stop();
+    }
+
+    ContentDirectory directory_{kLibraryDb, kShare, "http://127.0.0.1:50003/media/"};
+    std::unique_ptr<LiveLibrary> live_;
+    std::mutex mutex_;
+    std::condition_variable changed_;
+    bool hold_ = false, held_ = false;
+    std::vector<index::IndexReport> reports_;
+};
+
+TEST_F(LiveShare, AFileAddedInANewFolderIsBrowsableWithinSeconds) {
+    StartLive();
+    const uint32_t before = directory_.SystemUpdateId();
+    EXPECT_EQ(AllTitles(directory_).size(), 5u);
+    MakeAudioFile(std::string(kShare) + "/New/Deeper/Still/added.ogg",
+                  {"Added Later", "Newcomer", "Fresh", "", "Pop"});
+    ASSERT_TRUE(WaitUntil([&] { return HasTitle(directory_, "Added Later"); }));
+    EXPECT_GT(directory_.SystemUpdateId(), before);
+    EXPECT_GE(live_->watchedFolders(), 3u);  // the new folders are watched too
+
+    // A file in the newly watched folder is found as well.
+    MakeAudioFile(std::string(kShare) + "/New/Deeper/Still/second.ogg",
+                  {"Second Newcomer", "Newcomer", "Fresh", "", "Pop"});
+    ASSERT_TRUE(WaitUntil([&] { return HasTitle(directory_, "Second Newcomer"); }));
+}
+
+TEST_F(LiveShare, AFolderMovedIntoTheShareIsIndexedWhole) {
+    StartLive();
+    // Made in a hidden folder of the share (neither indexed nor watched), then moved in at once.
+    const std::string staging = std::string(kShare) + "/.incoming/Album";
+    MakeAudioFile(staging + "/one.ogg", {"Moved One", "Mover", "Moved", "", "Pop"});
+    MakeAudioFile(staging + "/CD2/two.ogg", {"Moved Two", "Mover", "Moved", "", "Pop"});
+    ASSERT_EQ(rename(staging.c_str(), (std::string(kShare) + "/Moved Album").c_str()), 0)
+        << std::strerror(errno);
+    ASSERT_TRUE(WaitUntil(
+        [&] { return HasTitle(directory_, "Moved One") && HasTitle(directory_, "Moved Two"); }));
+}
+
+TEST_F(LiveShare, AChangedFileShowsItsNewTags) {
+    StartLive();
+    const uint32_t before = directory_.SystemUpdateId();
+    const std::string path = std::string(kShare) + "/loose.ogg";
+    WriteTags(path, {"Zulu Retitled", "Solo", "", "", "Pop"});
+    struct utimbuf later {
+        time(nullptr) + 5, time(nullptr) + 5
+    };
+    utime(path.c_str(), &later);
+    ASSERT_TRUE(WaitUntil([&] { return HasTitle(directory_, "Zulu Retitled"); }));
+    EXPECT_FALSE(HasTitle(directory_, "Zulu"));
+    EXPECT_GT(directory_.SystemUpdateId(), before);
+}
+
+TEST_F(LiveShare, ARemovedFileLeavesEveryContainer) {
+    StartLive();
+    const uint32_t before = directory_.SystemUpdateId();
+    ASSERT_EQ(unlink((std::string(kShare) + "/Jazz/Blue/Late/03 Third.mp3").c_str()), 0);
+    ASSERT_TRUE(WaitUntil([&] { return !HasTitle(directory_, "Third"); }));
+    EXPECT_EQ(AllTitles(directory_).size(), 4u);
+    EXPECT_GT(directory_.SystemUpdateId(), before);
+    BrowseArgs late;
+    late.objectId = "folder:Jazz/Blue/Late";
+    EXPECT_EQ(directory_.Browse(late).error, harmona::mediad::kErrorNoSuchObject);
+}
+
+TEST_F(LiveShare, APassOverAnUnchangedShareReadsNoTagAndKeepsTheUpdateId) {
+    StartLive();
+    const uint32_t before = directory_.SystemUpdateId();
+    // A file that is no audio makes the share change, but no track.
+    WriteFile(std::string(kShare) + "/Rock/readme.txt", "liner notes\n");
+    ASSERT_TRUE(WaitUntil([&] { return live_->passes() >= 2; }));
+    const std::vector<index::IndexReport> reports = Reports();
+    ASSERT_GE(reports.size(), 2u);
+    EXPECT_TRUE(reports[1].ok);
+    EXPECT_EQ(reports[1].tagReads, 0u);
+    EXPECT_EQ(reports[1].filesSeen, 5u);
+    EXPECT_EQ(directory_.SystemUpdateId(), before);
+}
+
+TEST_F(LiveShare, BeyondTheWatchLimitAPeriodicRescanStillFindsNewFiles) {
+    // The share's own folder only, and events alone would wait ten minutes: only the periodic
+    // rescan can find the new file in time.
+    StartLive(1, 500ms, std::chrono::minutes(10));
+    EXPECT_EQ(live_->watchedFolders(), 1u);
+    MakeAudioFile(std::string(kShare) + "/Jazz/Blue/Late/unwatched.ogg",
+                  {"Found By Rescan", "Trio", "Blue", "", "Jazz"});
+    ASSERT_TRUE(WaitUntil([&] { return HasTitle(directory_, "Found By Rescan"); }));
+    EXPECT_EQ(live_->watchedFolders(), 1u);
+    int limitLines = 0;
+    for (const LogLine& line : TakeLogLines(200)) {
+        if (line.message.find("live library: watching 1 folders, the most allowed") == 0)
+            ++limitLines;
+    }
+    EXPECT_EQ(limitLines, 1) << "the limit is logged once";
+}
+
+long MaxQueuedEvents() {
+    FILE* file = std::fopen("/proc/sys/fs/inotify/max_queued_events", "r");
+    long value = -1;
+    if (file != nullptr) {
+        if (std::fscanf(file, "%ld", &value) != 1)
+            value = -1;
+        std::fclose(file);
+    }
+    return value;
+}
+
+TEST_F(LiveShare, AnOverflowedEventQueueRewatchesAndRescansTheShare) {
+    const long queue = MaxQueuedEvents();
+    if (queue <= 0 || queue > 200000)
+        GTEST_SKIP() << "fs.inotify.max_queued_events is " << queue;
+    StartLive();
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        hold_ = true;
+    }
+    WriteFile(std::string(kShare) + "/Jazz/trigger.txt", "start a pass\n");
+    ASSERT_TRUE(WaitUntilHeld());
+    // More events than the kernel queues while nobody reads them...
+    for (long i = 0; i < queue + 100; ++i)
+        WriteFile(std::string(kShare) + "/Jazz/flood-" + std::to_string(i), "");
+    // ...so the new folder's own event is lost: only the rescan after the overflow finds it.
+    MakeAudioFile(std::string(kShare) + "/Late Arrival/first.ogg",
+                  {"Arrived In The Flood", "Late", "Flood", "", "Pop"});
+    Release();
+    ASSERT_TRUE(WaitUntil([&] { return HasTitle(directory_, "Arrived In The Flood"); }));
+    int overflowLines = 0;
+    for (const LogLine& line : TakeLogLines(200)) {
+        if (line.message.find("live library: event queue overflowed") == 0)
+            ++overflowLines;
+    }
+    EXPECT_GE(overflowLines, 1);
+    // The folder is watched from then on.
+    MakeAudioFile(std::string(kShare) + "/Late Arrival/second.ogg",
+                  {"Arrived After", "Late", "Flood", "", "Pop"});
+    ASSERT_TRUE(WaitUntil([&] { return HasTitle(directory_, "Arrived After"); }));
+}
+
+TEST_F(LiveShare, StopEndsTheThreadAndLaterChangesWaitForTheNextStart) {
+    StartLive();
+    const auto start = std::chrono::steady_clock::now();
+    live_->Stop();
+    EXPECT_LT(std::chrono::steady_clock::now() - start, kTimeLimit);
+    EXPECT_EQ(live_->watchedFolders(), 0u);
+    const std::size_t passes = live_->passes();
+    MakeAudioFile(std::string(kShare) + "/after-stop.ogg", {"After Stop", "", "", "", ""});
+    std::this_thread::sleep_for(1s);
+    EXPECT_EQ(live_->passes(), passes);
+    EXPECT_FALSE(HasTitle(directory_, "After Stop"));
+}
+
+}  // namespace
+}  // namespace harmona::test::mediad
