@@ -185,7 +185,6 @@ void SetUpNetwork() {
 }
 
 bool ServerProcess::Start() {
-    SetUpNetwork();
     pid_ = fork();
     if (pid_ == 0) {
         execl(HARMONA_MEDIAD_PATH, HARMONA_MEDIAD_PATH, "--interface", kInterface,

@@ -1,8 +1,8 @@
 // The test kit of the indexer and media server tests: a generated audio share (sox makes the
 // files, TagLib writes their tags), the real harmona-index and harmona-mediad run as child
-// processes, a network of two veth ends in the test's namespace (libupnp will not run on
-// loopback), and an independent ContentDirectory client (a hand-written SOAP body over libcurl,
-// the reply read with pugixml).
+// processes (the server serves 127.0.0.1 by itself; tests of the LAN side add a network of two veth
+// ends in the test's namespace), and an independent ContentDirectory client (a hand-written SOAP
+// body over libcurl, the reply read with pugixml).
 #pragma once
 
 #include <sys/types.h>
@@ -41,7 +41,7 @@ struct IndexRun {
 IndexRun RunIndexer();
 
 // Two veth ends, hm0 (192.0.2.1, where the server runs) and hm1 (192.0.2.2), up, IPv6 off (its
-// duplicate address detection would delay libupnp's bind), multicast routed through hm0, and
+// duplicate address detection would only delay the test), multicast routed through hm0, and
 // packets between the two ends accepted although both addresses are local.
 void SetUpNetwork();
 

@@ -1,0 +1,40 @@
+// ContentDirectory:1 on a GUPnP service: the SOAP actions mapped onto ContentDirectory (Browse,
+// the capabilities, the system update id) and its evented variables (SystemUpdateID,
+// ContainerUpdateIDs), sent to subscribers whenever the library changes.
+#pragma once
+
+#include <libgupnp/gupnp.h>
+
+#include <cstdint>
+#include <memory>
+#include <vector>
+
+#include "ContentDirectory.h"
+#include "gupnp/Object.h"
+#include "gupnp/Signal.h"
+
+namespace harmona::mediad {
+
+class ContentDirectoryService {
+  public:
+    // `directory` answers the actions; it must outlive this object.
+    ContentDirectoryService(GUPnPService* service, const ContentDirectory& directory);
+    ContentDirectoryService(const ContentDirectoryService&) = delete;
+    ContentDirectoryService& operator=(const ContentDirectoryService&) = delete;
+
+    // Sends SystemUpdateID and ContainerUpdateIDs to every subscriber when the library's update
+    // id moved since the last call (or since this service started).
+    void NotifyIfChanged();
+
+  private:
+    static void OnAction(GUPnPService* service, GUPnPServiceAction* action, gpointer self);
+    static void OnQueryVariable(GUPnPService* service, const char* variable, GValue* value,
+                                gpointer self);
+
+    gupnp::ObjectRef<GUPnPService> service_;
+    const ContentDirectory& directory_;
+    uint32_t announcedUpdateId_;
+    std::vector<gupnp::SignalConnection> connections_;
+};
+
+}  // namespace harmona::mediad
