@@ -81,8 +81,15 @@ std::string SoapSimpleAction(const std::string& action, const std::string& outAr
 struct HttpReply {
     long status = 0;
     std::string contentType;
+    std::string headers;  // the response's header lines, as received
     std::string body;
 };
 HttpReply HttpGet(const std::string& url, const std::string& range = "");
+
+// Sends `request` as it stands over TCP to address:port and returns what came back before the
+// peer closed or `waitMs` passed ("" when nobody listens).
+std::string RawHttpExchange(const std::string& address, unsigned short port,
+                            const std::string& request, int waitMs = 3000,
+                            const std::string& sourceAddress = "");
 
 }  // namespace harmona::test::mediad
