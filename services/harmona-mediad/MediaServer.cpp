@@ -57,9 +57,9 @@ bool MulticastCanLeave(const std::string& address, std::string* why) {
 
 // --- ServedContext -------------------------------------------------------------------------------
 
-std::unique_ptr<ServedContext> ServedContext::Create(GUPnPContext* context,
-                                                     const MediaServerOptions& options,
-                                                     std::string* error) {
+std::unique_ptr<ServedContext> ServedContext::Create(
+    GUPnPContext* context, const MediaServerOptions& options,
+    std::function<void(ServedContext&)> onAvailable, std::string* error) {
     std::unique_ptr<ServedContext> served(new ServedContext);
     served->context_ = gupnp::ObjectRef<GUPnPContext>::Share(context);
     served->address_ = OrEmpty(gssdp_client_get_host_ip(GSSDP_CLIENT(context)));
@@ -93,11 +93,37 @@ std::unique_ptr<ServedContext> ServedContext::Create(GUPnPContext* context,
     served->guard_ = std::make_unique<SubscriptionGuard>(context);
     gssdp_resource_group_set_message_delay(ResourceGroupOf(served->device_.get()),
                                            kSsdpMessageDelayMs);
-    gupnp_root_device_set_available(served->device_.get(), TRUE);
+    served->onAvailable_ = std::move(onAvailable);
+    served->introspection_ = gupnp::ObjectRef<GCancellable>::Adopt(g_cancellable_new());
+    gupnp_service_info_introspect_async(contentDirectory.get(), served->introspection_.get(),
+                                        &ServedContext::OnIntrospected, served.get());
     return served;
 }
 
+void ServedContext::OnIntrospected(GObject* service, GAsyncResult* result, gpointer self) {
+    gupnp::Error error;
+    GUPnPServiceIntrospection* introspection =
+        gupnp_service_info_introspect_finish(GUPNP_SERVICE_INFO(service), result, error.out());
+    if (introspection != nullptr)
+        g_object_unref(introspection);
+    if (error && g_error_matches(error.get(), G_IO_ERROR, G_IO_ERROR_CANCELLED))
+        return;  // the context went away first; `self` is gone
+    auto* me = static_cast<ServedContext*>(self);
+    if (error)
+        syslog(LOG_WARNING, "ContentDirectory description on %s unreadable (%s); serving anyway",
+               me->address_.c_str(), error.message());
+    me->BecomeAvailable();
+}
+
+void ServedContext::BecomeAvailable() {
+    gupnp_root_device_set_available(device_.get(), TRUE);
+    if (onAvailable_)
+        std::exchange(onAvailable_, nullptr)(*this);
+}
+
 ServedContext::~ServedContext() {
+    if (introspection_)
+        g_cancellable_cancel(introspection_.get());
     announcements_.clear();
     // The services and the file handler go before the device and the context they hang on.
     guard_.reset();
@@ -188,10 +214,18 @@ bool MediaServer::TryLoopback() {
         gupnp_context_new_full("lo", address, options_.port, GSSDP_UDA_VERSION_1_0, gerror.out()));
     g_object_unref(address);
     std::string error;
-    if (context)
-        loopback_ = ServedContext::Create(context.get(), options_, &error);
-    else
+    if (context) {
+        loopback_ = ServedContext::Create(
+            context.get(), options_,
+            [this](ServedContext&) {
+                syslog(LOG_INFO, "serving 127.0.0.1:%u", options_.port);
+                if (onLoopbackReady_)
+                    std::exchange(onLoopbackReady_, nullptr)();
+            },
+            &error);
+    } else {
         error = gerror.message();
+    }
     if (!loopback_) {
         static bool logged = false;
         if (!logged)
@@ -200,9 +234,6 @@ bool MediaServer::TryLoopback() {
         logged = true;
         return false;
     }
-    syslog(LOG_INFO, "serving 127.0.0.1:%u", options_.port);
-    if (onLoopbackReady_)
-        std::exchange(onLoopbackReady_, nullptr)();
     return true;
 }
 
@@ -227,16 +258,20 @@ void MediaServer::OnContextAvailable(GUPnPContextManager*, GUPnPContext* context
     if (address.rfind("127.", 0) == 0)
         return;  // loopback has its own context
     std::string error;
-    auto served = ServedContext::Create(context, me->options_, &error);
+    auto served = ServedContext::Create(
+        context, me->options_,
+        [port = me->options_.port](ServedContext& available) {
+            syslog(LOG_INFO, "serving %s (%s:%u)", available.interfaceName().c_str(),
+                   available.address().c_str(), port);
+            available.ScheduleAnnouncements();
+            available.CheckMulticast();
+        },
+        &error);
     if (!served) {
         syslog(LOG_ERR, "cannot serve %s (%s): %s", interfaceName.c_str(), address.c_str(),
                error.c_str());
         return;
     }
-    syslog(LOG_INFO, "serving %s (%s:%u)", interfaceName.c_str(), address.c_str(),
-           gupnp_context_get_port(context));
-    served->ScheduleAnnouncements();
-    served->CheckMulticast();
     me->lan_[context] = std::move(served);
 }
 

@@ -39,8 +39,11 @@ struct MediaServerOptions {
 // services, the files and the subscription guard.
 class ServedContext {
   public:
+    // The device goes on the network (and `onAvailable` runs) once GUPnP has read the
+    // ContentDirectory's own description: before that its first events would be empty.
     static std::unique_ptr<ServedContext> Create(GUPnPContext* context,
                                                  const MediaServerOptions& options,
+                                                 std::function<void(ServedContext&)> onAvailable,
                                                  std::string* error);
     ~ServedContext();
 
@@ -58,6 +61,8 @@ class ServedContext {
 
   private:
     ServedContext() = default;
+    static void OnIntrospected(GObject* service, GAsyncResult* result, gpointer self);
+    void BecomeAvailable();
 
     gupnp::ObjectRef<GUPnPContext> context_;
     std::string address_, interface_;
@@ -68,6 +73,8 @@ class ServedContext {
     std::unique_ptr<MediaFileServer> files_;
     std::unique_ptr<SubscriptionGuard> guard_;
     std::vector<gupnp::Source> announcements_;
+    gupnp::ObjectRef<GCancellable> introspection_;
+    std::function<void(ServedContext&)> onAvailable_;
     bool multicastOk_ = true;
 };
 

@@ -117,7 +117,7 @@ TEST_F(MediaServerSafety, SubscribeAndUnsubscribeWithASidLeaveTheServerServing) 
     EXPECT_EQ(server_.Stop(), 0);  // the same process ran all along
 }
 
-TEST_F(MediaServerSafety, ACallbackOnTheSubscribersOwnAddressIsAcceptedAndNotified) {
+TEST_F(MediaServerSafety, ACallbackOnTheSubscribersOwnAddressHearsTheInitialStateAndEachChange) {
     CallbackListener listener("127.0.0.1");
     const std::string callback =
         "CALLBACK: <http://127.0.0.1:" + std::to_string(listener.port()) + "/>\r\n";
@@ -129,7 +129,18 @@ TEST_F(MediaServerSafety, ACallbackOnTheSubscribersOwnAddressIsAcceptedAndNotifi
     EXPECT_NE(answer.find("SID: uuid:"), std::string::npos) << answer;
     const std::string notify = listener.WaitForRequest(5000);
     EXPECT_EQ(notify.rfind("NOTIFY ", 0), 0u) << notify;
-    EXPECT_NE(notify.find("SystemUpdateID"), std::string::npos) << notify;
+    EXPECT_NE(notify.find("SEQ: 0"), std::string::npos) << notify;
+    EXPECT_NE(notify.find("<SystemUpdateID>"), std::string::npos) << notify;
+    // The library changes: a new file, indexed. The subscriber hears of it.
+    std::this_thread::sleep_for(std::chrono::milliseconds(1100));
+    MakeAudioFile(std::string(kShare) + "/New/added.flac",
+                  {"Added", "Band A", "", "", "", 0, 0, 0});
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    const std::string updated = SoapSimpleAction("GetSystemUpdateID", "Id");
+    const std::string change = listener.WaitForRequest(10000);
+    EXPECT_EQ(change.rfind("NOTIFY ", 0), 0u) << change;
+    EXPECT_NE(change.find("SEQ: 1"), std::string::npos) << change;
+    EXPECT_NE(change.find("<SystemUpdateID>" + updated + "<"), std::string::npos) << change;
 }
 
 TEST_F(MediaServerSafety, ALoopbackCallbackFromALanAddressIsRefusedAndNothingIsSentThere) {
