@@ -1,7 +1,9 @@
 #include "MediaServer.h"
 
 #include <arpa/inet.h>
+#include <net/if.h>
 #include <netinet/in.h>
+#include <sys/ioctl.h>
 #include <sys/socket.h>
 #include <syslog.h>
 #include <unistd.h>
@@ -16,7 +18,7 @@ namespace {
 
 constexpr unsigned kLoopbackRetryMs = 2000;
 constexpr unsigned kLibraryWatchMs = 2000;
-constexpr unsigned kMulticastWatchMs = 5000;
+constexpr unsigned kMulticastWatchMs = 2000;
 // After a context appears: announce again this many seconds later, so that a player that missed
 // the first set (a link still negotiating, a switch still learning) hears one soon.
 constexpr unsigned kAnnounceAgainSeconds[] = {3, 10, 30};
@@ -31,24 +33,41 @@ GSSDPResourceGroup* ResourceGroupOf(GUPnPRootDevice* device) {
     return gupnp_root_device_get_ssdp_resource_group(device);
 }
 
-// Whether a datagram to the SSDP group can leave from `address` the way GSSDP sends it (the
-// interface chosen by its address): connect() does the route lookup without sending anything.
-bool MulticastCanLeave(const std::string& address, std::string* why) {
+// Whether SSDP datagrams sent from `address` on `interfaceName` reach the link: GSSDP picks the
+// interface by address (IP_MULTICAST_IF), which needs no multicast route, so what stops them is an
+// interface that is down, has no carrier or does not do multicast; and connect() still does the
+// route lookup GSSDP's sends do, without sending anything.
+bool MulticastCanLeave(const std::string& interfaceName, const std::string& address,
+                       std::string* why) {
     const int s = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
     if (s < 0) {
         *why = std::strerror(errno);
         return false;
     }
-    in_addr local{};
-    inet_pton(AF_INET, address.c_str(), &local);
-    setsockopt(s, IPPROTO_IP, IP_MULTICAST_IF, &local, sizeof(local));
-    sockaddr_in group{};
-    group.sin_family = AF_INET;
-    group.sin_port = htons(1900);
-    inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
-    const bool ok = connect(s, reinterpret_cast<sockaddr*>(&group), sizeof(group)) == 0;
+    ifreq request{};
+    std::strncpy(request.ifr_name, interfaceName.c_str(), IFNAMSIZ - 1);
+    bool ok = ioctl(s, SIOCGIFFLAGS, &request) == 0;
     if (!ok)
         *why = std::strerror(errno);
+    else if ((request.ifr_flags & IFF_UP) == 0)
+        *why = "interface down";
+    else if ((request.ifr_flags & IFF_RUNNING) == 0)
+        *why = "no carrier";
+    else if ((request.ifr_flags & IFF_MULTICAST) == 0)
+        *why = "multicast off";
+    ok = ok && why->empty();
+    if (ok) {
+        in_addr local{};
+        inet_pton(AF_INET, address.c_str(), &local);
+        setsockopt(s, IPPROTO_IP, IP_MULTICAST_IF, &local, sizeof(local));
+        sockaddr_in group{};
+        group.sin_family = AF_INET;
+        group.sin_port = htons(1900);
+        inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
+        ok = connect(s, reinterpret_cast<sockaddr*>(&group), sizeof(group)) == 0;
+        if (!ok)
+            *why = std::strerror(errno);
+    }
     close(s);
     return ok;
 }
@@ -162,7 +181,7 @@ void ServedContext::NotifyIfLibraryChanged() {
 
 void ServedContext::CheckMulticast() {
     std::string why;
-    const bool ok = MulticastCanLeave(address_, &why);
+    const bool ok = MulticastCanLeave(interface_, address_, &why);
     if (ok == multicastOk_)
         return;
     multicastOk_ = ok;

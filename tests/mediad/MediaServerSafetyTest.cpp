@@ -16,9 +16,11 @@
 #include <fstream>
 #include <string>
 #include <thread>
+#include <vector>
 
 #include "Fixtures.h"
 #include "MediadTestKit.h"
+#include "Sandbox.h"
 #include "ShareFile.h"
 
 namespace harmona::test::mediad {
@@ -266,6 +268,77 @@ TEST_F(MediaServerSafety, AServerStartedBeforeItsInterfaceHasAnAddressServesOnce
     }
     EXPECT_EQ(StatusOf(description), 200) << description;
     EXPECT_NE(description.find("<name>Browse</name>"), std::string::npos);
+}
+
+// Waits up to `ms` for a log line holding one of `texts`; the line found, or "".
+std::string WaitForLogLine(const std::vector<std::string>& texts, int ms) {
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(ms);
+    while (std::chrono::steady_clock::now() < deadline) {
+        for (const LogLine& line : TakeLogLines(100)) {
+            for (const std::string& text : texts) {
+                if (line.message.find(text) != std::string::npos)
+                    return line.message;
+            }
+        }
+    }
+    return "";
+}
+
+// A socket on hm1 that hears the SSDP multicast group; the first alive from the server within
+// `ms`, or "".
+std::string WaitForAlive(int ms) {
+    const int s = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    const int yes = 1;
+    setsockopt(s, SOL_SOCKET, SO_REUSEADDR, &yes, sizeof(yes));
+    sockaddr_in any{};
+    any.sin_family = AF_INET;
+    any.sin_port = htons(1900);
+    bind(s, reinterpret_cast<sockaddr*>(&any), sizeof(any));
+    ip_mreq join{};
+    inet_pton(AF_INET, "239.255.255.250", &join.imr_multiaddr);
+    inet_pton(AF_INET, "192.0.2.2", &join.imr_interface);
+    setsockopt(s, IPPROTO_IP, IP_ADD_MEMBERSHIP, &join, sizeof(join));
+    std::string alive;
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(ms);
+    pollfd pfd{s, POLLIN, 0};
+    while (alive.empty() && std::chrono::steady_clock::now() < deadline &&
+           poll(&pfd, 1, 200) >= 0) {
+        if ((pfd.revents & POLLIN) == 0)
+            continue;
+        char buffer[2048];
+        const ssize_t got = recv(s, buffer, sizeof(buffer), 0);
+        const std::string datagram(buffer, got > 0 ? static_cast<std::size_t>(got) : 0);
+        if (datagram.find("ssdp:alive") != std::string::npos &&
+            datagram.find("http://192.0.2.1:50003/") != std::string::npos)
+            alive = datagram;
+    }
+    close(s);
+    return alive;
+}
+
+TEST_F(MediaServerSafety, ALinkThatLosesItsCarrierIsLoggedAndAnnouncedAgainWhenItReturns) {
+    SetUpNetwork();
+    std::string description;
+    for (int i = 0; i < 100 && StatusOf(description) != 200; ++i) {
+        description = RawHttpExchange("192.0.2.1", 50003,
+                                      "GET /ContentDirectory.xml HTTP/1.1\r\nHost: 192.0.2.1:50003"
+                                      "\r\nConnection: close\r\n\r\n",
+                                      1000);
+        if (StatusOf(description) != 200)
+            std::this_thread::sleep_for(std::chrono::milliseconds(100));
+    }
+    ASSERT_EQ(StatusOf(description), 200) << "the LAN side never served";
+    // Past the announcements that follow start, so that an alive heard later is the one the
+    // returning link caused.
+    std::this_thread::sleep_for(std::chrono::seconds(4));
+    TakeLogLines();
+    ASSERT_EQ(std::system("ip link set hm1 down"), 0);  // hm0 loses its carrier
+    EXPECT_NE(WaitForLogLine({"announcements cannot leave hm0", "hm0 (192.0.2.1) went away"}, 8000),
+              "");
+    ASSERT_EQ(std::system("ip link set hm1 up"), 0);
+    const std::string alive = WaitForAlive(8000);
+    EXPECT_NE(alive, "") << "no alive within 8 s of the link's return";
+    EXPECT_TRUE(StillServes());
 }
 
 // The opener itself, with the kernel's openat2 and with the walk used where it is missing.
