@@ -152,7 +152,7 @@ Child StartServer(const harmona::mediad::MediaServerOptions& options) {
     const pid_t pid = fork();
     if (pid == 0) {
         close(ready[0]);
-        _exit(RunServer(options, ready[1]));
+        std::exit(RunServer(options, ready[1]));
     }
     close(ready[1]);
     if (pid < 0) {
@@ -169,9 +169,10 @@ bool WaitReady(const Child& child, int ms) {
     return poll(&pfd, 1, ms) > 0 && read(child.readyFd, &byte, 1) == 1;
 }
 
+// SIGTERM, then the server's wait status (SIGKILL after kStopWaitMs). 0 when none was running.
 int StopServer(Child* child) {
     if (child->pid <= 0)
-        return -1;
+        return 0;
     kill(child->pid, SIGTERM);
     int status = 0;
     for (int waited = 0; waitpid(child->pid, &status, WNOHANG) == 0; waited += 10) {
@@ -247,8 +248,9 @@ int main(int argc, char** argv) {
             child = StartServer(options);
     }
     RemovePidFile();
-    StopServer(&child);
+    const int status = StopServer(&child);
     harmona::mediad::RemoveDescriptionFolder(options.descriptionFolder);
     syslog(LOG_INFO, "stopped by signal %d", received);
-    return 0;
+    // A server that did not end cleanly (a fault, a sanitizer report) makes the stop fail too.
+    return status == 0 ? 0 : 1;
 }
