@@ -40,6 +40,21 @@ int StatusOf(const std::string& response) {
     return std::atoi(response.c_str() + 9);
 }
 
+// The ContentDirectory description fetched from the LAN address, retried for up to 10 s while
+// the server has not taken up the interface yet; the last response.
+std::string WaitForTheLanSide() {
+    std::string description;
+    for (int i = 0; i < 100 && StatusOf(description) != 200; ++i) {
+        description = RawHttpExchange("192.0.2.1", 50003,
+                                      "GET /ContentDirectory.xml HTTP/1.1\r\nHost: 192.0.2.1:50003"
+                                      "\r\nConnection: close\r\n\r\n",
+                                      1000);
+        if (StatusOf(description) != 200)
+            std::this_thread::sleep_for(std::chrono::milliseconds(100));
+    }
+    return description;
+}
+
 // A TCP listener that counts the requests (NOTIFY or any other) it receives.
 class CallbackListener {
   public:
@@ -257,15 +272,7 @@ TEST_F(MediaServerSafety, AServerStartedBeforeItsInterfaceHasAnAddressServesOnce
     std::this_thread::sleep_for(std::chrono::seconds(1));
     EXPECT_TRUE(StillServes());
     std::system("ip addr add 192.0.2.1/24 dev hm0");
-    std::string description;
-    for (int i = 0; i < 100 && StatusOf(description) != 200; ++i) {
-        description = RawHttpExchange("192.0.2.1", 50003,
-                                      "GET /ContentDirectory.xml HTTP/1.1\r\nHost: 192.0.2.1:50003"
-                                      "\r\nConnection: close\r\n\r\n",
-                                      1000);
-        if (StatusOf(description) != 200)
-            std::this_thread::sleep_for(std::chrono::milliseconds(100));
-    }
+    const std::string description = WaitForTheLanSide();
     EXPECT_EQ(StatusOf(description), 200) << description;
     EXPECT_NE(description.find("<name>Browse</name>"), std::string::npos);
 }
@@ -318,15 +325,7 @@ std::string WaitForAlive(int ms) {
 
 TEST_F(MediaServerSafety, ALinkThatLosesItsCarrierIsLoggedAndAnnouncedAgainWhenItReturns) {
     SetUpNetwork();
-    std::string description;
-    for (int i = 0; i < 100 && StatusOf(description) != 200; ++i) {
-        description = RawHttpExchange("192.0.2.1", 50003,
-                                      "GET /ContentDirectory.xml HTTP/1.1\r\nHost: 192.0.2.1:50003"
-                                      "\r\nConnection: close\r\n\r\n",
-                                      1000);
-        if (StatusOf(description) != 200)
-            std::this_thread::sleep_for(std::chrono::milliseconds(100));
-    }
+    const std::string description = WaitForTheLanSide();
     ASSERT_EQ(StatusOf(description), 200) << "the LAN side never served";
     // Past the announcements that follow start, so that an alive heard later is the one the
     // returning link caused.
