@@ -1,6 +1,9 @@
 #include "ContentDirectoryService.h"
 
+#include <gio/gio.h>
+
 #include <cstdlib>
+#include <memory>
 #include <string>
 
 #include "gupnp/ServiceAction.h"
@@ -39,22 +42,47 @@ bool ReadBrowseArgs(const gupnp::ServiceAction& action, BrowseArgs* args) {
            (!count || ParseUnsigned(*count, &args->requestedCount));
 }
 
-void Browse(const ContentDirectory& directory, gupnp::ServiceAction& action) {
+// One Browse on its way through the thread pool.
+struct BrowseJob {
+    std::shared_ptr<const ContentDirectory> directory;
+    BrowseArgs args;
+    BrowseResult result;
+    gupnp::ServiceAction action;
+};
+
+void RunBrowse(GTask* task, gpointer, gpointer data, GCancellable*) {
+    auto* job = static_cast<BrowseJob*>(data);
+    job->result = job->directory->Browse(job->args);  // thread-safe: a connection of its own
+    g_task_return_boolean(task, TRUE);
+}
+
+// Back in the main loop: the answer.
+void FinishBrowse(GObject*, GAsyncResult*, gpointer data) {
+    std::unique_ptr<BrowseJob> job(static_cast<BrowseJob*>(data));
+    const BrowseResult& result = job->result;
+    if (result.error != 0) {
+        job->action.ReturnError(result.error, result.errorText);
+        return;
+    }
+    job->action.SetString("Result", result.didl);
+    job->action.SetUnsigned("NumberReturned", result.numberReturned);
+    job->action.SetUnsigned("TotalMatches", result.totalMatches);
+    job->action.SetUnsigned("UpdateID", result.updateId);
+    job->action.ReturnSuccess();
+}
+
+void Browse(const std::shared_ptr<const ContentDirectory>& directory,
+            gupnp::ServiceAction&& action) {
     BrowseArgs args;
     if (!ReadBrowseArgs(action, &args)) {
         action.ReturnError(kErrorInvalidArgs, "Invalid Args");
         return;
     }
-    const BrowseResult result = directory.Browse(args);
-    if (result.error != 0) {
-        action.ReturnError(result.error, result.errorText);
-        return;
-    }
-    action.SetString("Result", result.didl);
-    action.SetUnsigned("NumberReturned", result.numberReturned);
-    action.SetUnsigned("TotalMatches", result.totalMatches);
-    action.SetUnsigned("UpdateID", result.updateId);
-    action.ReturnSuccess();
+    auto* job = new BrowseJob{directory, std::move(args), {}, std::move(action)};
+    GTask* task = g_task_new(nullptr, nullptr, &FinishBrowse, job);
+    g_task_set_task_data(task, job, nullptr);
+    g_task_run_in_thread(task, &RunBrowse);
+    g_object_unref(task);
 }
 
 // The containers whose content moved: the root stands for the whole library, since a rescan may
@@ -66,10 +94,10 @@ std::string ContainerUpdateIds(uint32_t systemUpdateId) {
 }  // namespace
 
 ContentDirectoryService::ContentDirectoryService(GUPnPService* service,
-                                                 const ContentDirectory& directory)
+                                                 std::shared_ptr<const ContentDirectory> directory)
     : service_(gupnp::ObjectRef<GUPnPService>::Share(service)),
-      directory_(directory),
-      announcedUpdateId_(directory.SystemUpdateId()) {
+      directory_(std::move(directory)),
+      announcedUpdateId_(directory_->SystemUpdateId()) {
     // GUPnP answers 401 itself unless a handler is connected for the action's own detail.
     for (const char* action :
          {"action-invoked::Browse", "action-invoked::GetSearchCapabilities",
@@ -83,7 +111,7 @@ void ContentDirectoryService::OnAction(GUPnPService*, GUPnPServiceAction* invoke
     gupnp::ServiceAction action(invoked);
     const std::string name = action.name() != nullptr ? action.name() : "";
     if (name == "Browse") {
-        Browse(me->directory_, action);
+        Browse(me->directory_, std::move(action));
     } else if (name == "GetSearchCapabilities") {
         action.SetString("SearchCaps", kSearchCapabilities);
         action.ReturnSuccess();
@@ -91,7 +119,7 @@ void ContentDirectoryService::OnAction(GUPnPService*, GUPnPServiceAction* invoke
         action.SetString("SortCaps", kSortCapabilities);
         action.ReturnSuccess();
     } else if (name == "GetSystemUpdateID") {
-        action.SetUnsigned("Id", me->directory_.SystemUpdateId());
+        action.SetUnsigned("Id", me->directory_->SystemUpdateId());
         action.ReturnSuccess();
     } else {
         action.ReturnError(kErrorInvalidAction, "Invalid Action");
@@ -104,7 +132,7 @@ void ContentDirectoryService::OnQueryVariable(GUPnPService*, const char* variabl
     const std::string name = variable != nullptr ? variable : "";
     if (name == "SystemUpdateID") {
         g_value_init(value, G_TYPE_UINT);
-        g_value_set_uint(value, me->directory_.SystemUpdateId());
+        g_value_set_uint(value, me->directory_->SystemUpdateId());
     } else if (name == "ContainerUpdateIDs") {
         g_value_init(value, G_TYPE_STRING);
         g_value_set_string(value, "");
@@ -112,7 +140,7 @@ void ContentDirectoryService::OnQueryVariable(GUPnPService*, const char* variabl
 }
 
 void ContentDirectoryService::NotifyIfChanged() {
-    const uint32_t updateId = directory_.SystemUpdateId();
+    const uint32_t updateId = directory_->SystemUpdateId();
     if (updateId == announcedUpdateId_)
         return;
     announcedUpdateId_ = updateId;

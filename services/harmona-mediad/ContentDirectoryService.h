@@ -1,6 +1,8 @@
 // ContentDirectory:1 on a GUPnP service: the SOAP actions mapped onto ContentDirectory (Browse,
 // the capabilities, the system update id) and its evented variables (SystemUpdateID,
-// ContainerUpdateIDs), sent to subscribers whenever the library changes.
+// ContainerUpdateIDs), sent to subscribers whenever the library changes. A Browse runs in GLib's
+// thread pool and is answered from the main loop, so that a large listing never holds up SSDP,
+// other clients or file transfers.
 #pragma once
 
 #include <libgupnp/gupnp.h>
@@ -17,8 +19,9 @@ namespace harmona::mediad {
 
 class ContentDirectoryService {
   public:
-    // `directory` answers the actions; it must outlive this object.
-    ContentDirectoryService(GUPnPService* service, const ContentDirectory& directory);
+    // `directory` answers the actions (shared: a Browse in a thread may outlive this object).
+    ContentDirectoryService(GUPnPService* service,
+                            std::shared_ptr<const ContentDirectory> directory);
     ContentDirectoryService(const ContentDirectoryService&) = delete;
     ContentDirectoryService& operator=(const ContentDirectoryService&) = delete;
 
@@ -32,7 +35,7 @@ class ContentDirectoryService {
                                 gpointer self);
 
     gupnp::ObjectRef<GUPnPService> service_;
-    const ContentDirectory& directory_;
+    std::shared_ptr<const ContentDirectory> directory_;
     uint32_t announcedUpdateId_;
     std::vector<gupnp::SignalConnection> connections_;
 };

@@ -86,7 +86,7 @@ std::unique_ptr<ServedContext> ServedContext::Create(
     const std::string base = "http://" + served->address_ + ":" +
                              std::to_string(gupnp_context_get_port(context)) + kMediaPath + "/";
     served->directory_ =
-        std::make_unique<ContentDirectory>(options.dbPath, options.sharePath, base);
+        std::make_shared<ContentDirectory>(options.dbPath, options.sharePath, base);
     gupnp::Error gerror;
     served->device_ = gupnp::ObjectRef<GUPnPRootDevice>::Adopt(gupnp_root_device_new(
         context, kDescriptionFile, options.descriptionFolder.c_str(), gerror.out()));
@@ -104,7 +104,7 @@ std::unique_ptr<ServedContext> ServedContext::Create(
         return nullptr;
     }
     served->contentDirectoryService_ = std::make_unique<ContentDirectoryService>(
-        GUPNP_SERVICE(contentDirectory.get()), *served->directory_);
+        GUPNP_SERVICE(contentDirectory.get()), served->directory_);
     served->connectionManagerService_ =
         std::make_unique<ConnectionManagerService>(GUPNP_SERVICE(connectionManager.get()));
     served->files_ =

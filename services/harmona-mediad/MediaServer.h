@@ -66,7 +66,7 @@ class ServedContext {
 
     gupnp::ObjectRef<GUPnPContext> context_;
     std::string address_, interface_;
-    std::unique_ptr<ContentDirectory> directory_;
+    std::shared_ptr<ContentDirectory> directory_;
     gupnp::ObjectRef<GUPnPRootDevice> device_;
     std::unique_ptr<ContentDirectoryService> contentDirectoryService_;
     std::unique_ptr<ConnectionManagerService> connectionManagerService_;

@@ -3,6 +3,7 @@
 #include <libsoup/soup.h>
 
 #include <cstring>
+#include <utility>
 
 namespace harmona::gupnp {
 namespace {
@@ -34,9 +35,18 @@ bool RequestCarries(GUPnPServiceAction* action, const char* name) {
 
 }  // namespace
 
+ServiceAction::ServiceAction(GUPnPServiceAction* action)
+    : action_(static_cast<GUPnPServiceAction*>(g_boxed_copy(GUPNP_TYPE_SERVICE_ACTION, action))) {}
+
+ServiceAction::ServiceAction(ServiceAction&& other) noexcept
+    : action_(std::exchange(other.action_, nullptr)), answered_(other.answered_) {}
+
 ServiceAction::~ServiceAction() {
+    if (action_ == nullptr)
+        return;
     if (!answered_)
         ReturnError(501, "Action Failed");
+    g_boxed_free(GUPNP_TYPE_SERVICE_ACTION, action_);
 }
 
 std::optional<std::string> ServiceAction::Argument(const char* name) const {

@@ -1,7 +1,8 @@
 // One SOAP action that GUPnP handed to a service's "action-invoked" handler: its in arguments as
-// text, its out arguments, and exactly one answer (success or a UPnP error). A handler that
-// forgets to answer would leave the client's HTTP request paused forever, so the destructor
-// answers 501 Action Failed for it.
+// text, its out arguments, and exactly one answer (success or a UPnP error). It holds a reference
+// of its own, so an answer may come later from the main loop (after work done in a thread). An
+// action dropped unanswered would leave the client's HTTP request paused forever, so the
+// destructor answers 501 Action Failed for it.
 #pragma once
 
 #include <libgupnp/gupnp-service.h>
@@ -13,8 +14,10 @@ namespace harmona::gupnp {
 
 class ServiceAction {
   public:
-    explicit ServiceAction(GUPnPServiceAction* action) : action_(action) {}
+    explicit ServiceAction(GUPnPServiceAction* action);
     ~ServiceAction();
+    ServiceAction(ServiceAction&& other) noexcept;
+    ServiceAction& operator=(ServiceAction&&) = delete;
     ServiceAction(const ServiceAction&) = delete;
     ServiceAction& operator=(const ServiceAction&) = delete;
 
