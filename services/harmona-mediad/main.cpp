@@ -108,7 +108,7 @@ int RunServer(const harmona::mediad::MediaServerOptions& options, int readyFd) {
     sigset_t none;
     sigemptyset(&none);
     pthread_sigmask(SIG_SETMASK, &none, nullptr);
-    prctl(PR_SET_PDEATHSIG, SIGTERM);
+    const pid_t parent = getppid();
     // No user session here: keep GIO from looking for dconf in root's home after the drop.
     setenv("GSETTINGS_BACKEND", "memory", 1);
     setenv("GIO_USE_VFS", "local", 1);
@@ -116,6 +116,11 @@ int RunServer(const harmona::mediad::MediaServerOptions& options, int readyFd) {
         syslog(LOG_ERR, "cannot change to user %s; not serving as root", kUnprivilegedUser);
         return 1;
     }
+    // The server ends with the process that keeps its pid file, however that one ends. Set after
+    // the change of user, which clears it.
+    prctl(PR_SET_PDEATHSIG, SIGTERM);
+    if (getppid() != parent)
+        return 0;
     harmona::gupnp::MainLoop loop;
     harmona::mediad::MediaServer server(options);
     harmona::gupnp::Source byeByeDone;

@@ -6,6 +6,7 @@
 #include <gtest/gtest.h>
 #include <netinet/in.h>
 #include <poll.h>
+#include <signal.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -260,6 +261,23 @@ TEST_F(MediaServerSafety, TheServerNoLongerRunsAsRoot) {
     const std::size_t uid = status.find("Uid:");
     ASSERT_NE(uid, std::string::npos);
     EXPECT_EQ(status.substr(uid, status.find('\n', uid) - uid), "Uid:\t65534\t65534\t65534\t65534");
+}
+
+TEST_F(MediaServerSafety, TheServingProcessEndsWhenThePidFileKeeperIsKilled) {
+    const std::string children = ReadFile("/proc/" + std::to_string(server_.pid()) + "/task/" +
+                                          std::to_string(server_.pid()) + "/children");
+    const pid_t serving = static_cast<pid_t>(std::atol(children.c_str()));
+    ASSERT_GT(serving, 0);
+    ASSERT_EQ(kill(server_.pid(), SIGKILL), 0);
+    bool gone = false;
+    for (int i = 0; i < 100 && !gone; ++i) {
+        const std::string status = ReadFile("/proc/" + std::to_string(serving) + "/status");
+        gone = status.empty() || status.find("State:\tZ") != std::string::npos;
+        if (!gone)
+            std::this_thread::sleep_for(std::chrono::milliseconds(100));
+    }
+    EXPECT_TRUE(gone) << "the server outlived its parent";
+    server_.Stop();  // reaps the killed parent
 }
 
 TEST_F(MediaServerSafety, AServerStartedBeforeItsInterfaceHasAnAddressServesOnceItArrives) {
