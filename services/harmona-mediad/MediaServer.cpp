@@ -232,20 +232,8 @@ bool MediaServer::TryLoopback() {
     auto context = gupnp::ObjectRef<GUPnPContext>::Adopt(
         gupnp_context_new_full("lo", address, options_.port, GSSDP_UDA_VERSION_1_0, gerror.out()));
     g_object_unref(address);
-    std::string error;
-    if (context) {
-        loopback_ = ServedContext::Create(
-            context.get(), options_,
-            [this](ServedContext&) {
-                syslog(LOG_INFO, "serving 127.0.0.1:%u", options_.port);
-                if (onLoopbackReady_)
-                    std::exchange(onLoopbackReady_, nullptr)();
-            },
-            &error);
-    } else {
-        error = gerror.message();
-    }
-    if (!loopback_) {
+    std::string error = gerror.message();
+    if (!context || !ServeLoopback(context.get(), &error)) {
         static bool logged = false;
         if (!logged)
             syslog(LOG_ERR, "cannot serve 127.0.0.1:%u yet (%s); trying again every %u s",
@@ -254,6 +242,18 @@ bool MediaServer::TryLoopback() {
         return false;
     }
     return true;
+}
+
+bool MediaServer::ServeLoopback(GUPnPContext* context, std::string* error) {
+    loopback_ = ServedContext::Create(
+        context, options_,
+        [this](ServedContext&) {
+            syslog(LOG_INFO, "serving 127.0.0.1:%u", options_.port);
+            if (onLoopbackReady_)
+                std::exchange(onLoopbackReady_, nullptr)();
+        },
+        error);
+    return loopback_ != nullptr;
 }
 
 void MediaServer::StartContextManager() {
@@ -274,8 +274,15 @@ void MediaServer::OnContextAvailable(GUPnPContextManager*, GUPnPContext* context
     auto* me = static_cast<MediaServer*>(self);
     const std::string address = OrEmpty(gssdp_client_get_host_ip(GSSDP_CLIENT(context)));
     const std::string interfaceName = OrEmpty(gssdp_client_get_interface(GSSDP_CLIENT(context)));
-    if (address.rfind("127.", 0) == 0)
-        return;  // loopback has its own context
+    if (address.rfind("127.", 0) == 0) {
+        // Loopback has a context of its own, made first; the manager's attempt on lo then fails
+        // to bind (GUPnP warns once). Should the manager have got there first, its context
+        // serves 127.0.0.1 instead.
+        std::string error;
+        if (!me->loopback_ && me->ServeLoopback(context, &error))
+            me->loopbackRetry_.Remove();
+        return;
+    }
     std::string error;
     auto served = ServedContext::Create(
         context, me->options_,

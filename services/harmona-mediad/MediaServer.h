@@ -93,6 +93,7 @@ class MediaServer {
 
   private:
     bool TryLoopback();
+    bool ServeLoopback(GUPnPContext* context, std::string* error);
     void StartContextManager();
     static void OnContextAvailable(GUPnPContextManager* manager, GUPnPContext* context,
                                    gpointer self);
