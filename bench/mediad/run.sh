@@ -1,8 +1,9 @@
 #!/usr/bin/env bash
 # Benchmark of the indexer and the local media server: harmona-index over 10,000 tiny files (first run and unchanged re-run), and
-# Browse of a container of BROWSE_TRACKS (default 100,000) tracks, whole and a page of 50, against
-# MiniDLNA serving the same files in the same run. Runs in a private mount and network namespace.
-#   bench/mediad/run.sh [BUILD_DIR]      (as root; needs sox, minidlna, python3, curl)
+# Browse of a container of BROWSE_TRACKS (default 100,000) tracks, whole, fetched as a client must
+# (paged) and a page of 50, and BrowseMetadata of the root, against MiniDLNA and Gerbera serving the
+# same files in the same run. Runs in a private mount and network namespace.
+#   bench/mediad/run.sh [BUILD_DIR]      (as root; needs sox, minidlna, gerbera, python3, curl)
 set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd)
 build=$(cd "${1:-$here/../../build}" && pwd)
@@ -51,10 +52,18 @@ friendly_name=bench
 CONF
 t0=$(seconds)
 minidlnad -f /tmp/minidlna.conf -P /tmp/minidlna.pid -S -R >/tmp/minidlna/stdout.log 2>&1 & minidlna=$!
-trap 'kill $mediad $minidlna 2>/dev/null || true' EXIT
+with_gerbera=${GERBERA:-1}  # GERBERA=0: MiniDLNA only (Gerbera 1.1 needs hours for 100,000 objects)
+gerbera=
+gerbera_start=$(seconds)
+if [[ "$with_gerbera" == 1 ]]; then
+    mkdir -p /tmp/gerbera
+    gerbera -m /tmp/gerbera -f gerbera -e hm0 -p 49152 -a /volume1/music >/tmp/gerbera/stdout.log 2>&1 &
+    gerbera=$!
+fi
+trap 'kill $mediad $minidlna $gerbera 2>/dev/null || true' EXIT
 
-soap() {  # url object start count
-    printf '<?xml version="1.0"?><s:Envelope xmlns:s="http://schemas.xmlsoap.org/soap/envelope/" s:encodingStyle="http://schemas.xmlsoap.org/soap/encoding/"><s:Body><u:Browse xmlns:u="urn:schemas-upnp-org:service:ContentDirectory:1"><ObjectID>%s</ObjectID><BrowseFlag>BrowseDirectChildren</BrowseFlag><Filter>*</Filter><StartingIndex>%s</StartingIndex><RequestedCount>%s</RequestedCount><SortCriteria></SortCriteria></u:Browse></s:Body></s:Envelope>' "$2" "$3" "$4" |
+soap() {  # url object start count [flag]
+    printf '<?xml version="1.0"?><s:Envelope xmlns:s="http://schemas.xmlsoap.org/soap/envelope/" s:encodingStyle="http://schemas.xmlsoap.org/soap/encoding/"><s:Body><u:Browse xmlns:u="urn:schemas-upnp-org:service:ContentDirectory:1"><ObjectID>%s</ObjectID><BrowseFlag>'"${5:-BrowseDirectChildren}"'</BrowseFlag><Filter>*</Filter><StartingIndex>%s</StartingIndex><RequestedCount>%s</RequestedCount><SortCriteria></SortCriteria></u:Browse></s:Body></s:Envelope>' "$2" "$3" "$4" |
     curl -s -m 120 -o /tmp/reply.xml -w '%{time_total}' -H 'Content-Type: text/xml; charset="utf-8"' \
         -H 'SOAPACTION: "urn:schemas-upnp-org:service:ContentDirectory:1#Browse"' --data-binary @- "$1"
 }
@@ -72,36 +81,64 @@ for _ in $(seq 1 900); do
 done
 t1=$(seconds)
 echo "MiniDLNA scan of $browse_tracks files: $(python3 -c "print('%.1f' % ($t1-$t0))") s (TotalMatches $(total))"
+# Gerbera's ids are its own: its "All Audio" is found by title; wait for its import too.
+gerbera_url=http://192.0.2.1:49152/upnp/control/cds
+gerbera_all=""
+for _ in $(seq 1 $((with_gerbera == 1 ? 1800 : 0))); do
+    [[ -z "$gerbera_all" ]] && gerbera_all=$(python3 "$here/find_container.py" "$gerbera_url" Audio "All Audio" 2>/dev/null)
+    if [[ -n "$gerbera_all" ]]; then
+        soap "$gerbera_url" "$gerbera_all" 0 1 >/dev/null 2>&1 || true
+        [[ "$(total)" == "$browse_tracks" ]] && break
+    fi
+    sleep 1
+done
+t2=$(seconds)
+[[ "$with_gerbera" == 1 ]] && echo "Gerbera import of $browse_tracks files: $(python3 -c "print('%.1f' % ($t2-$gerbera_start))") s (All Audio $gerbera_all, TotalMatches $(total))"
 
 median() { sort -n | awk '{a[NR]=$1} END {print a[int((NR+1)/2)]}'; }
-measure() {  # label url object start count
+measure() {  # label url object start count [flag [repeats]]
     local times=() t
-    for _ in $(seq 1 "$repeats"); do t=$(soap "$2" "$3" "$4" "$5"); times+=("$t"); done
+    for _ in $(seq 1 "${7:-$repeats}"); do t=$(soap "$2" "$3" "$4" "$5" "${6:-}"); times+=("$t"); done
     printf '%-34s median %6.3f s  (returned %s of %s, %s bytes)\n' "$1" \
         "$(printf '%s\n' "${times[@]}" | median)" "$(returned)" "$(total)" "$(stat -c %s /tmp/reply.xml)"
 }
 # The whole list as a client gets it: RequestedCount 0, then again from the next index while fewer
 # than TotalMatches have arrived (as the browse library does; MiniDLNA cuts replies at 2 MiB).
-fetch_all() {  # url object -> seconds requests
+fetch_all() {  # url object [page size, 0: as many as the server gives] -> seconds requests objects
     local got=0 requests=0 sum=0 t
     while :; do
-        t=$(soap "$1" "$2" "$got" 0); requests=$((requests + 1))
+        t=$(soap "$1" "$2" "$got" "${3:-0}"); requests=$((requests + 1))
         sum=$(python3 -c "print($sum + $t)")
         got=$((got + $(returned)))
         [[ "$(returned)" == 0 || "$got" -ge "$(total)" ]] && break
     done
     echo "$sum $requests $got"
 }
-measure_all() {  # label url object
+measure_all() {  # label url object [page size [repeats]]
     local runs=() line
-    for _ in $(seq 1 "$repeats"); do line=$(fetch_all "$2" "$3"); runs+=("$line"); done
-    printf '%-34s median %6.3f s  (%s requests, %s objects)\n' "$1" \
-        "$(printf '%s\n' "${runs[@]}" | awk '{print $1}' | median)" \
-        "$(echo "${runs[0]}" | awk '{print $2}')" "$(echo "${runs[0]}" | awk '{print $3}')"
+    for _ in $(seq 1 "${5:-$repeats}"); do line=$(fetch_all "$2" "$3" "${4:-0}"); runs+=("$line"); done
+    local seconds objects
+    seconds=$(printf '%s\n' "${runs[@]}" | awk '{print $1}' | median)
+    objects=$(echo "${runs[0]}" | awk '{print $3}')
+    printf '%-34s median %6.3f s  (%s requests, %s objects, %s us per object)\n' "$1" "$seconds" \
+        "$(echo "${runs[0]}" | awk '{print $2}')" "$objects" \
+        "$(python3 -c "print('%.2f' % ($seconds * 1e6 / max($objects, 1)))")"
 }
 measure "harmona-mediad whole list" "$ours" music_all 0 0
 measure "MiniDLNA whole list (one reply)" "$theirs" '1$4' 0 0
+# Gerbera 1.1 answers in milliseconds per object (RequestedCount 0 over thousands of objects runs
+# past curl's 120 s): it is measured in pages only, one run of each of its rows.
 measure_all "harmona-mediad all, paged" "$ours" music_all
 measure_all "MiniDLNA all, paged" "$theirs" '1$4'
-measure "harmona-mediad page of 50" "$ours" music_all 50000 50
-measure "MiniDLNA page of 50" "$theirs" '1$4' 50000 50
+page=${PAGE_SIZE:-500}
+measure_all "harmona-mediad all, pages of $page" "$ours" music_all "$page"
+measure_all "MiniDLNA all, pages of $page" "$theirs" '1$4' "$page"
+[[ "$with_gerbera" == 1 ]] && measure_all "Gerbera all, pages of $page" "$gerbera_url" "$gerbera_all" "$page" 1
+half=$((browse_tracks / 2))
+measure "harmona-mediad page of 50" "$ours" music_all "$half" 50
+measure "MiniDLNA page of 50" "$theirs" '1$4' "$half" 50
+[[ "$with_gerbera" == 1 ]] && measure "Gerbera page of 50" "$gerbera_url" "$gerbera_all" "$half" 50 "" 1
+measure "harmona-mediad BrowseMetadata 0" "$ours" 0 0 0 BrowseMetadata
+measure "MiniDLNA BrowseMetadata 0" "$theirs" 0 0 0 BrowseMetadata
+[[ "$with_gerbera" == 1 ]] && measure "Gerbera BrowseMetadata 0" "$gerbera_url" 0 0 0 BrowseMetadata 1
+true

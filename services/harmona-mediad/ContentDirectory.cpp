@@ -347,6 +347,16 @@ std::string ContentDirectory::ContainerUpdateIds() const {
     return containerUpdateIds_;
 }
 
+uint32_t ContentDirectory::LoadedSystemUpdateId() const {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return view_ ? view_->updateId() : 0;
+}
+
+std::string ContentDirectory::LoadedContainerUpdateIds() const {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return containerUpdateIds_;
+}
+
 BrowseResult ContentDirectory::Browse(const BrowseArgs& args) const {
     std::vector<SortField> sort;
     if (!ParseSortCriteria(args.sortCriteria, &sort))

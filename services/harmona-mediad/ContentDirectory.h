@@ -90,6 +90,12 @@ class ContentDirectory {
     // whose content changed; "" before any change was seen.
     std::string ContainerUpdateIds() const;
 
+    // The same two values of the state loaded last, without loading a changed library: for a
+    // caller on a thread that must not wait a second for a load (a network main loop). Another
+    // thread keeps the state current by calling SystemUpdateId().
+    uint32_t LoadedSystemUpdateId() const;
+    std::string LoadedContainerUpdateIds() const;
+
     // The file of track `id` as the index has it; false when there is no such track.
     bool LookUpTrackFile(int64_t id, std::string* path) const;
     bool LookUpTrack(int64_t id, TrackFile* file) const;

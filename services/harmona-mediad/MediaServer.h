@@ -1,56 +1,123 @@
-// harmona-mediad's UPnP side: a MediaServer:1 root device on libupnp with ContentDirectory:1 and
-// ConnectionManager:1, the SCPDs and the library's audio files served by libupnp's web server
-// (virtual folders "/upnp" and "/media"; HTTP GET with Range is libupnp's).
+// harmona-mediad's network side on GUPnP: the same MediaServer:1 device on 127.0.0.1 (the CGI's
+// fixed endpoint, served directly) and on every LAN interface GUPnP's context manager reports,
+// following interfaces as they come, go and change address. Nothing here ends the process when
+// the network is not ready: a context that cannot be made is logged and tried again.
 #pragma once
 
+#include <libgupnp/gupnp.h>
+
+#include <functional>
+#include <map>
 #include <memory>
 #include <string>
+#include <vector>
 
+#include "ConnectionManagerService.h"
 #include "ContentDirectory.h"
-#include "LoopbackRelay.h"
-#include "upnp/UpnpLibrary.h"
-#include "upnp/UpnpRootDevice.h"
+#include "ContentDirectoryService.h"
+#include "MediaFileServer.h"
+#include "SubscriptionGuard.h"
+#include "gupnp/MainLoop.h"
+#include "gupnp/Object.h"
+#include "gupnp/Signal.h"
 
 namespace harmona::mediad {
 
-// The fixed port the CGI connects to on 127.0.0.1 (platform/README.md, "Fixed paths").
+// The fixed port the CGI connects to on 127.0.0.1 (platform/README.md, "Fixed paths"); the LAN
+// interfaces use it too.
 inline constexpr unsigned short kMediaServerPort = 50003;
-inline constexpr int kAdvertisementSeconds = 1800;
 
 struct MediaServerOptions {
-    const char* interfaceName = nullptr;  // nullptr: libupnp's first suitable interface
+    const char* interfaceName = nullptr;  // nullptr: every interface the context manager finds
     unsigned short port = kMediaServerPort;
     std::string dbPath;
     std::string sharePath;
+    std::string descriptionFolder;  // written by WriteDescriptionFolder
+};
+
+// Everything served on one context (one interface address): the root device with its two
+// services, the files and the subscription guard.
+class ServedContext {
+  public:
+    // The device goes on the network (and `onAvailable` runs) once GUPnP has read the
+    // ContentDirectory's own description: before that its first events would be empty.
+    static std::unique_ptr<ServedContext> Create(GUPnPContext* context,
+                                                 const MediaServerOptions& options,
+                                                 std::shared_ptr<ContentDirectory> directory,
+                                                 std::function<void(ServedContext&)> onAvailable,
+                                                 std::string* error);
+    ~ServedContext();
+
+    const std::string& address() const { return address_; }
+    const std::string& interfaceName() const { return interface_; }
+    // Sends the alive set again (after start and after network changes; not only at the
+    // periodic renewal GSSDP does on its own).
+    void AnnounceAgain();
+    // Announces now and a few more times over the next half minute.
+    void ScheduleAnnouncements();
+    void SayByeBye();
+    void NotifyIfLibraryChanged();
+    // Whether SSDP multicast can leave this context's interface; logged when that changes.
+    void CheckMulticast();
+
+  private:
+    ServedContext() = default;
+    static void OnIntrospected(GObject* service, GAsyncResult* result, gpointer self);
+    void BecomeAvailable();
+
+    gupnp::ObjectRef<GUPnPContext> context_;
+    std::string address_, interface_;
+    std::shared_ptr<ContentDirectory> directory_;
+    gupnp::ObjectRef<GUPnPRootDevice> device_;
+    std::unique_ptr<ContentDirectoryService> contentDirectoryService_;
+    std::unique_ptr<ConnectionManagerService> connectionManagerService_;
+    std::unique_ptr<MediaFileServer> files_;
+    std::unique_ptr<SubscriptionGuard> guard_;
+    std::vector<gupnp::Source> announcements_;
+    gupnp::ObjectRef<GCancellable> introspection_;
+    std::function<void(ServedContext&)> onAvailable_;
+    bool multicastOk_ = true;
 };
 
 class MediaServer {
   public:
-    MediaServer() = default;
-    ~MediaServer() { Stop(); }
+    explicit MediaServer(MediaServerOptions options);
+    ~MediaServer();
     MediaServer(const MediaServer&) = delete;
     MediaServer& operator=(const MediaServer&) = delete;
 
-    // Starts libupnp on the fixed port, registers the device and announces it. False with `error`
-    // set when any step fails (nothing stays registered then).
-    bool Start(const MediaServerOptions& options, std::string* error);
-    // Says byebye and stops libupnp.
-    void Stop();
-
-    // Called by libupnp's threads.
-    int OnDeviceEvent(int eventType, const void* event);
-    const ContentDirectory* contentDirectory() const { return contentDirectory_.get(); }
-    const std::string& udn() const { return udn_; }
+    // Starts serving on loopback (retried every 2 s while it fails) and on the LAN (as the
+    // context manager reports interfaces). `onLoopbackReady` runs once, when 127.0.0.1 serves.
+    void Start(std::function<void()> onLoopbackReady);
+    // Byebye on every context.
+    void SayByeBye();
 
   private:
-    std::unique_ptr<upnp::UpnpLibrary> library_;
-    upnp::UpnpRootDevice device_;
-    LoopbackRelay loopbackRelay_;
-    std::unique_ptr<ContentDirectory> contentDirectory_;
-    std::string udn_;
-};
+    bool TryLoopback();
+    bool ServeLoopback(GUPnPContext* context, std::string* error);
+    void StartContextManager();
+    static void OnContextAvailable(GUPnPContextManager* manager, GUPnPContext* context,
+                                   gpointer self);
+    static void OnContextUnavailable(GUPnPContextManager* manager, GUPnPContext* context,
+                                     gpointer self);
+    void ForEachContext(const std::function<void(ServedContext&)>& action);
+    void RefreshLibrary();
 
-// The device description registered with libupnp (URLBase is added by libupnp).
-std::string DeviceDescription(const std::string& udn, const std::string& friendlyName);
+    MediaServerOptions options_;
+    // One content tree for every context (each gives its own file server's URL per Browse).
+    std::shared_ptr<ContentDirectory> directory_;
+    // Set while a thread loads a changed library; cleared back on the main loop.
+    bool refreshing_ = false;
+    // Lets a load that ends after this server went know that it did.
+    std::shared_ptr<bool> alive_ = std::make_shared<bool>(true);
+    std::function<void()> onLoopbackReady_;
+    std::unique_ptr<ServedContext> loopback_;
+    std::map<GUPnPContext*, std::unique_ptr<ServedContext>> lan_;
+    gupnp::ObjectRef<GUPnPContextManager> manager_;
+    std::vector<gupnp::SignalConnection> managerSignals_;
+    gupnp::Source loopbackRetry_;
+    gupnp::Source libraryWatch_;
+    gupnp::Source multicastWatch_;
+};
 
 }  // namespace harmona::mediad

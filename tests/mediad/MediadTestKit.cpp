@@ -1,13 +1,19 @@
 #include "MediadTestKit.h"
 
+#include <arpa/inet.h>
 #include <curl/curl.h>
+#include <netinet/in.h>
+#include <poll.h>
 #include <signal.h>
+#include <sys/socket.h>
 #include <sys/wait.h>
 #include <taglib/fileref.h>
 #include <taglib/tag.h>
 #include <taglib/tpropertymap.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <cctype>
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
@@ -185,7 +191,6 @@ void SetUpNetwork() {
 }
 
 bool ServerProcess::Start() {
-    SetUpNetwork();
     pid_ = fork();
     if (pid_ == 0) {
         execl(HARMONA_MEDIAD_PATH, HARMONA_MEDIAD_PATH, "--interface", kInterface,
@@ -282,6 +287,8 @@ HttpReply HttpGet(const std::string& url, const std::string& range) {
     curl_easy_setopt(curl, CURLOPT_URL, url.c_str());
     curl_easy_setopt(curl, CURLOPT_WRITEFUNCTION, Collect);
     curl_easy_setopt(curl, CURLOPT_WRITEDATA, &reply.body);
+    curl_easy_setopt(curl, CURLOPT_HEADERFUNCTION, Collect);
+    curl_easy_setopt(curl, CURLOPT_HEADERDATA, &reply.headers);
     curl_easy_setopt(curl, CURLOPT_TIMEOUT, 30L);
     if (!range.empty())
         curl_easy_setopt(curl, CURLOPT_RANGE, range.c_str());
@@ -293,6 +300,55 @@ HttpReply HttpGet(const std::string& url, const std::string& range) {
     }
     curl_easy_cleanup(curl);
     return reply;
+}
+
+std::string RawHttpExchange(const std::string& address, unsigned short port,
+                            const std::string& request, int waitMs,
+                            const std::string& sourceAddress) {
+    const int s = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    if (s < 0)
+        return "";
+    if (!sourceAddress.empty()) {
+        sockaddr_in local{};
+        local.sin_family = AF_INET;
+        inet_pton(AF_INET, sourceAddress.c_str(), &local.sin_addr);
+        bind(s, reinterpret_cast<sockaddr*>(&local), sizeof(local));
+    }
+    sockaddr_in server{};
+    server.sin_family = AF_INET;
+    server.sin_port = htons(port);
+    inet_pton(AF_INET, address.c_str(), &server.sin_addr);
+    std::string answer;
+    if (connect(s, reinterpret_cast<sockaddr*>(&server), sizeof(server)) == 0 &&
+        send(s, request.data(), request.size(), MSG_NOSIGNAL) ==
+            static_cast<ssize_t>(request.size())) {
+        pollfd pfd{s, POLLIN, 0};
+        const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(waitMs);
+        while (std::chrono::steady_clock::now() < deadline) {
+            const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(
+                deadline - std::chrono::steady_clock::now());
+            if (poll(&pfd, 1, static_cast<int>(left.count()) + 1) <= 0)
+                break;
+            char buffer[4096];
+            const ssize_t got = recv(s, buffer, sizeof(buffer), 0);
+            if (got <= 0)
+                break;
+            answer.append(buffer, static_cast<std::size_t>(got));
+            // One response is enough: its headers and as many body bytes as it announced.
+            const std::size_t end = answer.find("\r\n\r\n");
+            if (end == std::string::npos)
+                continue;
+            std::string head = answer.substr(0, end);
+            std::transform(head.begin(), head.end(), head.begin(),
+                           [](unsigned char c) { return std::tolower(c); });
+            const std::size_t length = head.find("content-length:");
+            if (length != std::string::npos &&
+                answer.size() >= end + 4 + std::strtoul(head.c_str() + length + 15, nullptr, 10))
+                break;
+        }
+    }
+    close(s);
+    return answer;
 }
 
 }  // namespace harmona::test::mediad

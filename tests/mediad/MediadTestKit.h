@@ -1,8 +1,8 @@
 // The test kit of the indexer and media server tests: a generated audio share (sox makes the
 // files, TagLib writes their tags), the real harmona-index and harmona-mediad run as child
-// processes, a network of two veth ends in the test's namespace (libupnp will not run on
-// loopback), and an independent ContentDirectory client (a hand-written SOAP body over libcurl,
-// the reply read with pugixml).
+// processes (the server serves 127.0.0.1 by itself; tests of the LAN side add a network of two veth
+// ends in the test's namespace), and an independent ContentDirectory client (a hand-written SOAP
+// body over libcurl, the reply read with pugixml).
 #pragma once
 
 #include <sys/types.h>
@@ -41,7 +41,7 @@ struct IndexRun {
 IndexRun RunIndexer();
 
 // Two veth ends, hm0 (192.0.2.1, where the server runs) and hm1 (192.0.2.2), up, IPv6 off (its
-// duplicate address detection would delay libupnp's bind), multicast routed through hm0, and
+// duplicate address detection would only delay the test), multicast routed through hm0, and
 // packets between the two ends accepted although both addresses are local.
 void SetUpNetwork();
 
@@ -81,8 +81,15 @@ std::string SoapSimpleAction(const std::string& action, const std::string& outAr
 struct HttpReply {
     long status = 0;
     std::string contentType;
+    std::string headers;  // the response's header lines, as received
     std::string body;
 };
 HttpReply HttpGet(const std::string& url, const std::string& range = "");
+
+// Sends `request` as it stands over TCP to address:port and returns what came back before the
+// peer closed or `waitMs` passed ("" when nobody listens).
+std::string RawHttpExchange(const std::string& address, unsigned short port,
+                            const std::string& request, int waitMs = 3000,
+                            const std::string& sourceAddress = "");
 
 }  // namespace harmona::test::mediad

@@ -1,5 +1,6 @@
 #include "gupnp/MainLoop.h"
 
+#include <gio/gio.h>
 #include <glib-unix.h>
 
 namespace harmona::gupnp {
@@ -52,6 +53,33 @@ void Source::Remove() {
     if (context_ != nullptr)
         g_main_context_unref(std::exchange(context_, nullptr));
     callback_.reset();
+}
+
+namespace {
+
+struct ThreadJob {
+    std::function<void()> work;
+    std::function<void()> done;
+};
+
+void RunThreadJob(GTask* task, gpointer, gpointer data, GCancellable*) {
+    static_cast<ThreadJob*>(data)->work();
+    g_task_return_boolean(task, TRUE);
+}
+
+void FinishThreadJob(GObject*, GAsyncResult*, gpointer data) {
+    std::unique_ptr<ThreadJob> job(static_cast<ThreadJob*>(data));
+    job->done();
+}
+
+}  // namespace
+
+void RunInThread(std::function<void()> work, std::function<void()> done) {
+    auto* job = new ThreadJob{std::move(work), std::move(done)};
+    GTask* task = g_task_new(nullptr, nullptr, &FinishThreadJob, job);
+    g_task_set_task_data(task, job, nullptr);
+    g_task_run_in_thread(task, &RunThreadJob);
+    g_object_unref(task);
 }
 
 }  // namespace harmona::gupnp

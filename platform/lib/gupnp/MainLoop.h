@@ -69,4 +69,9 @@ class Source {
     std::unique_ptr<Callback> callback_;
 };
 
+// Runs `work` on a thread of GLib's pool, then `done` in the main context of the calling thread
+// (its loop must be running): for work that must not hold up a network loop, such as loading a
+// library or writing a large reply. Whatever both capture must stay valid until `done` ran.
+void RunInThread(std::function<void()> work, std::function<void()> done);
+
 }  // namespace harmona::gupnp

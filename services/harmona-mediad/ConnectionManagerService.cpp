@@ -1,0 +1,75 @@
+#include "ConnectionManagerService.h"
+
+#include <string>
+
+#include "gupnp/ServiceAction.h"
+
+namespace harmona::mediad {
+namespace {
+
+constexpr int kErrorInvalidAction = 401;
+constexpr int kErrorInvalidConnection = 706;
+
+constexpr const char* kSourceProtocols =
+    "http-get:*:audio/mpeg:*,http-get:*:audio/mp4:*,http-get:*:audio/aac:*,"
+    "http-get:*:audio/ogg:*,http-get:*:audio/flac:*,http-get:*:audio/wav:*,"
+    "http-get:*:audio/aiff:*,http-get:*:audio/x-ms-wma:*,http-get:*:audio/ac3:*,"
+    "http-get:*:audio/x-ape:*,http-get:*:audio/x-pn-realaudio:*";
+
+void CurrentConnectionInfo(gupnp::ServiceAction& action) {
+    if (action.Argument("ConnectionID").value_or("") != "0") {
+        action.ReturnError(kErrorInvalidConnection, "Invalid connection reference");
+        return;
+    }
+    action.SetString("RcsID", "-1");
+    action.SetString("AVTransportID", "-1");
+    action.SetString("ProtocolInfo", "");
+    action.SetString("PeerConnectionManager", "");
+    action.SetString("PeerConnectionID", "-1");
+    action.SetString("Direction", "Output");
+    action.SetString("Status", "OK");
+    action.ReturnSuccess();
+}
+
+}  // namespace
+
+ConnectionManagerService::ConnectionManagerService(GUPnPService* service)
+    : service_(gupnp::ObjectRef<GUPnPService>::Share(service)) {
+    // GUPnP answers 401 itself unless a handler is connected for the action's own detail.
+    for (const char* action :
+         {"action-invoked::GetProtocolInfo", "action-invoked::GetCurrentConnectionIDs",
+          "action-invoked::GetCurrentConnectionInfo"})
+        connections_.emplace_back(service, action, G_CALLBACK(&OnAction), this);
+    connections_.emplace_back(service, "query-variable", G_CALLBACK(&OnQueryVariable), this);
+}
+
+void ConnectionManagerService::OnAction(GUPnPService*, GUPnPServiceAction* invoked, gpointer) {
+    gupnp::ServiceAction action(invoked);
+    const std::string name = action.name() != nullptr ? action.name() : "";
+    if (name == "GetProtocolInfo") {
+        action.SetString("Source", kSourceProtocols);
+        action.SetString("Sink", "");
+        action.ReturnSuccess();
+    } else if (name == "GetCurrentConnectionIDs") {
+        action.SetString("ConnectionIDs", "0");
+        action.ReturnSuccess();
+    } else if (name == "GetCurrentConnectionInfo") {
+        CurrentConnectionInfo(action);
+    } else {
+        action.ReturnError(kErrorInvalidAction, "Invalid Action");
+    }
+}
+
+void ConnectionManagerService::OnQueryVariable(GUPnPService*, const char* variable, GValue* value,
+                                               gpointer) {
+    const std::string name = variable != nullptr ? variable : "";
+    g_value_init(value, G_TYPE_STRING);
+    if (name == "SourceProtocolInfo")
+        g_value_set_string(value, kSourceProtocols);
+    else if (name == "CurrentConnectionIDs")
+        g_value_set_string(value, "0");
+    else
+        g_value_set_string(value, "");
+}
+
+}  // namespace harmona::mediad

@@ -1,0 +1,144 @@
+#include "ContentDirectoryService.h"
+
+#include <cstdlib>
+#include <memory>
+#include <string>
+#include <utility>
+
+#include "gupnp/MainLoop.h"
+#include "gupnp/ServiceAction.h"
+
+namespace harmona::mediad {
+namespace {
+
+constexpr int kErrorInvalidAction = 401;
+
+bool ParseUnsigned(const std::string& text, uint32_t* value) {
+    std::string digits = text;
+    digits.erase(0, digits.find_first_not_of(" \t\r\n"));
+    digits.erase(digits.find_last_not_of(" \t\r\n") + 1);
+    if (digits.empty() || digits.size() > 10 ||
+        digits.find_first_not_of("0123456789") != std::string::npos)
+        return false;
+    const unsigned long long parsed = std::strtoull(digits.c_str(), nullptr, 10);
+    if (parsed > 0xffffffffULL)
+        return false;
+    *value = static_cast<uint32_t>(parsed);
+    return true;
+}
+
+// The Browse arguments; false when one is missing or malformed (the client gets 402).
+bool ReadBrowseArgs(const gupnp::ServiceAction& action, BrowseArgs* args) {
+    const auto objectId = action.Argument("ObjectID");
+    const auto flag = action.Argument("BrowseFlag");
+    if (!objectId || !flag || (*flag != "BrowseMetadata" && *flag != "BrowseDirectChildren"))
+        return false;
+    args->objectId = *objectId;
+    args->metadata = *flag == "BrowseMetadata";
+    args->sortCriteria = action.Argument("SortCriteria").value_or("");
+    const auto start = action.Argument("StartingIndex");
+    const auto count = action.Argument("RequestedCount");
+    return (!start || ParseUnsigned(*start, &args->startingIndex)) &&
+           (!count || ParseUnsigned(*count, &args->requestedCount));
+}
+
+// The answer to a Browse, back on the main loop.
+void AnswerBrowse(gupnp::ServiceAction& action, const BrowseResult& result) {
+    if (result.error != 0) {
+        action.ReturnError(result.error, result.errorText);
+        return;
+    }
+    action.SetString("Result", result.didl);
+    action.SetUnsigned("NumberReturned", result.numberReturned);
+    action.SetUnsigned("TotalMatches", result.totalMatches);
+    action.SetUnsigned("UpdateID", result.updateId);
+    action.ReturnSuccess();
+}
+
+void Browse(const std::shared_ptr<const ContentDirectory>& directory,
+            const std::string& mediaBaseUrl, gupnp::ServiceAction&& action) {
+    BrowseArgs args;
+    args.mediaBaseUrl = mediaBaseUrl;
+    if (!ReadBrowseArgs(action, &args)) {
+        action.ReturnError(kErrorInvalidArgs, "Invalid Args");
+        return;
+    }
+    // A Browse may load a changed library or write a large reply: never on the main loop.
+    auto call = std::make_shared<std::pair<gupnp::ServiceAction, BrowseResult>>(std::move(action),
+                                                                                BrowseResult{});
+    gupnp::RunInThread(
+        [directory, args = std::move(args), call] { call->second = directory->Browse(args); },
+        [call] { AnswerBrowse(call->first, call->second); });
+}
+
+// GetSystemUpdateID answers the library as it is now, which may need a load: in a thread too.
+void GetSystemUpdateId(const std::shared_ptr<const ContentDirectory>& directory,
+                       gupnp::ServiceAction&& action) {
+    auto call = std::make_shared<std::pair<gupnp::ServiceAction, uint32_t>>(std::move(action), 0);
+    gupnp::RunInThread([directory, call] { call->second = directory->SystemUpdateId(); },
+                       [call] {
+                           call->first.SetUnsigned("Id", call->second);
+                           call->first.ReturnSuccess();
+                       });
+}
+
+}  // namespace
+
+ContentDirectoryService::ContentDirectoryService(GUPnPService* service,
+                                                 std::shared_ptr<const ContentDirectory> directory,
+                                                 std::string mediaBaseUrl)
+    : service_(gupnp::ObjectRef<GUPnPService>::Share(service)),
+      directory_(std::move(directory)),
+      mediaBaseUrl_(std::move(mediaBaseUrl)),
+      announcedUpdateId_(directory_->LoadedSystemUpdateId()) {
+    // GUPnP answers 401 itself unless a handler is connected for the action's own detail.
+    for (const char* action :
+         {"action-invoked::Browse", "action-invoked::GetSearchCapabilities",
+          "action-invoked::GetSortCapabilities", "action-invoked::GetSystemUpdateID"})
+        connections_.emplace_back(service, action, G_CALLBACK(&OnAction), this);
+    connections_.emplace_back(service, "query-variable", G_CALLBACK(&OnQueryVariable), this);
+}
+
+void ContentDirectoryService::OnAction(GUPnPService*, GUPnPServiceAction* invoked, gpointer self) {
+    auto* me = static_cast<ContentDirectoryService*>(self);
+    gupnp::ServiceAction action(invoked);
+    const std::string name = action.name() != nullptr ? action.name() : "";
+    if (name == "Browse") {
+        Browse(me->directory_, me->mediaBaseUrl_, std::move(action));
+    } else if (name == "GetSearchCapabilities") {
+        action.SetString("SearchCaps", kSearchCapabilities);
+        action.ReturnSuccess();
+    } else if (name == "GetSortCapabilities") {
+        action.SetString("SortCaps", kSortCapabilities);
+        action.ReturnSuccess();
+    } else if (name == "GetSystemUpdateID") {
+        GetSystemUpdateId(me->directory_, std::move(action));
+    } else {
+        action.ReturnError(kErrorInvalidAction, "Invalid Action");
+    }
+}
+
+void ContentDirectoryService::OnQueryVariable(GUPnPService*, const char* variable, GValue* value,
+                                              gpointer self) {
+    auto* me = static_cast<ContentDirectoryService*>(self);
+    const std::string name = variable != nullptr ? variable : "";
+    if (name == "SystemUpdateID") {
+        g_value_init(value, G_TYPE_UINT);
+        g_value_set_uint(value, me->directory_->LoadedSystemUpdateId());
+    } else if (name == "ContainerUpdateIDs") {
+        g_value_init(value, G_TYPE_STRING);
+        g_value_set_string(value, me->directory_->LoadedContainerUpdateIds().c_str());
+    }
+}
+
+void ContentDirectoryService::NotifyIfChanged() {
+    const uint32_t updateId = directory_->LoadedSystemUpdateId();
+    if (updateId == announcedUpdateId_)
+        return;
+    announcedUpdateId_ = updateId;
+    const std::string containers = directory_->LoadedContainerUpdateIds();
+    gupnp_service_notify(service_.get(), "SystemUpdateID", G_TYPE_UINT, updateId,
+                         "ContainerUpdateIDs", G_TYPE_STRING, containers.c_str(), nullptr);
+}
+
+}  // namespace harmona::mediad

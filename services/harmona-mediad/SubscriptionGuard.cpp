@@ -1,0 +1,134 @@
+#include "SubscriptionGuard.h"
+
+#include <syslog.h>
+
+#include <cstdlib>
+#include <cstring>
+
+namespace harmona::mediad {
+namespace {
+
+constexpr auto kDefaultLease = std::chrono::seconds(300);
+
+// "http://host:port/path" -> "host" (brackets of an IPv6 literal removed); "" when malformed.
+std::string HostOfCallback(const std::string& url) {
+    GUri* uri = g_uri_parse(url.c_str(), G_URI_FLAGS_NONE, nullptr);
+    if (uri == nullptr)
+        return "";
+    std::string host;
+    if (g_strcmp0(g_uri_get_scheme(uri), "http") == 0 && g_uri_get_host(uri) != nullptr)
+        host = g_uri_get_host(uri);
+    g_uri_unref(uri);
+    return host;
+}
+
+// "Second-1800" -> 1800 s; anything else the lease GUPnP grants.
+std::chrono::seconds LeaseOf(const char* timeout) {
+    if (timeout != nullptr && std::strncmp(timeout, "Second-", 7) == 0) {
+        const long seconds = std::atol(timeout + 7);
+        if (seconds > 0 && seconds < 86400)
+            return std::chrono::seconds(seconds);
+    }
+    return kDefaultLease;
+}
+
+bool IsMethod(SoupServerMessage* message, const char* method) {
+    return std::strcmp(soup_server_message_get_method(message), method) == 0;
+}
+
+}  // namespace
+
+bool CallbacksNameThePeer(const std::string& callbackHeader, const std::string& peer) {
+    std::size_t count = 0;
+    std::size_t at = 0;
+    while ((at = callbackHeader.find('<', at)) != std::string::npos) {
+        const std::size_t end = callbackHeader.find('>', at);
+        if (end == std::string::npos)
+            return false;
+        const std::string host = HostOfCallback(callbackHeader.substr(at + 1, end - at - 1));
+        if (host.empty() || host != peer)
+            return false;
+        ++count;
+        at = end + 1;
+    }
+    return count > 0 && !peer.empty();
+}
+
+SubscriptionGuard::SubscriptionGuard(GUPnPContext* context)
+    : where_(gssdp_client_get_host_ip(GSSDP_CLIENT(context)) != nullptr
+                 ? gssdp_client_get_host_ip(GSSDP_CLIENT(context))
+                 : "?") {
+    SoupServer* server = gupnp_context_get_server(context);
+    requestRead_ =
+        gupnp::SignalConnection(server, "request-read", G_CALLBACK(&OnRequestRead), this);
+    requestFinished_ =
+        gupnp::SignalConnection(server, "request-finished", G_CALLBACK(&OnRequestFinished), this);
+}
+
+std::size_t SubscriptionGuard::active() {
+    ForgetExpired();
+    return subscriptions_.size();
+}
+
+void SubscriptionGuard::ForgetExpired() {
+    const auto now = std::chrono::steady_clock::now();
+    for (auto it = subscriptions_.begin(); it != subscriptions_.end();) {
+        if (it->second <= now)
+            it = subscriptions_.erase(it);
+        else
+            ++it;
+    }
+}
+
+// Runs after the request is read and before any handler: a status set here ends the request
+// with that status, GUPnP's handler is not called.
+void SubscriptionGuard::OnRequestRead(SoupServer*, SoupServerMessage* message, gpointer self) {
+    auto* me = static_cast<SubscriptionGuard*>(self);
+    if (!IsMethod(message, "SUBSCRIBE"))
+        return;
+    SoupMessageHeaders* headers = soup_server_message_get_request_headers(message);
+    const char* callback = soup_message_headers_get_one(headers, "Callback");
+    if (callback == nullptr || soup_message_headers_get_one(headers, "SID") != nullptr)
+        return;  // a renewal, or a malformed request GUPnP answers itself
+    const char* peer = soup_server_message_get_remote_host(message);
+    const std::string peerText = peer != nullptr ? peer : "";
+    if (!CallbacksNameThePeer(callback, peerText)) {
+        syslog(LOG_WARNING,
+               "refused a subscription on %s from %s: callback %.200s is not the "
+               "subscriber's own address",
+               me->where_.c_str(), peerText.c_str(), callback);
+        soup_server_message_set_status(message, SOUP_STATUS_PRECONDITION_FAILED,
+                                       "Callback must name the subscriber's own address");
+        return;
+    }
+    if (me->active() >= kMaxSubscriptions) {
+        syslog(LOG_WARNING, "refused a subscription on %s from %s: %zu subscriptions active",
+               me->where_.c_str(), peerText.c_str(), kMaxSubscriptions);
+        soup_server_message_set_status(message, SOUP_STATUS_SERVICE_UNAVAILABLE,
+                                       "Too many subscriptions");
+    }
+}
+
+// Keeps the count of what GUPnP granted: new and renewed leases, and ended ones.
+void SubscriptionGuard::OnRequestFinished(SoupServer*, SoupServerMessage* message, gpointer self) {
+    auto* me = static_cast<SubscriptionGuard*>(self);
+    const bool subscribe = IsMethod(message, "SUBSCRIBE");
+    if (!subscribe && !IsMethod(message, "UNSUBSCRIBE"))
+        return;
+    if (soup_server_message_get_status(message) != SOUP_STATUS_OK)
+        return;
+    if (subscribe) {
+        SoupMessageHeaders* response = soup_server_message_get_response_headers(message);
+        const char* sid = soup_message_headers_get_one(response, "SID");
+        if (sid != nullptr)
+            me->subscriptions_[sid] = std::chrono::steady_clock::now() +
+                                      LeaseOf(soup_message_headers_get_one(response, "Timeout"));
+    } else {
+        const char* sid =
+            soup_message_headers_get_one(soup_server_message_get_request_headers(message), "SID");
+        if (sid != nullptr)
+            me->subscriptions_.erase(sid);
+    }
+}
+
+}  // namespace harmona::mediad
