@@ -50,6 +50,9 @@ enum ErrorLine : int {
 inline constexpr std::string_view kLibraryPrefix = "musiclib_";
 inline constexpr std::string_view kPersonalPrefix = "musiclib_music_personal/playlist/";
 inline constexpr std::string_view kSharedPrefix = "musiclib_music_shared/playlist/";
+// The playlist categories (and their smart playlists): no media server containers.
+inline constexpr std::string_view kPersonalCategory = "musiclib_music_personal";
+inline constexpr std::string_view kSharedCategory = "musiclib_music_shared";
 inline constexpr std::string_view kRandomNode = "musiclib_random";
 inline constexpr std::string_view kLibraryRootNode = "musiclib_root";
 inline constexpr const char* kRandomPlaylistPrefix = "/tmp/==DynaRandom100==.";
@@ -135,7 +138,7 @@ int LibraryApi::List(const std::string& node) {
     else if (node == kRandomNode)
         built = ListRandomPlaylist(reply);
     else if (StartsWith(node, kLibraryPrefix) && node != kLibraryRootNode &&
-             node.find('/') == std::string::npos)
+             !StartsWith(node, kPersonalCategory) && !StartsWith(node, kSharedCategory))
         built = ListBrowsedContainer(node.substr(kLibraryPrefix.size()), reply);
     else
         return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);

@@ -11,7 +11,8 @@ namespace {
 
 constexpr std::size_t kMaxTrackIdDigits = 18;
 constexpr std::size_t kMaxExtensionLength = 8;
-constexpr std::string_view kLocalMediaPrefix = "http://127.0.0.1:50003/media/";
+constexpr std::string_view kHttpScheme = "http://";
+constexpr std::string_view kMediaPath = "/media/";
 constexpr const char* kTrackColumns =
     "SELECT id, path, title, artist, album, duration_ms FROM track";
 
@@ -47,9 +48,13 @@ std::string StreamIdOf(std::int64_t trackId, const std::string& path) {
 }
 
 std::optional<std::int64_t> TrackIdOfLocalResource(const std::string& url) {
-    if (url.compare(0, kLocalMediaPrefix.size(), kLocalMediaPrefix) != 0)
+    // The server names itself by the address it announces on the network, so only the path counts.
+    if (url.compare(0, kHttpScheme.size(), kHttpScheme) != 0)
         return std::nullopt;
-    const std::optional<StreamName> name = ParseStreamId(url.substr(kLocalMediaPrefix.size()));
+    const std::size_t path = url.find('/', kHttpScheme.size());
+    if (path == std::string::npos || url.compare(path, kMediaPath.size(), kMediaPath) != 0)
+        return std::nullopt;
+    const std::optional<StreamName> name = ParseStreamId(url.substr(path + kMediaPath.size()));
     if (!name)
         return std::nullopt;
     return name->trackId;

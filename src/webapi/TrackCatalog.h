@@ -32,8 +32,8 @@ std::optional<StreamName> ParseStreamId(const std::string& stream);
 // The stream id of a track stored at `path`.
 std::string StreamIdOf(std::int64_t trackId, const std::string& path);
 
-// The track id in a media server resource URL of the local media server
-// ("http://127.0.0.1:50003/media/<stream id>"); nullopt for any other URL.
+// The track id in a resource URL of the local media server ("http://<its address>/media/<stream
+// id>"); nullopt for any other URL.
 std::optional<std::int64_t> TrackIdOfLocalResource(const std::string& url);
 
 class TrackCatalog {

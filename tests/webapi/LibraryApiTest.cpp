@@ -50,7 +50,7 @@ class LibraryApi : public ::testing::Test {
 TEST_F(LibraryApi, ContainerListsItsSubContainersAndItsTracksWithMetadataAndStreamIds) {
     MakeGeneratedLibrary(20);
     ContentTree tree;
-    tree.AddContainer("music_album", "album:1", "First Album");
+    tree.AddContainer("music_album", "album:A/First", "First Album");
     tree.AddItem("music_album", "7", "ignored: the library's title counts");
     tree.AddItem("music_album", "3", "x");
     server.ServeTree(tree);
@@ -62,7 +62,7 @@ TEST_F(LibraryApi, ContainerListsItsSubContainersAndItsTracksWithMetadataAndStre
     ASSERT_TRUE(r.jsonOk) << r.body;
     EXPECT_TRUE(r.json["success"].asBool());
     ASSERT_EQ(r.json["containers"].size(), 1u);
-    EXPECT_EQ(r.json["containers"][0]["node"].asString(), "musiclib_album:1");
+    EXPECT_EQ(r.json["containers"][0]["node"].asString(), "musiclib_album:A/First");
     EXPECT_EQ(r.json["containers"][0]["title"].asString(), "First Album");
     ASSERT_EQ(r.json["tracks"].size(), 2u);
     const Json::Value& first = r.json["tracks"][0];
@@ -83,19 +83,26 @@ TEST_F(LibraryApi, ItemsThatAreNotTracksOfTheLibraryAreCountedNotListed) {
     MakeGeneratedLibrary(5);
     ContentTree tree;
     tree.AddItem("music_all", "2", "in the library");
+    DidlObject announced;  // the server names itself by its network address
+    announced.container = false;
+    announced.id = "track:4";
+    announced.parentId = "music_all";
+    announced.title = "t";
+    announced.res = "http://192.0.2.1:50003/media/4.mp3";
+    tree.Add(announced);
     tree.AddItem("music_all", "99", "not in the library");
     DidlObject foreign;
     foreign.container = false;
     foreign.id = "x";
     foreign.parentId = "music_all";
     foreign.title = "elsewhere";
-    foreign.res = "http://192.0.2.1/media/1.mp3";
+    foreign.res = "http://192.0.2.1:50003/elsewhere/1.mp3";
     tree.Add(foreign);
     server.ServeTree(tree);
     ASSERT_TRUE(server.Start());
     const CgiResult r = ListNode("musiclib_music_all");
     ASSERT_TRUE(r.jsonOk) << r.body;
-    EXPECT_EQ(StreamsOf(r.json), std::vector<std::string>{"2.mp3"});
+    EXPECT_EQ(StreamsOf(r.json), (std::vector<std::string>{"2.mp3", "4.mp3"}));
     EXPECT_EQ(r.json["missing"].asInt(), 2);
 }
 
@@ -255,7 +262,8 @@ TEST_F(LibraryApi, UnknownActionsAndNodesGetClearErrors) {
     const CgiResult noAction = Api({});
     EXPECT_NE(noAction.Header("Status").find("400"), std::string::npos) << noAction.output;
     for (const char* node :
-         {"", "musiclib_root", "musiclib_a/b", "radio_x", "musiclib_music_shared/playlist/x"}) {
+         {"", "musiclib_root", "musiclib_music_personal", "musiclib_music_shared",
+          "musiclib_music_personal/smart/Jazz", "radio_x", "musiclib_music_shared/playlist/x"}) {
         const CgiResult r = ListNode(node);
         EXPECT_NE(r.Header("Status").find("404"), std::string::npos) << node << r.output;
         EXPECT_TRUE(r.jsonOk) << node;
