@@ -64,6 +64,9 @@ bool TrackCatalog::Open(const char* path) {
     library_ = playlist::OpenLibrary(path);
     if (library_.status != playlist::LibraryStatus::ok)
         return false;
+    // One read transaction for all the lookups of the request: a consistent view while the indexer
+    // writes, and no lock taken and dropped per track (thousands for a large container).
+    library_.db.Execute("BEGIN");
     byId_ = library_.db.Prepare(std::string(kTrackColumns) + " WHERE id = ?");
     byPath_ = library_.db.Prepare(std::string(kTrackColumns) + " WHERE path = ?");
     return byId_ && byPath_;
