@@ -197,16 +197,7 @@ int LibraryApi::ListPersonalPlaylist(const std::string& name, Json::Value& reply
         FindPersonalPlaylistFile(webMan.GetPreferenceDir() + "/playlists", name);
     if (file.empty())
         return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
-    const playlist::PlaylistFileEntries entries =
-        playlist::ReadPlaylistFile(file, medialib::AudioSharePath());
-    if (entries.status == playlist::PlaylistFileStatus::tooLarge)
-        return Fail(kTooLarge, kSystemSection, kSystemKey, kPlaylistTooLargeLine);
-    if (entries.status != playlist::PlaylistFileStatus::ok)
-        return Fail(kNotFound, kErrorSection, kNotFoundKey, kPlaylistUnreadableLine);
-    if (!OpenCatalog())
-        return Fail(kUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
-    AppendPlaylistTracks(entries.paths, reply);
-    return 1;
+    return ListPlaylistFile(file, reply);
 }
 
 int LibraryApi::ListSharedPlaylist(const std::string& id, Json::Value& reply) {
@@ -226,9 +217,13 @@ int LibraryApi::ListSharedPlaylist(const std::string& id, Json::Value& reply) {
 
 int LibraryApi::ListRandomPlaylist(Json::Value& reply) {
     // The file that "New Random 100" drew for this user; none yet is an empty list.
-    const playlist::PlaylistFileEntries entries = playlist::ReadPlaylistFile(
-        kRandomPlaylistPrefix + webMan.GetLoginUserName(), medialib::AudioSharePath());
-    if (entries.status == playlist::PlaylistFileStatus::missing)
+    return ListPlaylistFile(kRandomPlaylistPrefix + webMan.GetLoginUserName(), reply, true);
+}
+
+int LibraryApi::ListPlaylistFile(const std::string& file, Json::Value& reply, bool missingIsEmpty) {
+    const playlist::PlaylistFileEntries entries =
+        playlist::ReadPlaylistFile(file, medialib::AudioSharePath());
+    if (entries.status == playlist::PlaylistFileStatus::missing && missingIsEmpty)
         return 1;
     if (entries.status == playlist::PlaylistFileStatus::tooLarge)
         return Fail(kTooLarge, kSystemSection, kSystemKey, kPlaylistTooLargeLine);

@@ -30,6 +30,9 @@ class LibraryApi : public ActionHandler {
     int ListPersonalPlaylist(const std::string& name, Json::Value& reply);
     int ListSharedPlaylist(const std::string& id, Json::Value& reply);
     int ListRandomPlaylist(Json::Value& reply);
+    // The tracks of a playlist file (relative entries from the audio share); a missing file is an
+    // empty list when `missingIsEmpty`, else not found.
+    int ListPlaylistFile(const std::string& file, Json::Value& reply, bool missingIsEmpty = false);
     // The tracks of a playlist's paths, in order; paths the library does not hold are counted in
     // "missing" (their paths are never shown).
     void AppendPlaylistTracks(const std::vector<std::string>& paths, Json::Value& reply);

@@ -3,6 +3,9 @@
 // error replies.
 #include <gtest/gtest.h>
 
+#include <sys/stat.h>
+#include <unistd.h>
+
 #include <string>
 
 #include "CgiRunner.h"
@@ -39,6 +42,16 @@ void ExpectNoServerPath(const CgiResult& r) {
     EXPECT_EQ(r.body.find("/volume1"), std::string::npos) << r.body;
     EXPECT_EQ(r.body.find("/usr/vanu"), std::string::npos) << r.body;
     EXPECT_EQ(r.body.find("/tmp"), std::string::npos) << r.body;
+}
+
+DidlObject TrackObject(const std::string& parentId, const std::string& id, const std::string& res) {
+    DidlObject object;
+    object.container = false;
+    object.id = id;
+    object.parentId = parentId;
+    object.title = id;
+    object.res = res;
+    return object;
 }
 
 class LibraryApi : public ::testing::Test {
@@ -83,21 +96,10 @@ TEST_F(LibraryApi, ItemsThatAreNotTracksOfTheLibraryAreCountedNotListed) {
     MakeGeneratedLibrary(5);
     ContentTree tree;
     tree.AddItem("music_all", "2", "in the library");
-    DidlObject announced;  // the server names itself by its network address
-    announced.container = false;
-    announced.id = "track:4";
-    announced.parentId = "music_all";
-    announced.title = "t";
-    announced.res = "http://192.0.2.1:50003/media/4.mp3";
-    tree.Add(announced);
+    // The server names itself by its network address.
+    tree.Add(TrackObject("music_all", "track:4", "http://192.0.2.1:50003/media/4.mp3"));
     tree.AddItem("music_all", "99", "not in the library");
-    DidlObject foreign;
-    foreign.container = false;
-    foreign.id = "x";
-    foreign.parentId = "music_all";
-    foreign.title = "elsewhere";
-    foreign.res = "http://192.0.2.1:50003/elsewhere/1.mp3";
-    tree.Add(foreign);
+    tree.Add(TrackObject("music_all", "x", "http://192.0.2.1:50003/elsewhere/1.mp3"));
     server.ServeTree(tree);
     ASSERT_TRUE(server.Start());
     const CgiResult r = ListNode("musiclib_music_all");
@@ -144,6 +146,40 @@ TEST_F(LibraryApi, PersonalPlaylistNamesNeverLeaveThePlaylistsFolder) {
         ASSERT_TRUE(r.jsonOk) << r.body;
         EXPECT_FALSE(r.json["success"].asBool());
         EXPECT_EQ(r.json["tracks"].size(), 0u);
+    }
+}
+
+TEST_F(LibraryApi, RelativePlaylistEntriesAreTakenFromTheAudioShare) {
+    MakeGeneratedLibrary(3);
+    WritePersonalPlaylistFile("admin", "Relative.m3u",
+                              "Artist 2/Track 2.mp3\n../music/Artist 1/Track 1.mp3\n");
+    const CgiResult r = ListNode("musiclib_music_personal/playlist/Relative");
+    ASSERT_TRUE(r.jsonOk) << r.body;
+    // Only the exact stored path counts: "../" is not resolved into another library path.
+    EXPECT_EQ(StreamsOf(r.json), std::vector<std::string>{"2.mp3"});
+    EXPECT_EQ(r.json["missing"].asInt(), 1);
+}
+
+TEST_F(LibraryApi, APlaylistFileThatIsALinkAFifoOrTooLargeIsRefusedWithoutWaiting) {
+    MakeGeneratedLibrary(3);
+    const std::string folder = PersonalPlaylistDir("admin");
+    WriteFile("/volume1/elsewhere.m3u", GeneratedTrack(1).path + "\n");
+    MakeDirs(folder);
+    ASSERT_EQ(symlink("/volume1/elsewhere.m3u", (folder + "/Linked.m3u").c_str()), 0);
+    ASSERT_EQ(mkfifo((folder + "/Fifo.m3u").c_str(), 0644), 0);
+    WriteLargeFile(folder + "/Huge.m3u", "#EXTM3U\n", '#', std::size_t{9} << 20, "\n");
+    std::string many;
+    for (int n = 0; n <= 10000; ++n)
+        many += GeneratedTrack(1).path + "\n";
+    WriteFile(folder + "/Many.m3u", many);
+    const std::pair<const char*, const char*> cases[] = {
+        {"Linked", "404"}, {"Fifo", "404"}, {"Huge", "413"}, {"Many", "413"}};
+    for (const auto& [name, status] : cases) {
+        const CgiResult r = ListNode(std::string("musiclib_music_personal/playlist/") + name);
+        EXPECT_FALSE(r.timedOut) << name;
+        EXPECT_NE(r.Header("Status").find(status), std::string::npos) << name << r.output;
+        ASSERT_TRUE(r.jsonOk) << name << r.body;
+        EXPECT_FALSE(r.json["success"].asBool()) << name;
     }
 }
 
