@@ -12,6 +12,7 @@
 #include "AudioUsers.h"
 #include "DMABrowse.h"
 #include "DMAParser.h"
+#include "HarmonaHandler.h"
 #include "LocalizedStringParser.h"
 #include "MediaFiles.h"
 #include "PlatformPaths.h"
@@ -53,6 +54,8 @@ inline constexpr std::string_view kSharedPrefix = "musiclib_music_shared/playlis
 // The playlist categories (and their smart playlists): no media server containers.
 inline constexpr std::string_view kPersonalCategory = "musiclib_music_personal";
 inline constexpr std::string_view kSharedCategory = "musiclib_music_shared";
+inline constexpr std::string_view kMediaServerPrefix = "mediaserver_";
+inline constexpr const char* kMediaServerRootObject = "0";
 inline constexpr std::string_view kRandomNode = "musiclib_random";
 inline constexpr std::string_view kLibraryRootNode = "musiclib_root";
 inline constexpr const char* kRandomPlaylistPrefix = "/tmp/==DynaRandom100==.";
@@ -118,7 +121,8 @@ int LibraryApi::Process() {
     if (!webMan.IsAuthorized(nullptr, 3, CGI_POSITION_APPLICATION))
         return 0;
     webMan.LoadIn();
-    if (AudioUsers::GetUserPermission(webMan.GetLoginUserName()) == 0)
+    permission_ = AudioUsers::GetUserPermission(webMan.GetLoginUserName());
+    if (permission_ == 0)
         return Fail(kForbidden, kSystemSection, kSystemKey, kNoPermissionLine);
     const char* action = webMan.In("action", "");
     if (std::strcmp(action, "list") == 0)
@@ -135,6 +139,8 @@ int LibraryApi::List(const std::string& node) {
         built = ListPersonalPlaylist(node.substr(kPersonalPrefix.size()), reply);
     else if (StartsWith(node, kSharedPrefix))
         built = ListSharedPlaylist(node.substr(kSharedPrefix.size()), reply);
+    else if (StartsWith(node, kMediaServerPrefix))
+        built = ListMediaServer(node, webMan.In("object", kMediaServerRootObject), reply);
     else if (node == kRandomNode)
         built = ListRandomPlaylist(reply);
     else if (StartsWith(node, kLibraryPrefix) && node != kLibraryRootNode &&
@@ -189,6 +195,45 @@ int LibraryApi::ListBrowsedContainer(const std::string& objectId, Json::Value& r
         else
             reply["missing"] = reply["missing"].asInt() + 1;
     }
+    return 1;
+}
+
+int LibraryApi::ListMediaServer(const std::string& node, const std::string& objectId,
+                                Json::Value& reply) {
+    if ((permission_ & PERM_MEDIA_SERVER) == 0)
+        return Fail(kForbidden, kSystemSection, kSystemKey, kNoPermissionLine);
+    // Only a server that the audio daemon lists right now is browsed, by the control URL it gave:
+    // a request never makes this program connect to an address of its own choosing.
+    HarmonaHandler tree;
+    Json::Value servers(Json::arrayValue);
+    tree.AppendMediaServers(servers);
+    bool listed = false;
+    for (const Json::Value& server : servers)
+        listed = listed || (server.isObject() && server["id"].asString() == node);
+    if (!listed)
+        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+    DMABrowse browse(BrowseDirectChildren, node.substr(kMediaServerPrefix.size()));
+    browse.objectId = objectId;
+    DMAParser parser;
+    if (browse.Prepare() != 0 || parser.Parse(&browse) != 0)
+        return Fail(kBadGateway, kSystemSection, kSystemKey, kBrowseFailedLine);
+    const DMAParser::ItemList* items = parser.GetResult();
+    if (items == nullptr)
+        return 1;
+    int notPlayableHere = 0;
+    for (const ItemNode* item : *items) {
+        // Tracks of another server are not in this library: no stream id can name them.
+        if (!item->isContainer) {
+            ++notPlayableHere;
+            continue;
+        }
+        Json::Value row(Json::objectValue);
+        row["node"] = node;
+        row["object"] = item->id();
+        row["title"] = item->title();
+        reply["containers"].append(std::move(row));
+    }
+    reply["missing"] = notPlayableHere;
     return 1;
 }
 

@@ -1,6 +1,8 @@
 // The listening page's JSON API (webapi/library.cgi): what a tree node holds, as rows the page
 // lists and plays. Actions:
 //   action=list&node=<tree node id>  the node's sub-containers and tracks
+//     [&object=<object id>]          for a media server on the network: that container of it
+//                                    (default its root, "0"); its containers only
 //   action=track&stream=<stream id>  one track's metadata (404 when the library has no such track)
 // Tracks carry stream ids only (TrackCatalog.h); the page plays "/media/<stream id>", which the
 // web server passes on to the local media server behind the same login.
@@ -30,6 +32,7 @@ class LibraryApi : public ActionHandler {
     int ListPersonalPlaylist(const std::string& name, Json::Value& reply);
     int ListSharedPlaylist(const std::string& id, Json::Value& reply);
     int ListRandomPlaylist(Json::Value& reply);
+    int ListMediaServer(const std::string& node, const std::string& objectId, Json::Value& reply);
     // The tracks of a playlist file (relative entries from the audio share); a missing file is an
     // empty list when `missingIsEmpty`, else not found.
     int ListPlaylistFile(const std::string& file, Json::Value& reply, bool missingIsEmpty = false);
@@ -43,6 +46,7 @@ class LibraryApi : public ActionHandler {
     int Fail(const char* status, const char* section, const char* key, int line);
 
     TrackCatalog catalog_;
+    int permission_ = 0;  // the user's audio permission bits
 };
 
 }  // namespace harmona::webapi

@@ -11,6 +11,7 @@
 #include "CgiRunner.h"
 #include "Fixtures.h"
 #include "PlaylistFixtures.h"
+#include "ScriptedDaemon.h"
 #include "ScriptedHttpServer.h"
 
 using namespace harmona::test;
@@ -226,6 +227,67 @@ TEST_F(LibraryApi, RandomNodeIsEmptyBeforeTheFirstDraw) {
     ASSERT_TRUE(r.jsonOk) << r.body;
     EXPECT_TRUE(r.json["success"].asBool());
     EXPECT_EQ(r.json["tracks"].size(), 0u);
+}
+
+// A media server on the network, as the audio daemon lists it, answering at 127.0.0.1:50004.
+constexpr const char* kNetworkServerUrl = "http://127.0.0.1:50004/ctl";
+std::vector<MediaServer> NetworkServers() {
+    MediaServer server;
+    server.controlUrl = kNetworkServerUrl;
+    server.friendlyName = "Shelf";
+    server.ip = "127.0.0.1";
+    return {server};
+}
+
+TEST_F(LibraryApi, AListedMediaServerShowsItsTopContainersBrowsedOnThatServer) {
+    ScriptedDaemon daemon(ServeMediaServers(NetworkServers()));
+    ScriptedHttpServer network(50004);
+    ContentTree tree;
+    tree.AddContainer("0", "64", "Music");
+    tree.AddContainer("0", "1", "Video");
+    tree.AddItem("0", "9", "A loose item");
+    tree.AddContainer("64", "640", "Albums");
+    network.ServeTree(tree);
+    ASSERT_TRUE(network.Start());
+    const std::string node = std::string("mediaserver_") + kNetworkServerUrl;
+
+    const CgiResult top = ListNode(node);
+    ASSERT_TRUE(top.jsonOk) << top.output;
+    EXPECT_TRUE(top.json["success"].asBool());
+    ASSERT_EQ(top.json["containers"].size(), 2u);
+    EXPECT_EQ(top.json["containers"][0]["node"].asString(), node);
+    EXPECT_EQ(top.json["containers"][0]["object"].asString(), "64");
+    EXPECT_EQ(top.json["containers"][0]["title"].asString(), "Music");
+    EXPECT_EQ(top.json["containers"][1]["title"].asString(), "Video");
+    EXPECT_EQ(top.json["tracks"].size(), 0u);
+    EXPECT_EQ(top.json["missing"].asInt(), 1);
+
+    const CgiResult inner = Api({{"action", "list"}, {"node", node}, {"object", "64"}});
+    ASSERT_TRUE(inner.jsonOk) << inner.output;
+    ASSERT_EQ(inner.json["containers"].size(), 1u);
+    EXPECT_EQ(inner.json["containers"][0]["title"].asString(), "Albums");
+    ASSERT_EQ(network.Requests().size(), 2u);
+    EXPECT_NE(network.Requests()[0].body.find("<ObjectID>0</ObjectID>"), std::string::npos);
+}
+
+TEST_F(LibraryApi, AMediaServerThatTheDaemonDoesNotListIsNeverContacted) {
+    ScriptedDaemon daemon(ServeMediaServers(NetworkServers()));
+    ScriptedHttpServer elsewhere(50005);
+    ASSERT_TRUE(elsewhere.Start());
+    for (const char* node :
+         {"mediaserver_http://127.0.0.1:50005/ctl", "mediaserver_root", "mediaserver_refresh"}) {
+        const CgiResult r = ListNode(node);
+        EXPECT_NE(r.Header("Status").find("404"), std::string::npos) << node << r.output;
+    }
+    EXPECT_TRUE(elsewhere.Requests().empty());
+}
+
+TEST_F(LibraryApi, MediaServersNeedTheMediaServerPermission) {
+    AddUser("admin", 1 | 4 | 16);
+    ScriptedDaemon daemon(ServeMediaServers(NetworkServers()));
+    const CgiResult r = ListNode(std::string("mediaserver_") + kNetworkServerUrl);
+    EXPECT_NE(r.Header("Status").find("403"), std::string::npos) << r.output;
+    EXPECT_TRUE(daemon.Requests().empty());
 }
 
 TEST_F(LibraryApi, KnownStreamIdGivesItsTrackAndAnUnknownOneGives404) {

@@ -7,7 +7,9 @@ const OVERSCAN = 8;    // rows drawn above and below the visible ones
 
 // Which tree nodes hold tracks or containers that the API lists.
 export function isListable(id) {
-  if (typeof id !== "string" || !id.startsWith("musiclib_") || id === "musiclib_root") return false;
+  if (typeof id !== "string") return false;
+  if (id.startsWith("mediaserver_")) return id !== "mediaserver_root" && id !== "mediaserver_refresh";
+  if (!id.startsWith("musiclib_") || id === "musiclib_root") return false;
   if (/^musiclib_music_(personal|shared)/.test(id)) return /^musiclib_music_(personal|shared)\/playlist\//.test(id);
   return true;
 }
@@ -32,10 +34,13 @@ export function createListener({ labels, onFailure, onStatus }) {
   const viewport = $("tracks");
   const spacer = $("tracks-spacer");
 
-  async function fetchList(node) {
+  // `object`: a container of a media server on the network (its root when absent).
+  async function fetchList(node, object) {
+    const params = { action: "list", node };
+    if (typeof object === "string") params.object = object;
     let response;
     try {
-      response = await fetch(`${API}?${new URLSearchParams({ action: "list", node })}`, {
+      response = await fetch(`${API}?${new URLSearchParams(params)}`, {
         credentials: "same-origin",
         cache: "no-store",
       });
@@ -53,12 +58,12 @@ export function createListener({ labels, onFailure, onStatus }) {
     return { kind: "http", status: response.status };
   }
 
-  async function show(node, title) {
+  async function show(node, title, object) {
     const request = ++state.request;
     $("listing").hidden = false;
     $("listing").setAttribute("aria-busy", "true");
     $("list-title").textContent = title;
-    const reply = await fetchList(node);
+    const reply = await fetchList(node, object);
     if (request !== state.request) return;
     $("listing").removeAttribute("aria-busy");
     if (reply.kind !== "list") {
@@ -89,7 +94,9 @@ export function createListener({ labels, onFailure, onStatus }) {
         button.className = "container";
         button.textContent = String(c.title ?? "");
         button.dataset.node = String(c.node ?? "");
-        button.addEventListener("click", () => show(String(c.node), String(c.title ?? "")));
+        const object = typeof c.object === "string" ? c.object : undefined;
+        if (object !== undefined) button.dataset.object = object;
+        button.addEventListener("click", () => show(String(c.node), String(c.title ?? ""), object));
         li.append(button);
         return li;
       }),

@@ -157,6 +157,29 @@ test("a 10,000-track container opens and scrolls, drawing only the rows in view"
   assert.deepEqual(page.problems, []);
 });
 
+test("a media server on the network shows its top containers, browsed on that server", async () => {
+  const page = await openTree(browser, "demo");
+  const root = item(page, "mediaserver_root");
+  if ((await root.getAttribute("aria-expanded")) !== "true") await root.locator(":scope > .row > .twisty").click();
+  let servers = [];
+  for (let attempt = 0; attempt < 20 && servers.length === 0; attempt++) {
+    await item(page, "mediaserver_refresh").locator(".row").click();
+    await page.waitForSelector(`li[data-id="mediaserver_root"][data-refreshed="${attempt + 1}"]`);
+    servers = await root.locator(":scope > ul > li[role=treeitem]").evaluateAll((lis) =>
+      lis.map((li) => li.dataset.id).filter((id) => id.includes(":50003/")));
+    if (servers.length === 0) await page.waitForTimeout(500);
+  }
+  assert.equal(servers.length, 1, `servers: ${servers.join(", ")}`);
+  await selectNode(page, item(page, servers[0]));
+  const containers = await page.locator("#containers button").evaluateAll((buttons) => buttons.map((b) => b.dataset.object));
+  assert.deepEqual(containers, ["music_all", "music_file", "music_album", "music_aa", "music_genre", "random", "music_latestalbum"]);
+  // One level down on that server: the albums.
+  await page.locator('#containers button[data-object="music_album"]').click();
+  await page.waitForFunction(() => document.querySelectorAll("#containers button").length >= 12 &&
+    !document.getElementById("listing").hasAttribute("aria-busy"), null, { timeout: 20000 });
+  assert.deepEqual(page.problems, []);
+});
+
 test("without the login nothing is served (401), an unknown stream id gets 404", async () => {
   for (const path of ["webapi/library.cgi?action=list&node=musiclib_random", "media/1.flac"]) {
     const response = await fetch(new URL(path, baseURL));
