@@ -167,14 +167,21 @@ int LibraryApi::DescribeTrack(const char* stream) {
     return 1;
 }
 
+int LibraryApi::BrowseChildren(const std::string& controlUrl, const std::string& objectId,
+                               DMAParser& parser) {
+    DMABrowse browse(BrowseDirectChildren, controlUrl);
+    browse.objectId = objectId;
+    if (browse.Prepare() != 0 || parser.Parse(&browse) != 0)
+        return Fail(kBadGateway, kSystemSection, kSystemKey, kBrowseFailedLine);
+    return 1;
+}
+
 int LibraryApi::ListBrowsedContainer(const std::string& objectId, Json::Value& reply) {
     if (!OpenCatalog())
         return Fail(kUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
-    DMABrowse browse(BrowseDirectChildren, paths::kLocalMediaServerControlUrl);
-    browse.objectId = objectId;
     DMAParser parser;
-    if (browse.Prepare() != 0 || parser.Parse(&browse) != 0)
-        return Fail(kBadGateway, kSystemSection, kSystemKey, kBrowseFailedLine);
+    if (BrowseChildren(paths::kLocalMediaServerControlUrl, objectId, parser) == 0)
+        return 0;
     const DMAParser::ItemList* items = parser.GetResult();
     if (items == nullptr)
         return 1;
@@ -212,11 +219,9 @@ int LibraryApi::ListMediaServer(const std::string& node, const std::string& obje
         listed = listed || (server.isObject() && server["id"].asString() == node);
     if (!listed)
         return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
-    DMABrowse browse(BrowseDirectChildren, node.substr(kMediaServerPrefix.size()));
-    browse.objectId = objectId;
     DMAParser parser;
-    if (browse.Prepare() != 0 || parser.Parse(&browse) != 0)
-        return Fail(kBadGateway, kSystemSection, kSystemKey, kBrowseFailedLine);
+    if (BrowseChildren(node.substr(kMediaServerPrefix.size()), objectId, parser) == 0)
+        return 0;
     const DMAParser::ItemList* items = parser.GetResult();
     if (items == nullptr)
         return 1;

@@ -13,6 +13,7 @@
 #include <string>
 
 #include "ActionHandler.h"
+#include "DMAParser.h"
 #include "TrackCatalog.h"
 
 namespace harmona::webapi {
@@ -39,6 +40,11 @@ class LibraryApi : public ActionHandler {
     // The tracks of a playlist's paths, in order; paths the library does not hold are counted in
     // "missing" (their paths are never shown).
     void AppendPlaylistTracks(const std::vector<std::string>& paths, Json::Value& reply);
+
+    // Browses the children of `objectId` on the ContentDirectory at `controlUrl` into `parser`;
+    // 0 after answering a failure.
+    int BrowseChildren(const std::string& controlUrl, const std::string& objectId,
+                       DMAParser& parser);
 
     bool OpenCatalog();
 
