@@ -58,6 +58,12 @@ void ActionHandler::PrintResponse(Json::Value value, const char* type) {
     harmona::cgi::KeepUntilExit(std::move(value));
 }
 
+void ActionHandler::PrintResponse(Json::Value value, const char* type, const char* status) {
+    if (status != nullptr)
+        std::printf("Status: %s\r\n", status);
+    PrintResponse(std::move(value), type);
+}
+
 void ActionHandler::SetError(Json::Value& reply, const char* section, const char* key, int line) {
     harmona::cgi::MakeObject(reply);
     reply["success"] = false;

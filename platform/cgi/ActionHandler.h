@@ -21,6 +21,10 @@ class ActionHandler {
     // repaired.
     void PrintResponse(Json::Value value, const char* type);
 
+    // The same, after the CGI header line "Status: <status>" (e.g. "404 Not Found"), for clients
+    // that read the HTTP status.
+    void PrintResponse(Json::Value value, const char* type, const char* status);
+
     // Makes `reply` an object (an array's elements move, in order, to the member "items"), then
     // sets "success": false and "errinfo": {"sec": section, "key": key, "line": line}.
     void SetError(Json::Value& reply, const char* section, const char* key, int line);

@@ -3,6 +3,8 @@
 #include <sys/resource.h>
 #include <syslog.h>
 
+#include <new>
+
 namespace harmona::cgi {
 
 void LimitRequestMemory() {
@@ -21,6 +23,16 @@ void LimitRequestMemory() {
 void LogRequestOutOfMemory() {
     syslog(LOG_ERR, "request: out of memory within its bound of %zu MiB; no reply",
            kRequestMemoryBytes >> 20);
+}
+
+int ServeWithinRequestMemory(int (*serve)()) {
+    LimitRequestMemory();
+    try {
+        return serve();
+    } catch (const std::bad_alloc&) {
+        LogRequestOutOfMemory();
+        return 0;
+    }
 }
 
 }  // namespace harmona::cgi

@@ -24,4 +24,10 @@ void LimitRequestMemory();
 // web server answers 500 for a CGI that printed nothing).
 void LogRequestOutOfMemory();
 
+// The start-up every CGI program of the application shares: limits the memory first thing, then
+// runs `serve` (which makes the request's handler and returns its exit status). A failed
+// allocation ends the request with LogRequestOutOfMemory and exit status 0; the handler has been
+// destroyed before that, and the reply is printed last, so nothing of it was written.
+int ServeWithinRequestMemory(int (*serve)());
+
 }  // namespace harmona::cgi

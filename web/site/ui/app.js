@@ -2,6 +2,7 @@
 // left-hand side does. Plain DOM code; every server text is inserted with textContent.
 import { parseReply, decodeEntities, languageFromTags, safeIcon, isLazyContainer, nodesOf, REFRESH_TARGETS, BUTTON_IDS } from "./reply.js";
 import { LABELS, HTML_LANG } from "./labels.js";
+import { createListener, isListable } from "./listen.js";
 
 const CGI = "webapi/audiotree.cgi";
 const UILANG = "webapi/uilang.cgi";
@@ -18,6 +19,7 @@ const page = {
   fallback: {},  // the English ones, for a key that a language lacks
   labels: LABELS.enu,
   keepAlives: 0,
+  listener: null, // the pane's listing and the player (listen.js)
 };
 const nodeData = new WeakMap(); // li -> the node object as the server sent it
 const $ = (id) => document.getElementById(id);
@@ -182,6 +184,10 @@ function select(li) {
   $("selected-text").textContent = decodeEntities(node.text);
   $("selected-id").textContent = typeof node.id === "string" ? node.id : "";
   $("selected-icon").src = safeIcon(node.icon) ?? BLANK;
+  if (page.listener) {
+    if (isListable(node.id)) page.listener.show(node.id, decodeEntities(node.text));
+    else page.listener.hide();
+  }
 }
 
 // A refresh button: asks for the category's children again and puts them after its buttons.
@@ -296,6 +302,14 @@ async function start() {
   $("hint").textContent = page.labels.hint;
   $("rerandom").textContent = page.labels.rerandom;
   $("rerandom").addEventListener("click", rerandom);
+  page.listener = createListener({
+    labels: page.labels,
+    onFailure: (reply) =>
+      reply.kind === "error" && typeof reply.message === "string" && reply.message !== ""
+        ? showStatus(reply.message, true)
+        : showFailure(reply.kind === "error" ? { kind: "error", errinfo: reply.errinfo } : reply),
+    onStatus: showStatus,
+  });
 
   const tree = $("tree");
   tree.addEventListener("click", (event) => {

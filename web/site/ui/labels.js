@@ -8,6 +8,8 @@ export const LABELS = {
     sessionExpired: "Your login is no longer valid. Reload the page to log in again.",
     noReply: "The server did not answer this request (HTTP {status}).", badReply: "The server sent a reply that cannot be read.",
     unknownError: "Error {sec} / {key}", offline: "The server cannot be reached.",
+    playAll: "Play all", play: "Play", pause: "Pause", next: "Next", previous: "Previous",
+    seek: "Position", volume: "Volume", trackCount: "{count} tracks", cannotPlay: "This track cannot be played.",
   },
   ger: {
     title: "Harmona Audio", tree: "Audioquellen", rerandom: "Neue Zufalls-100",
@@ -16,6 +18,8 @@ export const LABELS = {
     sessionExpired: "Ihre Anmeldung ist nicht mehr gültig. Laden Sie die Seite neu, um sich anzumelden.",
     noReply: "Der Server hat diese Anfrage nicht beantwortet (HTTP {status}).", badReply: "Die Antwort des Servers ist nicht lesbar.",
     unknownError: "Fehler {sec} / {key}", offline: "Der Server ist nicht erreichbar.",
+    playAll: "Alle abspielen", play: "Abspielen", pause: "Pause", next: "Weiter", previous: "Zurück",
+    seek: "Position", volume: "Lautstärke", trackCount: "{count} Titel", cannotPlay: "Dieser Titel kann nicht abgespielt werden.",
   },
   fre: {
     title: "Harmona Audio", tree: "Sources audio", rerandom: "Nouveau Aléatoire 100",

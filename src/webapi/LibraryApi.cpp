@@ -1,0 +1,314 @@
+#include "LibraryApi.h"
+
+#include <dirent.h>
+#include <sys/stat.h>
+
+#include <cmath>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <string_view>
+
+#include "AudioUsers.h"
+#include "DMABrowse.h"
+#include "DMAParser.h"
+#include "HarmonaHandler.h"
+#include "LocalizedStringParser.h"
+#include "MediaFiles.h"
+#include "PlatformPaths.h"
+#include "PlaylistFile.h"
+
+namespace harmona::webapi {
+
+namespace {
+
+inline constexpr const char* kContentType = "application/json; charset=\"UTF-8\"";
+
+// The error replies: HTTP status, the UI text shown, and a fixed line number that log readers and
+// the page match on.
+inline constexpr const char* kBadRequest = "400 Bad Request";
+inline constexpr const char* kForbidden = "403 Forbidden";
+inline constexpr const char* kNotFound = "404 Not Found";
+inline constexpr const char* kTooLarge = "413 Payload Too Large";
+inline constexpr const char* kBadGateway = "502 Bad Gateway";
+inline constexpr const char* kUnavailable = "503 Service Unavailable";
+inline constexpr const char* kErrorSection = "error";
+inline constexpr const char* kNotFoundKey = "Could not get the entry";
+inline constexpr const char* kSystemSection = "common";
+inline constexpr const char* kSystemKey = "error_system";
+enum ErrorLine : int {
+    kNoPermissionLine = 101,
+    kUnknownActionLine = 102,
+    kUnknownNodeLine = 103,
+    kUnknownStreamLine = 104,
+    kBrowseFailedLine = 105,
+    kNoLibraryLine = 106,
+    kPlaylistUnreadableLine = 107,
+    kPlaylistTooLargeLine = 108,
+};
+
+// Tree node ids of what the page lists (the ids the tree CGI hands out).
+inline constexpr std::string_view kLibraryPrefix = "musiclib_";
+inline constexpr std::string_view kPersonalPrefix = "musiclib_music_personal/playlist/";
+inline constexpr std::string_view kSharedPrefix = "musiclib_music_shared/playlist/";
+// The playlist categories (and their smart playlists): no media server containers.
+inline constexpr std::string_view kPersonalCategory = "musiclib_music_personal";
+inline constexpr std::string_view kSharedCategory = "musiclib_music_shared";
+inline constexpr std::string_view kMediaServerPrefix = "mediaserver_";
+inline constexpr const char* kMediaServerRootObject = "0";
+inline constexpr std::string_view kRandomNode = "musiclib_random";
+inline constexpr std::string_view kLibraryRootNode = "musiclib_root";
+inline constexpr const char* kRandomPlaylistPrefix = "/tmp/==DynaRandom100==.";
+
+bool StartsWith(std::string_view text, std::string_view prefix) {
+    return text.compare(0, prefix.size(), prefix) == 0;
+}
+
+Json::Value TrackRow(const Track& track) {
+    Json::Value row(Json::objectValue);
+    row["stream"] = track.stream;
+    row["title"] = track.title;
+    row["artist"] = track.artist;
+    row["album"] = track.album;
+    row["duration"] = track.durationMs < 0
+                          ? Json::Int64(-1)
+                          : static_cast<Json::Int64>(std::llround(track.durationMs / 1000.0));
+    return row;
+}
+
+Json::Value EmptyListReply(const std::string& node) {
+    Json::Value reply(Json::objectValue);
+    reply["success"] = true;
+    reply["node"] = node;
+    reply["containers"] = Json::Value(Json::arrayValue);
+    reply["tracks"] = Json::Value(Json::arrayValue);
+    reply["missing"] = 0;
+    return reply;
+}
+
+// The name a playlist file is listed under: its name without ".m3u" or ".m3u8" (any case).
+std::string PlaylistNameOf(const std::string& fileName) {
+    for (const char* ending : {".m3u", ".m3u8"}) {
+        const std::size_t length = std::strlen(ending);
+        if (fileName.size() > length &&
+            strcasecmp(fileName.c_str() + fileName.size() - length, ending) == 0)
+            return fileName.substr(0, fileName.size() - length);
+    }
+    return {};
+}
+
+// The file of personal playlist `name` in `folder`, found among the folder's entries (so that a
+// name from the request never becomes a path by itself); empty when there is none.
+std::string FindPersonalPlaylistFile(const std::string& folder, const std::string& name) {
+    struct stat st {};
+    // Only a real folder is read, as the playlist listing does: a link could lead elsewhere.
+    if (lstat(folder.c_str(), &st) != 0 || !S_ISDIR(st.st_mode))
+        return {};
+    const std::unique_ptr<DIR, int (*)(DIR*)> dir(opendir(folder.c_str()), closedir);
+    if (!dir)
+        return {};
+    while (const dirent* entry = readdir(dir.get())) {
+        const std::string fileName = entry->d_name;
+        if (!name.empty() && PlaylistNameOf(fileName) == name)
+            return folder + "/" + fileName;
+    }
+    return {};
+}
+
+}  // namespace
+
+int LibraryApi::Process() {
+    if (!webMan.IsAuthorized(nullptr, 3, CGI_POSITION_APPLICATION))
+        return 0;
+    webMan.LoadIn();
+    permission_ = AudioUsers::GetUserPermission(webMan.GetLoginUserName());
+    if (permission_ == 0)
+        return Fail(kForbidden, kSystemSection, kSystemKey, kNoPermissionLine);
+    const char* action = webMan.In("action", "");
+    if (std::strcmp(action, "list") == 0)
+        return List(webMan.In("node", ""));
+    if (std::strcmp(action, "track") == 0)
+        return DescribeTrack(webMan.In("stream", ""));
+    return Fail(kBadRequest, kErrorSection, kNotFoundKey, kUnknownActionLine);
+}
+
+int LibraryApi::List(const std::string& node) {
+    Json::Value reply = EmptyListReply(node);
+    int built = 0;
+    if (StartsWith(node, kPersonalPrefix))
+        built = ListPersonalPlaylist(node.substr(kPersonalPrefix.size()), reply);
+    else if (StartsWith(node, kSharedPrefix))
+        built = ListSharedPlaylist(node.substr(kSharedPrefix.size()), reply);
+    else if (StartsWith(node, kMediaServerPrefix))
+        built = ListMediaServer(node, webMan.In("object", kMediaServerRootObject), reply);
+    else if (node == kRandomNode)
+        built = ListRandomPlaylist(reply);
+    else if (StartsWith(node, kLibraryPrefix) && node != kLibraryRootNode &&
+             !StartsWith(node, kPersonalCategory) && !StartsWith(node, kSharedCategory))
+        built = ListBrowsedContainer(node.substr(kLibraryPrefix.size()), reply);
+    else
+        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+    if (built == 0)
+        return 0;
+    PrintResponse(std::move(reply), kContentType);
+    return 1;
+}
+
+int LibraryApi::DescribeTrack(const char* stream) {
+    if (!OpenCatalog())
+        return Fail(kUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+    const std::optional<Track> track = catalog_.ByStreamId(stream);
+    if (!track)
+        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownStreamLine);
+    Json::Value reply(Json::objectValue);
+    reply["success"] = true;
+    reply["track"] = TrackRow(*track);
+    PrintResponse(std::move(reply), kContentType);
+    return 1;
+}
+
+int LibraryApi::BrowseChildren(const std::string& controlUrl, const std::string& objectId,
+                               DMAParser& parser) {
+    DMABrowse browse(BrowseDirectChildren, controlUrl);
+    browse.objectId = objectId;
+    if (browse.Prepare() != 0 || parser.Parse(&browse) != 0)
+        return Fail(kBadGateway, kSystemSection, kSystemKey, kBrowseFailedLine);
+    return 1;
+}
+
+int LibraryApi::ListBrowsedContainer(const std::string& objectId, Json::Value& reply) {
+    if (!OpenCatalog())
+        return Fail(kUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+    DMAParser parser;
+    if (BrowseChildren(paths::kLocalMediaServerControlUrl, objectId, parser) == 0)
+        return 0;
+    const DMAParser::ItemList* items = parser.GetResult();
+    if (items == nullptr)
+        return 1;
+    Json::Value& containers = reply["containers"];
+    Json::Value& tracks = reply["tracks"];
+    for (const ItemNode* item : *items) {
+        if (item->isContainer) {
+            Json::Value row(Json::objectValue);
+            row["node"] = std::string(kLibraryPrefix) + item->id();
+            row["title"] = item->title();
+            containers.append(std::move(row));
+            continue;
+        }
+        const std::optional<std::int64_t> id = TrackIdOfLocalResource(item->res());
+        const std::optional<Track> track = id ? catalog_.ById(*id) : std::nullopt;
+        if (track)
+            tracks.append(TrackRow(*track));
+        else
+            reply["missing"] = reply["missing"].asInt() + 1;
+    }
+    return 1;
+}
+
+int LibraryApi::ListMediaServer(const std::string& node, const std::string& objectId,
+                                Json::Value& reply) {
+    if ((permission_ & PERM_MEDIA_SERVER) == 0)
+        return Fail(kForbidden, kSystemSection, kSystemKey, kNoPermissionLine);
+    // Only a server that the audio daemon lists right now is browsed, by the control URL it gave:
+    // a request never makes this program connect to an address of its own choosing.
+    HarmonaHandler tree;
+    Json::Value servers(Json::arrayValue);
+    tree.AppendMediaServers(servers);
+    bool listed = false;
+    for (const Json::Value& server : servers)
+        listed = listed || (server.isObject() && server["id"].asString() == node);
+    if (!listed)
+        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+    DMAParser parser;
+    if (BrowseChildren(node.substr(kMediaServerPrefix.size()), objectId, parser) == 0)
+        return 0;
+    const DMAParser::ItemList* items = parser.GetResult();
+    if (items == nullptr)
+        return 1;
+    int notPlayableHere = 0;
+    for (const ItemNode* item : *items) {
+        // Tracks of another server are not in this library: no stream id can name them.
+        if (!item->isContainer) {
+            ++notPlayableHere;
+            continue;
+        }
+        Json::Value row(Json::objectValue);
+        row["node"] = node;
+        row["object"] = item->id();
+        row["title"] = item->title();
+        reply["containers"].append(std::move(row));
+    }
+    reply["missing"] = notPlayableHere;
+    return 1;
+}
+
+int LibraryApi::ListPersonalPlaylist(const std::string& name, Json::Value& reply) {
+    const std::string file =
+        FindPersonalPlaylistFile(webMan.GetPreferenceDir() + "/playlists", name);
+    if (file.empty())
+        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+    return ListPlaylistFile(file, reply);
+}
+
+int LibraryApi::ListSharedPlaylist(const std::string& id, Json::Value& reply) {
+    if (id.empty() || id.size() > 10 || id.find_first_not_of("0123456789") != std::string::npos)
+        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+    if (!OpenCatalog())
+        return Fail(kUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+    const auto paths = catalog_.SharedPlaylistPaths(std::strtoll(id.c_str(), nullptr, 10),
+                                                    playlist::kMaxPlaylistEntries);
+    if (!paths)
+        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+    if (paths->tooLarge)
+        return Fail(kTooLarge, kSystemSection, kSystemKey, kPlaylistTooLargeLine);
+    AppendPlaylistTracks(paths->paths, reply);
+    return 1;
+}
+
+int LibraryApi::ListRandomPlaylist(Json::Value& reply) {
+    // The file that "New Random 100" drew for this user; none yet is an empty list.
+    return ListPlaylistFile(kRandomPlaylistPrefix + webMan.GetLoginUserName(), reply, true);
+}
+
+int LibraryApi::ListPlaylistFile(const std::string& file, Json::Value& reply, bool missingIsEmpty) {
+    const playlist::PlaylistFileEntries entries =
+        playlist::ReadPlaylistFile(file, medialib::AudioSharePath());
+    if (entries.status == playlist::PlaylistFileStatus::missing && missingIsEmpty)
+        return 1;
+    if (entries.status == playlist::PlaylistFileStatus::tooLarge)
+        return Fail(kTooLarge, kSystemSection, kSystemKey, kPlaylistTooLargeLine);
+    if (entries.status != playlist::PlaylistFileStatus::ok)
+        return Fail(kNotFound, kErrorSection, kNotFoundKey, kPlaylistUnreadableLine);
+    if (!OpenCatalog())
+        return Fail(kUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+    AppendPlaylistTracks(entries.paths, reply);
+    return 1;
+}
+
+void LibraryApi::AppendPlaylistTracks(const std::vector<std::string>& paths, Json::Value& reply) {
+    Json::Value& tracks = reply["tracks"];
+    int missing = 0;
+    for (const std::string& path : paths) {
+        if (const std::optional<Track> track = catalog_.ByPath(path))
+            tracks.append(TrackRow(*track));
+        else
+            ++missing;
+    }
+    reply["missing"] = missing;
+}
+
+bool LibraryApi::OpenCatalog() {
+    return catalog_.Open(paths::kLibraryDb);
+}
+
+int LibraryApi::Fail(const char* status, const char* section, const char* key, int line) {
+    Json::Value reply(Json::objectValue);
+    SetError(reply, section, key, line);
+    const Json::Value texts = VANU::ZET::LocalizedStringParser::ParseTexts(
+        std::string(paths::kTextsPrefix) + webMan.GetUILanguage());
+    reply["message"] = texts[section][key].asString();
+    PrintResponse(std::move(reply), kContentType, status);
+    return 0;
+}
+
+}  // namespace harmona::webapi

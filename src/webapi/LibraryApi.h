@@ -1,0 +1,58 @@
+// The listening page's JSON API (webapi/library.cgi): what a tree node holds, as rows the page
+// lists and plays. Actions:
+//   action=list&node=<tree node id>  the node's sub-containers and tracks
+//     [&object=<object id>]          for a media server on the network: that container of it
+//                                    (default its root, "0"); its containers only
+//   action=track&stream=<stream id>  one track's metadata (404 when the library has no such track)
+// Tracks carry stream ids only (TrackCatalog.h); the page plays "/media/<stream id>", which the
+// web server passes on to the local media server behind the same login.
+#pragma once
+
+#include <json/value.h>
+
+#include <string>
+
+#include "ActionHandler.h"
+#include "DMAParser.h"
+#include "TrackCatalog.h"
+
+namespace harmona::webapi {
+
+class LibraryApi : public ActionHandler {
+  public:
+    // Authorizes, reads the permission bits and dispatches `action`; the result is the exit
+    // status (1 for a served request).
+    int Process() override;
+
+  private:
+    int List(const std::string& node);
+    int DescribeTrack(const char* stream);
+
+    // The builders of a list reply; each fills `reply` or answers an error itself and returns 0.
+    int ListBrowsedContainer(const std::string& objectId, Json::Value& reply);
+    int ListPersonalPlaylist(const std::string& name, Json::Value& reply);
+    int ListSharedPlaylist(const std::string& id, Json::Value& reply);
+    int ListRandomPlaylist(Json::Value& reply);
+    int ListMediaServer(const std::string& node, const std::string& objectId, Json::Value& reply);
+    // The tracks of a playlist file (relative entries from the audio share); a missing file is an
+    // empty list when `missingIsEmpty`, else not found.
+    int ListPlaylistFile(const std::string& file, Json::Value& reply, bool missingIsEmpty = false);
+    // The tracks of a playlist's paths, in order; paths the library does not hold are counted in
+    // "missing" (their paths are never shown).
+    void AppendPlaylistTracks(const std::vector<std::string>& paths, Json::Value& reply);
+
+    // Browses the children of `objectId` on the ContentDirectory at `controlUrl` into `parser`;
+    // 0 after answering a failure.
+    int BrowseChildren(const std::string& controlUrl, const std::string& objectId,
+                       DMAParser& parser);
+
+    bool OpenCatalog();
+
+    // An error reply: the HTTP status, the error envelope and its text in the user's language.
+    int Fail(const char* status, const char* section, const char* key, int line);
+
+    TrackCatalog catalog_;
+    int permission_ = 0;  // the user's audio permission bits
+};
+
+}  // namespace harmona::webapi

@@ -1,0 +1,16 @@
+// The entry of webapi/library.cgi: one request, within the same memory bound as the tree CGI.
+#include "LibraryApi.h"
+#include "RequestMemory.h"
+
+namespace {
+
+int ServeLibraryRequest() {
+    harmona::webapi::LibraryApi api;
+    return api.Process();
+}
+
+}  // namespace
+
+int main(int /*argc*/, char** /*argv*/) {
+    return harmona::cgi::ServeWithinRequestMemory(ServeLibraryRequest);
+}
