@@ -58,11 +58,21 @@ void FreeTransfer(gpointer data, GClosure*) {
     delete transfer;
 }
 
-bool ParseOffset(const std::string& text, off_t* value) {
+// 1 to 18 decimal digits and nothing else (no sign, no space): a byte offset or an id that
+// cannot overflow.
+bool ParseDigits(const std::string& text, int64_t* value) {
     if (text.empty() || text.size() > 18 ||
         text.find_first_not_of("0123456789") != std::string::npos)
         return false;
-    *value = static_cast<off_t>(std::strtoll(text.c_str(), nullptr, 10));
+    *value = std::strtoll(text.c_str(), nullptr, 10);
+    return true;
+}
+
+bool ParseOffset(const std::string& text, off_t* value) {
+    int64_t digits = 0;
+    if (!ParseDigits(text, &digits))
+        return false;
+    *value = static_cast<off_t>(digits);
     return true;
 }
 
@@ -88,11 +98,7 @@ bool ParseIdName(std::string name, int64_t* id, std::string* extension) {
         *extension = name.substr(dot + 1);
         name.erase(dot);
     }
-    if (name.empty() || name.size() > 18 ||
-        name.find_first_not_of("0123456789") != std::string::npos)
-        return false;
-    *id = std::strtoll(name.c_str(), nullptr, 10);
-    return true;
+    return ParseDigits(name, id);
 }
 
 }  // namespace
