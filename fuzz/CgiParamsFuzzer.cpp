@@ -7,9 +7,9 @@
 #include <cstring>
 #include <string>
 
-#include "CgiParams.h"
-#include "UILanguage.h"
-#include "WebMan.h"
+#include "platform/cgi/CgiParams.h"
+#include "platform/cgi/UILanguage.h"
+#include "platform/cgi/WebMan.h"
 
 namespace {
 

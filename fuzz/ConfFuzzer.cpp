@@ -4,8 +4,8 @@
 #include <cstdlib>
 #include <string>
 
-#include "ConfFile.h"
-#include "LocalizedStringParser.h"
+#include "platform/conf/ConfFile.h"
+#include "platform/texts/LocalizedStringParser.h"
 
 namespace {
 

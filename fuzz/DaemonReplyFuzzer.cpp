@@ -9,7 +9,7 @@
 #include <string>
 #include <vector>
 
-#include "HarmonaHandler.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

@@ -5,8 +5,8 @@
 #include <string>
 #include <vector>
 
-#include "ItemNode.h"
-#include "SoapBrowse.h"
+#include "platform/dma/ItemNode.h"
+#include "platform/dma/SoapBrowse.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     std::string reply(reinterpret_cast<const char*>(data), size);

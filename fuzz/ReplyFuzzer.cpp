@@ -7,8 +7,8 @@
 #include <memory>
 #include <string>
 
-#include "ActionHandler.h"
-#include "Utf8.h"
+#include "platform/cgi/ActionHandler.h"
+#include "platform/cgi/Utf8.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     const std::string input(reinterpret_cast<const char*>(data), size);

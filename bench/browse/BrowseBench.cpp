@@ -16,11 +16,11 @@
 #include <string>
 #include <vector>
 
-#include "BenchProcess.h"
-#include "CgiRunner.h"
-#include "Fixtures.h"
-#include "Sandbox.h"
-#include "ScriptedHttpServer.h"
+#include "bench/common/BenchProcess.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/Sandbox.h"
+#include "tests/harness/ScriptedHttpServer.h"
 
 using namespace harmona::test;
 

@@ -1,4 +1,4 @@
-#include "BenchProcess.h"
+#include "bench/common/BenchProcess.h"
 
 #include <fcntl.h>
 #include <signal.h>

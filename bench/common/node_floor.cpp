@@ -9,7 +9,7 @@
 #include <cstdlib>
 #include <string>
 
-#include "HarmonaHandler.h"
+#include "src/handler/HarmonaHandler.h"
 
 int main(int argc, char** argv) {
     const char* fromEnvironment = std::getenv("NODE_COUNT");

@@ -17,9 +17,9 @@
 #include <string>
 #include <vector>
 
-#include "ContentDirectory.h"
-#include "LibrarySchema.h"
-#include "sqlite/Database.h"
+#include "platform/lib/sqlite/Database.h"
+#include "services/harmona-mediad/ContentDirectory.h"
+#include "services/medialib/LibrarySchema.h"
 
 namespace {
 

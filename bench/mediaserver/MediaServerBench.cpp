@@ -7,10 +7,10 @@
 #include <string>
 #include <vector>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
-#include "Sandbox.h"
-#include "ScriptedDaemon.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/Sandbox.h"
+#include "tests/harness/ScriptedDaemon.h"
 
 using namespace harmona::test;
 

@@ -10,14 +10,14 @@
 #include <string>
 #include <vector>
 
-#include "BenchProcess.h"
-#include "CgiRunner.h"
-#include "Fixtures.h"
-#include "IPodFixtures.h"
-#include "LocalizedStringParser.h"
-#include "PlaylistFixtures.h"
-#include "Sandbox.h"
-#include "ScriptedDaemon.h"
+#include "bench/common/BenchProcess.h"
+#include "platform/texts/LocalizedStringParser.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/IPodFixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
+#include "tests/harness/Sandbox.h"
+#include "tests/harness/ScriptedDaemon.h"
 
 using namespace harmona::test;
 using harmona::bench::CgiEnvironment;

@@ -23,11 +23,11 @@
 #include <string>
 #include <vector>
 
-#include "BenchProcess.h"
-#include "Fixtures.h"
-#include "Plugin.h"
-#include "Sandbox.h"
-#include "gpod/Database.h"
+#include "bench/common/BenchProcess.h"
+#include "platform/lib/gpod/Database.h"
+#include "platform/plugin/Plugin.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/Sandbox.h"
 
 extern char** environ;
 

@@ -13,9 +13,9 @@
 #include <thread>
 #include <vector>
 
-#include "CgiRunner.h"
-#include "DaemonKit.h"
-#include "Sandbox.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Sandbox.h"
+#include "tests/vanuaudiod/DaemonKit.h"
 
 using namespace harmona::test;
 using SteadyClock = std::chrono::steady_clock;

@@ -1,11 +1,11 @@
-#include "ActionHandler.h"
+#include "platform/cgi/ActionHandler.h"
 
 #include <cstdio>
 #include <memory>
 #include <sstream>
 #include <vector>
 
-#include "JsonWriter.h"
+#include "platform/cgi/JsonWriter.h"
 
 namespace harmona::cgi {
 namespace {

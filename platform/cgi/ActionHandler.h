@@ -4,7 +4,7 @@
 
 #include <json/value.h>
 
-#include "WebMan.h"
+#include "platform/cgi/WebMan.h"
 
 class ActionHandler {
   public:

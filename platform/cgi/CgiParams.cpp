@@ -1,4 +1,4 @@
-#include "CgiParams.h"
+#include "platform/cgi/CgiParams.h"
 
 #include <poll.h>
 #include <strings.h>

@@ -1,4 +1,4 @@
-#include "JsonWriter.h"
+#include "platform/cgi/JsonWriter.h"
 
 #include <json/writer.h>
 
@@ -8,7 +8,7 @@
 #include <cstring>
 #include <map>
 
-#include "Utf8.h"
+#include "platform/cgi/Utf8.h"
 
 namespace harmona::cgi {
 namespace {

@@ -1,4 +1,4 @@
-#include "RequestMemory.h"
+#include "platform/cgi/RequestMemory.h"
 
 #include <sys/resource.h>
 #include <syslog.h>

@@ -1,4 +1,4 @@
-#include "RequestOrigin.h"
+#include "platform/cgi/RequestOrigin.h"
 
 #include <strings.h>
 

@@ -1,4 +1,4 @@
-#include "UILanguage.h"
+#include "platform/cgi/UILanguage.h"
 
 #include <strings.h>
 

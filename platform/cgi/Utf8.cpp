@@ -1,4 +1,4 @@
-#include "Utf8.h"
+#include "platform/cgi/Utf8.h"
 
 #include <vector>
 

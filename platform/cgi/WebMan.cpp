@@ -1,4 +1,4 @@
-#include "WebMan.h"
+#include "platform/cgi/WebMan.h"
 
 #include <unistd.h>
 
@@ -6,10 +6,10 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "AudioUsers.h"
-#include "PlatformPaths.h"
-#include "RequestOrigin.h"
-#include "UILanguage.h"
+#include "platform/cgi/RequestOrigin.h"
+#include "platform/cgi/UILanguage.h"
+#include "platform/paths/PlatformPaths.h"
+#include "platform/users/AudioUsers.h"
 
 namespace {
 

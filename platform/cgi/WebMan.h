@@ -4,7 +4,7 @@
 
 #include <string>
 
-#include "CgiParams.h"
+#include "platform/cgi/CgiParams.h"
 
 // Where a CGI program stands in the platform's web application; 3 is the application's own CGI.
 enum tag_cgi_position { CGI_POSITION_APPLICATION = 3 };

@@ -1,4 +1,4 @@
-#include "WebUtils.h"
+#include "platform/cgi/WebUtils.h"
 
 std::string WebUtils::EncodeHtml(const std::string& text, bool /*flag*/) {
     std::string out;

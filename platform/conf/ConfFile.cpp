@@ -1,4 +1,4 @@
-#include "ConfFile.h"
+#include "platform/conf/ConfFile.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -8,7 +8,7 @@
 #include <cerrno>
 #include <string>
 
-#include "posix/FileDescriptor.h"
+#include "platform/lib/posix/FileDescriptor.h"
 
 namespace harmona::conf {
 namespace {

@@ -1,6 +1,6 @@
-#include "DMABrowse.h"
+#include "platform/dma/DMABrowse.h"
 
-#include "SoapBrowse.h"
+#include "platform/dma/SoapBrowse.h"
 
 DMABrowse::DMABrowse(DMAGENT_BROWSETYPES type, std::string controlUrl)
     : type_(type), controlUrl_(std::move(controlUrl)) {}

@@ -1,4 +1,4 @@
-#include "DMAParser.h"
+#include "platform/dma/DMAParser.h"
 
 #include <syslog.h>
 
@@ -6,9 +6,9 @@
 #include <chrono>
 #include <climits>
 
-#include "HttpPost.h"
-#include "Plugin.h"
-#include "SoapBrowse.h"
+#include "platform/dma/HttpPost.h"
+#include "platform/dma/SoapBrowse.h"
+#include "platform/plugin/Plugin.h"
 
 namespace {
 

@@ -6,8 +6,8 @@
 #include <string>
 #include <vector>
 
-#include "DMABrowse.h"
-#include "ItemNode.h"
+#include "platform/dma/DMABrowse.h"
+#include "platform/dma/ItemNode.h"
 
 class DMAParser {
   public:

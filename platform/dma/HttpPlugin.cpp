@@ -3,8 +3,8 @@
 #include <cstdio>
 #include <cstring>
 
-#include "HttpPost.h"
-#include "curl/Easy.h"
+#include "platform/dma/HttpPost.h"
+#include "platform/lib/curl/Easy.h"
 
 namespace {
 

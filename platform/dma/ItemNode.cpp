@@ -1,4 +1,4 @@
-#include "ItemNode.h"
+#include "platform/dma/ItemNode.h"
 
 namespace {
 

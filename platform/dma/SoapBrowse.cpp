@@ -1,4 +1,4 @@
-#include "SoapBrowse.h"
+#include "platform/dma/SoapBrowse.h"
 
 #include <array>
 #include <cstdlib>
@@ -6,7 +6,7 @@
 #include <pugixml.hpp>
 #include <string_view>
 
-#include "ItemNode.h"
+#include "platform/dma/ItemNode.h"
 
 namespace harmona::dma {
 

@@ -5,7 +5,7 @@
 #include <cstdint>
 #include <string>
 
-#include "PlaylistRecord.h"
+#include "platform/playlist/PlaylistRecord.h"
 
 // Lists the playlists of the attached iPod: the mountpoint file's first line names the folder that
 // holds iPod_Control; its database is read with libgpod (loaded on demand, see IPodPluginApi.h).

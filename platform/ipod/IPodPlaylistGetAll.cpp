@@ -14,11 +14,11 @@
 #include <cstring>
 #include <string>
 
-#include "IPodPlaylist.h"
-#include "IPodPluginApi.h"
-#include "PlatformPaths.h"
-#include "Plugin.h"
-#include "posix/ChildProcess.h"
+#include "platform/ipod/IPodPlaylist.h"
+#include "platform/ipod/IPodPluginApi.h"
+#include "platform/lib/posix/ChildProcess.h"
+#include "platform/paths/PlatformPaths.h"
+#include "platform/plugin/Plugin.h"
 
 namespace harmona::ipod {
 namespace {

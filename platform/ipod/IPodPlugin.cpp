@@ -1,7 +1,7 @@
 // The libgpod side of the iPod library, built as a MODULE plugin: loading it brings libgpod, GLib
 // and their dependencies into the process, which only the requests that read the iPod pay for.
-#include "IPodPluginApi.h"
-#include "gpod/Database.h"
+#include "platform/ipod/IPodPluginApi.h"
+#include "platform/lib/gpod/Database.h"
 
 extern "C" __attribute__((visibility("default"))) int harmona_ipod_list_playlists_v1(
     const char* mountpoint, harmona_ipod_playlist_sink sink, void* context) {

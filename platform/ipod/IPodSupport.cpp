@@ -7,8 +7,8 @@
 #include <cstdio>
 #include <cstring>
 
-#include "IPodPlaylist.h"
-#include "posix/FileDescriptor.h"
+#include "platform/ipod/IPodPlaylist.h"
+#include "platform/lib/posix/FileDescriptor.h"
 
 namespace harmona::ipod {
 

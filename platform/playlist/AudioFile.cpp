@@ -6,7 +6,7 @@
 // draw is one B-tree lookup, so the cost does not grow with the table. Only when the id range is
 // small (read it whole, it is cheap) or the ids are very sparse (too many draws miss) is the whole
 // table scanned, with a reservoir sample that keeps memory at `count` ids.
-#include "AudioFile.h"
+#include "platform/playlist/AudioFile.h"
 
 #include <fcntl.h>
 #include <pwd.h>
@@ -26,10 +26,10 @@
 #include <unordered_set>
 #include <vector>
 
-#include "LibraryDatabase.h"
-#include "PlatformPaths.h"
-#include "posix/FileDescriptor.h"
-#include "sqlite/Database.h"
+#include "platform/lib/posix/FileDescriptor.h"
+#include "platform/lib/sqlite/Database.h"
+#include "platform/paths/PlatformPaths.h"
+#include "platform/playlist/LibraryDatabase.h"
 
 namespace harmona::playlist {
 namespace {

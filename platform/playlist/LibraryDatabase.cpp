@@ -1,10 +1,10 @@
-#include "LibraryDatabase.h"
+#include "platform/playlist/LibraryDatabase.h"
 
 #include <sys/stat.h>
 
 #include <cerrno>
 
-#include "PlaylistList.h"
+#include "platform/playlist/PlaylistList.h"
 
 namespace harmona::playlist {
 

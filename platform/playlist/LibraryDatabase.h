@@ -3,7 +3,7 @@
 // there could block or feed the reader endlessly).
 #pragma once
 
-#include "sqlite/Database.h"
+#include "platform/lib/sqlite/Database.h"
 
 namespace harmona::playlist {
 

@@ -1,4 +1,4 @@
-#include "PlaylistFile.h"
+#include "platform/playlist/PlaylistFile.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <string_view>
 
-#include "posix/FileDescriptor.h"
+#include "platform/lib/posix/FileDescriptor.h"
 
 namespace harmona::playlist {
 

@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "PlaylistRecord.h"
+#include "platform/playlist/PlaylistRecord.h"
 
 namespace harmona::playlist {
 

@@ -1,4 +1,4 @@
-#include "PlaylistList.h"
+#include "platform/playlist/PlaylistList.h"
 
 #include <dirent.h>
 #include <fcntl.h>
@@ -12,9 +12,9 @@
 #include <string_view>
 #include <vector>
 
-#include "LibraryDatabase.h"
-#include "PlatformPaths.h"
-#include "sqlite/Database.h"
+#include "platform/lib/sqlite/Database.h"
+#include "platform/paths/PlatformPaths.h"
+#include "platform/playlist/LibraryDatabase.h"
 
 namespace harmona::playlist {
 namespace {

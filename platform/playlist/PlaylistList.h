@@ -2,7 +2,7 @@
 // (platform/README.md, "Playlists and smart playlists").
 #pragma once
 
-#include "PlaylistRecord.h"
+#include "platform/playlist/PlaylistRecord.h"
 
 // The personal playlists of the user whose preference directory is `prefDir`: the regular files of
 // `<prefDir>/playlists/` whose names end in ".m3u" or ".m3u8" (any letter case), named without that

@@ -1,4 +1,4 @@
-#include "PlaylistRecord.h"
+#include "platform/playlist/PlaylistRecord.h"
 
 #include <syslog.h>
 

@@ -1,13 +1,13 @@
-#include "VanuAudioUtils.h"
+#include "platform/playlist/VanuAudioUtils.h"
 
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <string>
 
-#include "ConfFile.h"
-#include "PlatformPaths.h"
-#include "PlaylistRecord.h"
+#include "platform/conf/ConfFile.h"
+#include "platform/paths/PlatformPaths.h"
+#include "platform/playlist/PlaylistRecord.h"
 
 namespace {
 

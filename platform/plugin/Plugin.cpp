@@ -1,4 +1,4 @@
-#include "Plugin.h"
+#include "platform/plugin/Plugin.h"
 
 #include <dlfcn.h>
 #include <limits.h>

@@ -1,4 +1,4 @@
-#include "VanuSystem.h"
+#include "platform/system/VanuSystem.h"
 
 #include <fcntl.h>
 #include <signal.h>
@@ -10,8 +10,8 @@
 #include <cstring>
 #include <string>
 
-#include "ConfFile.h"
-#include "PlatformPaths.h"
+#include "platform/conf/ConfFile.h"
+#include "platform/paths/PlatformPaths.h"
 
 int VANUAudioConfGet(const char* key, char* buffer, int size) {
     if (key == nullptr || buffer == nullptr || size < 1)

@@ -1,8 +1,8 @@
-#include "LocalizedStringParser.h"
+#include "platform/texts/LocalizedStringParser.h"
 
 #include <syslog.h>
 
-#include "ConfFile.h"
+#include "platform/conf/ConfFile.h"
 
 namespace VANU::ZET {
 namespace {

@@ -1,9 +1,9 @@
-#include "AudioUsers.h"
+#include "platform/users/AudioUsers.h"
 
 #include <cstdint>
 
-#include "ConfFile.h"
-#include "PlatformPaths.h"
+#include "platform/conf/ConfFile.h"
+#include "platform/paths/PlatformPaths.h"
 
 namespace harmona::users {
 

@@ -1,4 +1,4 @@
-#include "Indexer.h"
+#include "services/harmona-index/Indexer.h"
 
 #include <dirent.h>
 #include <fcntl.h>
@@ -15,10 +15,10 @@
 #include <unordered_map>
 #include <vector>
 
-#include "LibrarySchema.h"
-#include "MediaFiles.h"
-#include "TagReader.h"
-#include "sqlite/Database.h"
+#include "platform/lib/sqlite/Database.h"
+#include "services/harmona-index/TagReader.h"
+#include "services/medialib/LibrarySchema.h"
+#include "services/medialib/MediaFiles.h"
 
 namespace harmona::index {
 namespace {

@@ -1,4 +1,4 @@
-#include "TagReader.h"
+#include "services/harmona-index/TagReader.h"
 
 #include <taglib/fileref.h>
 #include <taglib/tag.h>
@@ -6,7 +6,7 @@
 
 #include <cstdlib>
 
-#include "Utf8.h"
+#include "platform/cgi/Utf8.h"
 
 namespace harmona::index {
 namespace {

@@ -4,9 +4,9 @@
 
 #include <cstdio>
 
-#include "Indexer.h"
-#include "MediaFiles.h"
-#include "PlatformPaths.h"
+#include "platform/paths/PlatformPaths.h"
+#include "services/harmona-index/Indexer.h"
+#include "services/medialib/MediaFiles.h"
 
 int main() {
     openlog("harmona-index", LOG_PID, LOG_DAEMON);

@@ -1,8 +1,8 @@
-#include "ConnectionManagerService.h"
+#include "services/harmona-mediad/ConnectionManagerService.h"
 
 #include <string>
 
-#include "gupnp/ServiceAction.h"
+#include "platform/lib/gupnp/ServiceAction.h"
 
 namespace harmona::mediad {
 namespace {

@@ -6,8 +6,8 @@
 
 #include <vector>
 
-#include "gupnp/Object.h"
-#include "gupnp/Signal.h"
+#include "platform/lib/gupnp/Object.h"
+#include "platform/lib/gupnp/Signal.h"
 
 namespace harmona::mediad {
 

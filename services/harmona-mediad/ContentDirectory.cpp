@@ -1,4 +1,4 @@
-#include "ContentDirectory.h"
+#include "services/harmona-mediad/ContentDirectory.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -8,11 +8,11 @@
 #include <deque>
 #include <vector>
 
-#include "DidlWriter.h"
-#include "LibraryView.h"
-#include "MediaFiles.h"
-#include "ObjectIds.h"
-#include "sqlite/Database.h"
+#include "platform/lib/sqlite/Database.h"
+#include "services/harmona-mediad/DidlWriter.h"
+#include "services/harmona-mediad/LibraryView.h"
+#include "services/harmona-mediad/ObjectIds.h"
+#include "services/medialib/MediaFiles.h"
 
 namespace harmona::mediad {
 namespace {

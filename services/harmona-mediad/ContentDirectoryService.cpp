@@ -1,12 +1,12 @@
-#include "ContentDirectoryService.h"
+#include "services/harmona-mediad/ContentDirectoryService.h"
 
 #include <cstdlib>
 #include <memory>
 #include <string>
 #include <utility>
 
-#include "gupnp/MainLoop.h"
-#include "gupnp/ServiceAction.h"
+#include "platform/lib/gupnp/MainLoop.h"
+#include "platform/lib/gupnp/ServiceAction.h"
 
 namespace harmona::mediad {
 namespace {

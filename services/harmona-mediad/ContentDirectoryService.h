@@ -12,9 +12,9 @@
 #include <string>
 #include <vector>
 
-#include "ContentDirectory.h"
-#include "gupnp/Object.h"
-#include "gupnp/Signal.h"
+#include "platform/lib/gupnp/Object.h"
+#include "platform/lib/gupnp/Signal.h"
+#include "services/harmona-mediad/ContentDirectory.h"
 
 namespace harmona::mediad {
 

@@ -1,4 +1,4 @@
-#include "DeviceDescription.h"
+#include "services/harmona-mediad/DeviceDescription.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -8,7 +8,7 @@
 #include <cerrno>
 #include <cstring>
 
-#include "SoapBrowse.h"
+#include "platform/dma/SoapBrowse.h"
 
 namespace harmona::mediad {
 namespace {

@@ -1,9 +1,9 @@
-#include "DidlWriter.h"
+#include "services/harmona-mediad/DidlWriter.h"
 
 #include <cstdio>
 #include <cstring>
 
-#include "Utf8.h"
+#include "platform/cgi/Utf8.h"
 
 namespace harmona::mediad {
 namespace {

@@ -1,4 +1,4 @@
-#include "LibraryView.h"
+#include "services/harmona-mediad/LibraryView.h"
 
 #include <sys/stat.h>
 
@@ -9,12 +9,12 @@
 #include <numeric>
 #include <tuple>
 
-#include "DidlWriter.h"
-#include "LibrarySchema.h"
-#include "MediaFiles.h"
-#include "ObjectIds.h"
-#include "Utf8.h"
-#include "sqlite/Database.h"
+#include "platform/cgi/Utf8.h"
+#include "platform/lib/sqlite/Database.h"
+#include "services/harmona-mediad/DidlWriter.h"
+#include "services/harmona-mediad/ObjectIds.h"
+#include "services/medialib/LibrarySchema.h"
+#include "services/medialib/MediaFiles.h"
 
 namespace harmona::mediad {
 

@@ -1,4 +1,4 @@
-#include "LiveLibrary.h"
+#include "services/harmona-mediad/LiveLibrary.h"
 
 #include <dirent.h>
 #include <fcntl.h>

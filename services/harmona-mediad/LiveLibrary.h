@@ -16,7 +16,7 @@
 #include <thread>
 #include <unordered_map>
 
-#include "Indexer.h"
+#include "services/harmona-index/Indexer.h"
 
 namespace harmona::mediad {
 

@@ -1,4 +1,4 @@
-#include "MediaFileServer.h"
+#include "services/harmona-mediad/MediaFileServer.h"
 
 #include <sys/stat.h>
 #include <unistd.h>
@@ -7,8 +7,8 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "MediaFiles.h"
-#include "ShareFile.h"
+#include "services/harmona-mediad/ShareFile.h"
+#include "services/medialib/MediaFiles.h"
 
 namespace harmona::mediad {
 namespace {

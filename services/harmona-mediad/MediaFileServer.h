@@ -10,7 +10,7 @@
 
 #include <string>
 
-#include "ContentDirectory.h"
+#include "services/harmona-mediad/ContentDirectory.h"
 
 namespace harmona::mediad {
 

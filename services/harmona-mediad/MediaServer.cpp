@@ -1,4 +1,4 @@
-#include "MediaServer.h"
+#include "services/harmona-mediad/MediaServer.h"
 
 #include <arpa/inet.h>
 #include <net/if.h>
@@ -11,7 +11,7 @@
 #include <cerrno>
 #include <cstring>
 
-#include "DeviceDescription.h"
+#include "services/harmona-mediad/DeviceDescription.h"
 
 namespace harmona::mediad {
 namespace {

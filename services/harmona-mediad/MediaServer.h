@@ -12,14 +12,14 @@
 #include <string>
 #include <vector>
 
-#include "ConnectionManagerService.h"
-#include "ContentDirectory.h"
-#include "ContentDirectoryService.h"
-#include "MediaFileServer.h"
-#include "SubscriptionGuard.h"
-#include "gupnp/MainLoop.h"
-#include "gupnp/Object.h"
-#include "gupnp/Signal.h"
+#include "platform/lib/gupnp/MainLoop.h"
+#include "platform/lib/gupnp/Object.h"
+#include "platform/lib/gupnp/Signal.h"
+#include "services/harmona-mediad/ConnectionManagerService.h"
+#include "services/harmona-mediad/ContentDirectory.h"
+#include "services/harmona-mediad/ContentDirectoryService.h"
+#include "services/harmona-mediad/MediaFileServer.h"
+#include "services/harmona-mediad/SubscriptionGuard.h"
 
 namespace harmona::mediad {
 

@@ -1,4 +1,4 @@
-#include "ObjectIds.h"
+#include "services/harmona-mediad/ObjectIds.h"
 
 #include <cctype>
 #include <cstdlib>

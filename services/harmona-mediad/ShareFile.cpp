@@ -1,4 +1,4 @@
-#include "ShareFile.h"
+#include "services/harmona-mediad/ShareFile.h"
 
 #include <fcntl.h>
 #include <linux/openat2.h>

@@ -1,4 +1,4 @@
-#include "SubscriptionGuard.h"
+#include "services/harmona-mediad/SubscriptionGuard.h"
 
 #include <syslog.h>
 

@@ -12,7 +12,7 @@
 #include <map>
 #include <string>
 
-#include "gupnp/Signal.h"
+#include "platform/lib/gupnp/Signal.h"
 
 namespace harmona::mediad {
 

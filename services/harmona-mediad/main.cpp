@@ -25,12 +25,12 @@
 #include <cstring>
 #include <string>
 
-#include "DeviceDescription.h"
-#include "LiveLibrary.h"
-#include "MediaFiles.h"
-#include "MediaServer.h"
-#include "PlatformPaths.h"
-#include "gupnp/MainLoop.h"
+#include "platform/lib/gupnp/MainLoop.h"
+#include "platform/paths/PlatformPaths.h"
+#include "services/harmona-mediad/DeviceDescription.h"
+#include "services/harmona-mediad/LiveLibrary.h"
+#include "services/harmona-mediad/MediaServer.h"
+#include "services/medialib/MediaFiles.h"
 
 namespace {
 

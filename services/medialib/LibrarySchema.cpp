@@ -1,4 +1,4 @@
-#include "LibrarySchema.h"
+#include "services/medialib/LibrarySchema.h"
 
 namespace harmona::medialib {
 using sqlite::Database;

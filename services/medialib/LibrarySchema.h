@@ -5,7 +5,7 @@
 
 #include <cstdint>
 
-#include "sqlite/Database.h"
+#include "platform/lib/sqlite/Database.h"
 
 namespace harmona::medialib {
 

@@ -1,10 +1,10 @@
-#include "MediaFiles.h"
+#include "services/medialib/MediaFiles.h"
 
 #include <cctype>
 
-#include "AudioDaemon.h"
-#include "PlatformPaths.h"
-#include "VanuSystem.h"
+#include "platform/paths/PlatformPaths.h"
+#include "platform/system/VanuSystem.h"
+#include "src/daemon/AudioDaemon.h"
 
 namespace harmona::medialib {
 namespace {

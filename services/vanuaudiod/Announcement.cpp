@@ -1,13 +1,13 @@
-#include "Announcement.h"
+#include "services/vanuaudiod/Announcement.h"
 
 #include <gio/gio.h>
 
 #include <cstdlib>
 #include <cstring>
 
-#include "Protocol.h"
-#include "Url.h"
-#include "gupnp/Object.h"
+#include "platform/lib/gupnp/Object.h"
+#include "services/vanuaudiod/Protocol.h"
+#include "services/vanuaudiod/Url.h"
 
 namespace vanuaudiod {
 namespace {

@@ -1,4 +1,4 @@
-#include "ControlServer.h"
+#include "services/vanuaudiod/ControlServer.h"
 
 #include <fcntl.h>
 #include <signal.h>

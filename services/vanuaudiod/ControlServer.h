@@ -12,8 +12,8 @@
 #include <string>
 #include <unordered_map>
 
-#include "Protocol.h"
-#include "ServerList.h"
+#include "services/vanuaudiod/Protocol.h"
+#include "services/vanuaudiod/ServerList.h"
 
 namespace vanuaudiod {
 

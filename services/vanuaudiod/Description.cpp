@@ -1,13 +1,13 @@
-#include "Description.h"
+#include "services/vanuaudiod/Description.h"
 
 #include <glib.h>
 #include <pugixml.hpp>
 
 #include <cstring>
 
-#include "Protocol.h"
-#include "Url.h"
-#include "gupnp/Object.h"
+#include "platform/lib/gupnp/Object.h"
+#include "services/vanuaudiod/Protocol.h"
+#include "services/vanuaudiod/Url.h"
 
 namespace vanuaudiod {
 namespace {

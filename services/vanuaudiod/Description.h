@@ -4,7 +4,7 @@
 
 #include <string>
 
-#include "ServerList.h"
+#include "services/vanuaudiod/ServerList.h"
 
 namespace vanuaudiod {
 

@@ -1,4 +1,4 @@
-#include "Discovery.h"
+#include "services/vanuaudiod/Discovery.h"
 
 #include <arpa/inet.h>
 #include <libgssdp/gssdp.h>
@@ -14,13 +14,13 @@
 #include <map>
 #include <memory>
 
-#include "Announcement.h"
-#include "Description.h"
-#include "gupnp/ContextManager.h"
-#include "gupnp/HttpFetch.h"
-#include "gupnp/MainLoop.h"
-#include "gupnp/Object.h"
-#include "gupnp/Signal.h"
+#include "platform/lib/gupnp/ContextManager.h"
+#include "platform/lib/gupnp/HttpFetch.h"
+#include "platform/lib/gupnp/MainLoop.h"
+#include "platform/lib/gupnp/Object.h"
+#include "platform/lib/gupnp/Signal.h"
+#include "services/vanuaudiod/Announcement.h"
+#include "services/vanuaudiod/Description.h"
 
 namespace vanuaudiod {
 namespace {

@@ -12,7 +12,7 @@
 #include <string>
 #include <thread>
 
-#include "ServerList.h"
+#include "services/vanuaudiod/ServerList.h"
 
 namespace vanuaudiod {
 

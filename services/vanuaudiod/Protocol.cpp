@@ -1,4 +1,4 @@
-#include "Protocol.h"
+#include "services/vanuaudiod/Protocol.h"
 
 #include <cerrno>
 #include <climits>

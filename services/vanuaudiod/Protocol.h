@@ -7,7 +7,7 @@
 #include <cstdint>
 #include <string>
 
-#include "ServerList.h"
+#include "services/vanuaudiod/ServerList.h"
 
 namespace vanuaudiod {
 

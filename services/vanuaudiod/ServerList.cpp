@@ -1,4 +1,4 @@
-#include "ServerList.h"
+#include "services/vanuaudiod/ServerList.h"
 
 #include <algorithm>
 

@@ -1,4 +1,4 @@
-#include "Url.h"
+#include "services/vanuaudiod/Url.h"
 
 #include <strings.h>
 

@@ -22,11 +22,11 @@
 #include <cstring>
 #include <string>
 
-#include "ControlServer.h"
-#include "DaemonAccount.h"
-#include "Discovery.h"
-#include "PlatformPaths.h"
-#include "ServerList.h"
+#include "platform/paths/DaemonAccount.h"
+#include "platform/paths/PlatformPaths.h"
+#include "services/vanuaudiod/ControlServer.h"
+#include "services/vanuaudiod/Discovery.h"
+#include "services/vanuaudiod/ServerList.h"
 
 namespace {
 

@@ -5,7 +5,7 @@
 #include <cstring>
 #include <iterator>
 
-#include "AudioDaemon.h"
+#include "src/daemon/AudioDaemon.h"
 
 namespace {
 

@@ -12,10 +12,10 @@
 
 #include <sys/stat.h>
 
-#include "AudioDaemon.h"
-#include "DaemonAccount.h"
-#include "PlatformPaths.h"
-#include "VanuSystem.h"
+#include "platform/paths/DaemonAccount.h"
+#include "platform/paths/PlatformPaths.h"
+#include "platform/system/VanuSystem.h"
+#include "src/daemon/AudioDaemon.h"
 
 namespace {
 

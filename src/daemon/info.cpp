@@ -5,7 +5,7 @@
 #include <cstdio>
 #include <cstring>
 
-#include "AudioDaemon.h"
+#include "src/daemon/AudioDaemon.h"
 
 namespace {
 

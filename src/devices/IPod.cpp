@@ -2,8 +2,8 @@
 #include <cstdio>
 #include <cstring>
 
-#include "HarmonaHandler.h"
-#include "IPodPlaylist.h"
+#include "platform/ipod/IPodPlaylist.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

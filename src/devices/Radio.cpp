@@ -1,5 +1,5 @@
 // The internet radio category's children: a new-station button, then the radio sources.
-#include "HarmonaHandler.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

@@ -1,9 +1,9 @@
 // Request entry: authorizes the caller, reads the permission bits and dispatches on `action`.
-#include "HarmonaHandler.h"
+#include "src/handler/HarmonaHandler.h"
 
 #include <cstring>
 
-#include "AudioUsers.h"
+#include "platform/users/AudioUsers.h"
 
 HarmonaHandler::HarmonaHandler() : userPermission(0) {}
 

@@ -7,7 +7,7 @@
 
 #include <string>
 
-#include "ActionHandler.h"
+#include "platform/cgi/ActionHandler.h"
 
 // Node flags of the tree node record: each sets the boolean attribute of the same name.
 enum : unsigned int {

@@ -3,8 +3,8 @@
 #include <string>
 #include <unordered_set>
 
-#include "HarmonaHandler.h"
-#include "WebUtils.h"
+#include "platform/cgi/WebUtils.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

@@ -1,6 +1,6 @@
 // The entry. One handler, one request; Process's result is the exit status (1 served).
-#include "HarmonaHandler.h"
-#include "RequestMemory.h"
+#include "platform/cgi/RequestMemory.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

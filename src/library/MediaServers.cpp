@@ -8,8 +8,8 @@
 #include <cstring>
 #include <string>
 
-#include "AudioDaemon.h"
-#include "HarmonaHandler.h"
+#include "src/daemon/AudioDaemon.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

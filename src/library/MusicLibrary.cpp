@@ -3,10 +3,10 @@
 #include <cstring>
 #include <memory>
 
-#include "DMABrowse.h"
-#include "DMAParser.h"
-#include "HarmonaHandler.h"
-#include "PlatformPaths.h"
+#include "platform/dma/DMABrowse.h"
+#include "platform/dma/DMAParser.h"
+#include "platform/paths/PlatformPaths.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

@@ -1,7 +1,7 @@
 // The children of the two playlist categories, personal and shared: a refresh button, a
 // new-playlist button where the user may create one, then the category's playlists and smart
 // playlists.
-#include "HarmonaHandler.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

@@ -4,8 +4,8 @@
 #include <cstdio>
 #include <cstring>
 
-#include "HarmonaHandler.h"
-#include "PlaylistList.h"
+#include "platform/playlist/PlaylistList.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

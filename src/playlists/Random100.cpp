@@ -2,8 +2,8 @@
 // error reply.
 #include <cstdio>
 
-#include "AudioFile.h"
-#include "HarmonaHandler.h"
+#include "platform/playlist/AudioFile.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

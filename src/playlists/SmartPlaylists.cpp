@@ -1,6 +1,6 @@
 // The smart playlist listing: one leaf per smart playlist of the personal or the shared category,
 // sorted by name ignoring case.
-#include "SmartPlaylists.h"
+#include "src/playlists/SmartPlaylists.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -8,9 +8,9 @@
 #include <string>
 #include <vector>
 
-#include "HarmonaHandler.h"
-#include "VanuAudioUtils.h"
-#include "VanuSystem.h"
+#include "platform/playlist/VanuAudioUtils.h"
+#include "platform/system/VanuSystem.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

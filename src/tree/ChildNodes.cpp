@@ -2,7 +2,7 @@
 #include <cstring>
 #include <utility>
 
-#include "HarmonaHandler.h"
+#include "src/handler/HarmonaHandler.h"
 
 int HarmonaHandler::GetChildNodes(const char* nodeId) {
     Json::Value reply;

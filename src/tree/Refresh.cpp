@@ -1,9 +1,9 @@
 // Refresh action: the iPod's or a playlist category's children again, in a success reply.
-#include "Refresh.h"
+#include "src/tree/Refresh.h"
 
 #include <cstring>
 
-#include "HarmonaHandler.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace harmona::tree {
 namespace {

@@ -1,11 +1,11 @@
 // Root tree: the top-level categories, each with its children, in one reply.
-#include "RootTree.h"
+#include "src/tree/RootTree.h"
 
 #include <sys/stat.h>
 
-#include "HarmonaHandler.h"
-#include "PlatformPaths.h"
-#include "VanuSystem.h"
+#include "platform/paths/PlatformPaths.h"
+#include "platform/system/VanuSystem.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace harmona::tree {
 

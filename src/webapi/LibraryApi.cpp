@@ -1,4 +1,4 @@
-#include "LibraryApi.h"
+#include "src/webapi/LibraryApi.h"
 
 #include <dirent.h>
 #include <sys/stat.h>
@@ -9,14 +9,14 @@
 #include <memory>
 #include <string_view>
 
-#include "AudioUsers.h"
-#include "DMABrowse.h"
-#include "DMAParser.h"
-#include "HarmonaHandler.h"
-#include "LocalizedStringParser.h"
-#include "MediaFiles.h"
-#include "PlatformPaths.h"
-#include "PlaylistFile.h"
+#include "platform/dma/DMABrowse.h"
+#include "platform/dma/DMAParser.h"
+#include "platform/paths/PlatformPaths.h"
+#include "platform/playlist/PlaylistFile.h"
+#include "platform/texts/LocalizedStringParser.h"
+#include "platform/users/AudioUsers.h"
+#include "services/medialib/MediaFiles.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace harmona::webapi {
 

@@ -12,9 +12,9 @@
 
 #include <string>
 
-#include "ActionHandler.h"
-#include "DMAParser.h"
-#include "TrackCatalog.h"
+#include "platform/cgi/ActionHandler.h"
+#include "platform/dma/DMAParser.h"
+#include "src/webapi/TrackCatalog.h"
 
 namespace harmona::webapi {
 

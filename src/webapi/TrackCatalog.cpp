@@ -1,9 +1,9 @@
-#include "TrackCatalog.h"
+#include "src/webapi/TrackCatalog.h"
 
 #include <cstdlib>
 #include <string_view>
 
-#include "MediaFiles.h"
+#include "services/medialib/MediaFiles.h"
 
 namespace harmona::webapi {
 

@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "LibraryDatabase.h"
+#include "platform/playlist/LibraryDatabase.h"
 
 namespace harmona::webapi {
 

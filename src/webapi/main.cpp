@@ -1,6 +1,6 @@
 // The entry of webapi/library.cgi: one request, within the same memory bound as the tree CGI.
-#include "LibraryApi.h"
-#include "RequestMemory.h"
+#include "platform/cgi/RequestMemory.h"
+#include "src/webapi/LibraryApi.h"
 
 namespace {
 

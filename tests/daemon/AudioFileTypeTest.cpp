@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "AudioDaemon.h"
+#include "src/daemon/AudioDaemon.h"
 
 namespace {
 

@@ -16,9 +16,9 @@
 #include <thread>
 #include <vector>
 
-#include "AudioDaemon.h"
-#include "DaemonTestSupport.h"
-#include "ScriptedDaemon.h"
+#include "src/daemon/AudioDaemon.h"
+#include "tests/daemon/DaemonTestSupport.h"
+#include "tests/harness/ScriptedDaemon.h"
 
 using namespace harmona::test;
 

@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "Sandbox.h"
+#include "tests/harness/Sandbox.h"
 
 namespace harmona::test {
 

@@ -7,9 +7,9 @@
 #include <string>
 #include <vector>
 
-#include "AudioDaemon.h"
-#include "DaemonTestSupport.h"
-#include "Fixtures.h"
+#include "src/daemon/AudioDaemon.h"
+#include "tests/daemon/DaemonTestSupport.h"
+#include "tests/harness/Fixtures.h"
 
 using namespace harmona::test;
 

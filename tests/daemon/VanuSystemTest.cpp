@@ -10,8 +10,8 @@
 #include <cstring>
 #include <string>
 
-#include "Fixtures.h"
-#include "VanuSystem.h"
+#include "platform/system/VanuSystem.h"
+#include "tests/harness/Fixtures.h"
 
 using namespace harmona::test;
 

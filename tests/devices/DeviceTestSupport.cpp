@@ -1,8 +1,8 @@
-#include "DeviceTestSupport.h"
+#include "tests/devices/DeviceTestSupport.h"
 
 #include <cstdlib>
 
-#include "Fixtures.h"
+#include "tests/harness/Fixtures.h"
 
 namespace harmona::test {
 

@@ -8,7 +8,7 @@
 #include <memory>
 #include <string>
 
-#include "HarmonaHandler.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace harmona::test {
 

@@ -2,8 +2,8 @@
 // fails after building a list. (Under AddressSanitizer a list that is not freed fails the run.)
 #include <gtest/gtest.h>
 
-#include "DeviceTestSupport.h"
-#include "ScriptedIPodLibrary.h"
+#include "tests/devices/DeviceTestSupport.h"
+#include "tests/devices/ScriptedIPodLibrary.h"
 
 using namespace harmona::test;
 

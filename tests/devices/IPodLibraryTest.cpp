@@ -7,11 +7,11 @@
 #include <utility>
 #include <vector>
 
-#include "Fixtures.h"
-#include "IPodFixtures.h"
-#include "IPodPlaylist.h"
-#include "IPodPluginApi.h"
-#include "Plugin.h"
+#include "platform/ipod/IPodPlaylist.h"
+#include "platform/ipod/IPodPluginApi.h"
+#include "platform/plugin/Plugin.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/IPodFixtures.h"
 
 using namespace harmona::test;
 

@@ -8,9 +8,9 @@
 #include <string>
 #include <vector>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
-#include "Plugin.h"
+#include "platform/plugin/Plugin.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
 
 using namespace harmona::test;
 

@@ -3,10 +3,10 @@
 // action that show them through a request have tests of their own.
 #include <gtest/gtest.h>
 
-#include "DeviceTestSupport.h"
-#include "Fixtures.h"
-#include "IPodFixtures.h"
-#include "Sandbox.h"
+#include "tests/devices/DeviceTestSupport.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/IPodFixtures.h"
+#include "tests/harness/Sandbox.h"
 
 using namespace harmona::test;
 

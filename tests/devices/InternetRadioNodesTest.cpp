@@ -2,8 +2,8 @@
 // seen; the root tree shows it through a request and has tests of its own.
 #include <gtest/gtest.h>
 
-#include "DeviceTestSupport.h"
-#include "Fixtures.h"
+#include "tests/devices/DeviceTestSupport.h"
+#include "tests/harness/Fixtures.h"
 
 using namespace harmona::test;
 

@@ -1,6 +1,6 @@
-#include "ScriptedIPodLibrary.h"
+#include "tests/devices/ScriptedIPodLibrary.h"
 
-#include "IPodPlaylist.h"
+#include "platform/ipod/IPodPlaylist.h"
 
 namespace harmona::test {
 

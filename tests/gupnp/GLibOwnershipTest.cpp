@@ -2,9 +2,9 @@
 // object they refer to went first.
 #include <gtest/gtest.h>
 
-#include "gupnp/MainLoop.h"
-#include "gupnp/Object.h"
-#include "gupnp/Signal.h"
+#include "platform/lib/gupnp/MainLoop.h"
+#include "platform/lib/gupnp/Object.h"
+#include "platform/lib/gupnp/Signal.h"
 
 namespace {
 

@@ -2,8 +2,8 @@
 // as the exit status of "avoid_timeout" (1) and of an unknown action (0) shows them.
 #include <gtest/gtest.h>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
 
 using namespace harmona::test;
 

@@ -1,8 +1,8 @@
 // Request entry (the caller's name and permission) and action dispatch, through the real CGI.
 #include <gtest/gtest.h>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
 
 using namespace harmona::test;
 

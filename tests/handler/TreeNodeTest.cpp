@@ -1,7 +1,7 @@
 // The tree node record that every builder fills: encoded text and tip, optional members, flags.
 #include <gtest/gtest.h>
 
-#include "HarmonaHandler.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace {
 

@@ -4,8 +4,8 @@
 
 #include <cstdlib>
 
-#include "Fixtures.h"
-#include "HarmonaHandler.h"
+#include "src/handler/HarmonaHandler.h"
+#include "tests/harness/Fixtures.h"
 
 using namespace harmona::test;
 

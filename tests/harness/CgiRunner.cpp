@@ -1,4 +1,4 @@
-#include "CgiRunner.h"
+#include "tests/harness/CgiRunner.h"
 
 #include <gtest/gtest.h>
 

@@ -10,7 +10,7 @@
 #include <utility>
 #include <vector>
 
-#include "Sandbox.h"
+#include "tests/harness/Sandbox.h"
 
 namespace harmona::test {
 

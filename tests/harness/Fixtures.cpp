@@ -1,4 +1,4 @@
-#include "Fixtures.h"
+#include "tests/harness/Fixtures.h"
 
 #include <dirent.h>
 #include <ftw.h>

@@ -1,11 +1,11 @@
-#include "IPodFixtures.h"
+#include "tests/harness/IPodFixtures.h"
 
 #include <cinttypes>
 #include <cstdio>
 #include <stdexcept>
 
-#include "Fixtures.h"
-#include "gpod/Database.h"
+#include "platform/lib/gpod/Database.h"
+#include "tests/harness/Fixtures.h"
 
 namespace harmona::test {
 

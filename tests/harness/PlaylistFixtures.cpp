@@ -1,12 +1,12 @@
-#include "PlaylistFixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
 
 #include <unistd.h>
 
 #include <future>
 #include <stdexcept>
 
-#include "Fixtures.h"
-#include "sqlite/Database.h"
+#include "platform/lib/sqlite/Database.h"
+#include "tests/harness/Fixtures.h"
 
 namespace harmona::test {
 namespace {

@@ -1,4 +1,4 @@
-#include "Sandbox.h"
+#include "tests/harness/Sandbox.h"
 
 #include <fcntl.h>
 #include <net/if.h>

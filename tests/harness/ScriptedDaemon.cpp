@@ -1,4 +1,4 @@
-#include "ScriptedDaemon.h"
+#include "tests/harness/ScriptedDaemon.h"
 
 #include <fcntl.h>
 #include <poll.h>

@@ -1,4 +1,4 @@
-#include "ScriptedHttpServer.h"
+#include "tests/harness/ScriptedHttpServer.h"
 
 #include <arpa/inet.h>
 #include <fcntl.h>

@@ -1,7 +1,7 @@
 // main() of every test program: enters the sandbox once, and gives each test fresh, empty roots.
 #include <gtest/gtest.h>
 
-#include "Sandbox.h"
+#include "tests/harness/Sandbox.h"
 
 namespace {
 

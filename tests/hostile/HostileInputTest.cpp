@@ -15,14 +15,14 @@
 #include <cerrno>
 #include <map>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
-#include "IPodFixtures.h"
-#include "PlaylistFixtures.h"
-#include "RequestMemory.h"
-#include "ScriptedDaemon.h"
-#include "ScriptedHttpServer.h"
-#include "SoapBrowse.h"
+#include "platform/cgi/RequestMemory.h"
+#include "platform/dma/SoapBrowse.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/IPodFixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
+#include "tests/harness/ScriptedDaemon.h"
+#include "tests/harness/ScriptedHttpServer.h"
 
 using namespace harmona::test;
 using Strings = std::vector<std::string>;

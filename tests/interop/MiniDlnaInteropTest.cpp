@@ -13,9 +13,9 @@
 #include <set>
 #include <thread>
 
-#include "DMABrowse.h"
-#include "DMAParser.h"
-#include "Fixtures.h"
+#include "platform/dma/DMABrowse.h"
+#include "platform/dma/DMAParser.h"
+#include "tests/harness/Fixtures.h"
 
 using namespace harmona::test;
 

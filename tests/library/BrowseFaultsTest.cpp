@@ -7,8 +7,8 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
-#include "LibraryFixture.h"
-#include "ScriptedHttpServer.h"
+#include "tests/harness/ScriptedHttpServer.h"
+#include "tests/library/LibraryFixture.h"
 
 using namespace harmona::test;
 

@@ -5,10 +5,10 @@
 
 #include <pugixml.hpp>
 
-#include "DMABrowse.h"
-#include "DMAParser.h"
-#include "ScriptedHttpServer.h"
-#include "SoapBrowse.h"
+#include "platform/dma/DMABrowse.h"
+#include "platform/dma/DMAParser.h"
+#include "platform/dma/SoapBrowse.h"
+#include "tests/harness/ScriptedHttpServer.h"
 
 using namespace harmona::test;
 using namespace harmona::dma;

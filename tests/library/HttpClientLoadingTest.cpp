@@ -6,8 +6,8 @@
 #include <cstdio>
 #include <cstring>
 
-#include "LibraryFixture.h"
-#include "ScriptedHttpServer.h"
+#include "tests/harness/ScriptedHttpServer.h"
+#include "tests/library/LibraryFixture.h"
 
 using namespace harmona::test;
 

@@ -6,8 +6,8 @@
 
 #include <string>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
 
 namespace harmona::test {
 

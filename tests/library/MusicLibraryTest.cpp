@@ -3,9 +3,9 @@
 #include <gtest/gtest.h>
 #include <stdlib.h>
 
-#include "HarmonaHandler.h"
-#include "LibraryFixture.h"
-#include "ScriptedHttpServer.h"
+#include "src/handler/HarmonaHandler.h"
+#include "tests/harness/ScriptedHttpServer.h"
+#include "tests/library/LibraryFixture.h"
 
 using namespace harmona::test;
 

@@ -14,15 +14,15 @@
 #include <thread>
 #include <vector>
 
-#include "ContentDirectory.h"
-#include "DidlDocument.h"
-#include "Fixtures.h"
-#include "LibrarySchema.h"
-#include "MediadTestKit.h"
-#include "PlaylistFixtures.h"
-#include "Sandbox.h"
-#include "Utf8.h"
-#include "sqlite/Database.h"
+#include "platform/cgi/Utf8.h"
+#include "platform/lib/sqlite/Database.h"
+#include "services/harmona-mediad/ContentDirectory.h"
+#include "services/medialib/LibrarySchema.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
+#include "tests/harness/Sandbox.h"
+#include "tests/mediad/DidlDocument.h"
+#include "tests/mediad/MediadTestKit.h"
 
 namespace harmona::test::mediad {
 namespace {

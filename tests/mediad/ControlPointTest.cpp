@@ -7,7 +7,7 @@
 #include <cstdio>
 #include <string>
 
-#include "MediadTestKit.h"
+#include "tests/mediad/MediadTestKit.h"
 
 namespace harmona::test::mediad {
 namespace {

@@ -1,4 +1,4 @@
-#include "DidlDocument.h"
+#include "tests/mediad/DidlDocument.h"
 
 #include <libgupnp-av/gupnp-av.h>
 #include <libxml/parser.h>
@@ -6,8 +6,8 @@
 
 #include <pugixml.hpp>
 
-#include "gupnp/Object.h"
-#include "gupnp/Signal.h"
+#include "platform/lib/gupnp/Object.h"
+#include "platform/lib/gupnp/Signal.h"
 
 namespace harmona::test::mediad {
 namespace {

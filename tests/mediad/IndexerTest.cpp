@@ -8,10 +8,10 @@
 #include <string>
 #include <vector>
 
-#include "Fixtures.h"
-#include "MediadTestKit.h"
-#include "PlaylistFixtures.h"
-#include "Sandbox.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
+#include "tests/harness/Sandbox.h"
+#include "tests/mediad/MediadTestKit.h"
 
 namespace harmona::test::mediad {
 namespace {

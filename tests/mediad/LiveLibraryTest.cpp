@@ -18,13 +18,13 @@
 #include <thread>
 #include <vector>
 
-#include "ContentDirectory.h"
-#include "DidlDocument.h"
-#include "Fixtures.h"
-#include "LiveLibrary.h"
-#include "MediadTestKit.h"
-#include "PlaylistFixtures.h"
-#include "Sandbox.h"
+#include "services/harmona-mediad/ContentDirectory.h"
+#include "services/harmona-mediad/LiveLibrary.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
+#include "tests/harness/Sandbox.h"
+#include "tests/mediad/DidlDocument.h"
+#include "tests/mediad/MediadTestKit.h"
 
 namespace harmona::test::mediad {
 namespace {

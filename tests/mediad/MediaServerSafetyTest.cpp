@@ -19,10 +19,10 @@
 #include <thread>
 #include <vector>
 
-#include "Fixtures.h"
-#include "MediadTestKit.h"
-#include "Sandbox.h"
-#include "ShareFile.h"
+#include "services/harmona-mediad/ShareFile.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/Sandbox.h"
+#include "tests/mediad/MediadTestKit.h"
 
 namespace harmona::test::mediad {
 namespace {

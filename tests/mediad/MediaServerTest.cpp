@@ -15,11 +15,11 @@
 #include <string>
 #include <thread>
 
-#include "CgiRunner.h"
-#include "DMABrowse.h"
-#include "DMAParser.h"
-#include "Fixtures.h"
-#include "MediadTestKit.h"
+#include "platform/dma/DMABrowse.h"
+#include "platform/dma/DMAParser.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/mediad/MediadTestKit.h"
 
 namespace harmona::test::mediad {
 namespace {

@@ -1,4 +1,4 @@
-#include "MediadTestKit.h"
+#include "tests/mediad/MediadTestKit.h"
 
 #include <arpa/inet.h>
 #include <curl/curl.h>
@@ -22,7 +22,7 @@
 #include <sstream>
 #include <thread>
 
-#include "Fixtures.h"
+#include "tests/harness/Fixtures.h"
 
 namespace harmona::test::mediad {
 namespace {

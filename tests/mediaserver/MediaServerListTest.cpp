@@ -11,10 +11,10 @@
 #include <string>
 #include <vector>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
-#include "HarmonaHandler.h"
-#include "ScriptedDaemon.h"
+#include "src/handler/HarmonaHandler.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/ScriptedDaemon.h"
 
 using namespace harmona::test;
 

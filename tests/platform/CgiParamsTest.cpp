@@ -3,7 +3,7 @@
 
 #include <unistd.h>
 
-#include "CgiParams.h"
+#include "platform/cgi/CgiParams.h"
 
 using namespace harmona::cgi;
 

@@ -7,8 +7,8 @@
 #include <string>
 #include <vector>
 
-#include "ConfFile.h"
-#include "Fixtures.h"
+#include "platform/conf/ConfFile.h"
+#include "tests/harness/Fixtures.h"
 
 using harmona::conf::ConfVisitor;
 using harmona::conf::LookupConf;

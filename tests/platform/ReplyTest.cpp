@@ -4,11 +4,11 @@
 
 #include <cstdio>
 
-#include "ActionHandler.h"
-#include "CgiRunner.h"
-#include "JsonWriter.h"
-#include "Utf8.h"
-#include "WebUtils.h"
+#include "platform/cgi/ActionHandler.h"
+#include "platform/cgi/JsonWriter.h"
+#include "platform/cgi/Utf8.h"
+#include "platform/cgi/WebUtils.h"
+#include "tests/harness/CgiRunner.h"
 
 using harmona::cgi::IsValidUtf8;
 using harmona::cgi::RepairUtf8;

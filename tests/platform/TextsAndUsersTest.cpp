@@ -4,9 +4,9 @@
 
 #include <set>
 
-#include "AudioUsers.h"
-#include "Fixtures.h"
-#include "LocalizedStringParser.h"
+#include "platform/texts/LocalizedStringParser.h"
+#include "platform/users/AudioUsers.h"
+#include "tests/harness/Fixtures.h"
 
 using harmona::test::WriteFile;
 

@@ -4,9 +4,9 @@
 
 #include <cstdlib>
 
-#include "Fixtures.h"
-#include "UILanguage.h"
-#include "WebMan.h"
+#include "platform/cgi/UILanguage.h"
+#include "platform/cgi/WebMan.h"
+#include "tests/harness/Fixtures.h"
 
 using namespace harmona::cgi;
 

@@ -14,9 +14,9 @@
 #include <string>
 #include <vector>
 
-#include "CgiRunner.h"
-#include "HarmonaHandler.h"
-#include "Sandbox.h"
+#include "src/handler/HarmonaHandler.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Sandbox.h"
 
 namespace harmona::test {
 

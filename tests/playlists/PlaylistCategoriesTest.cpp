@@ -2,9 +2,9 @@
 // test process (see InProcess.h) over real playlist files and a real library.db.
 #include <gtest/gtest.h>
 
-#include "Fixtures.h"
-#include "InProcess.h"
-#include "PlaylistFixtures.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
+#include "tests/playlists/InProcess.h"
 
 using namespace harmona::test;
 

@@ -3,9 +3,9 @@
 // name that holds "/", which no file name can.
 #include <gtest/gtest.h>
 
-#include "Fixtures.h"
-#include "InProcess.h"
-#include "ScriptedPlaylistPlatform.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/playlists/InProcess.h"
+#include "tests/playlists/ScriptedPlaylistPlatform.h"
 
 using namespace harmona::test;
 

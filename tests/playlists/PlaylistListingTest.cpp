@@ -2,10 +2,10 @@
 // and a real library.db.
 #include <gtest/gtest.h>
 
-#include "Fixtures.h"
-#include "InProcess.h"
-#include "PlaylistFixtures.h"
-#include "Utf8.h"
+#include "platform/cgi/Utf8.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
+#include "tests/playlists/InProcess.h"
 
 using namespace harmona::test;
 

@@ -13,12 +13,12 @@
 #include <map>
 #include <set>
 
-#include "AudioFile.h"
-#include "sqlite/Database.h"
-#include "Fixtures.h"
-#include "PlaylistFixtures.h"
-#include "PlaylistList.h"
-#include "VanuAudioUtils.h"
+#include "platform/lib/sqlite/Database.h"
+#include "platform/playlist/AudioFile.h"
+#include "platform/playlist/PlaylistList.h"
+#include "platform/playlist/VanuAudioUtils.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
 
 using namespace harmona::test;
 

@@ -10,9 +10,9 @@
 #include <map>
 #include <set>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
-#include "PlaylistFixtures.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
 
 extern char** environ;
 

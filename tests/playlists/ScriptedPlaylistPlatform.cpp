@@ -2,10 +2,10 @@
 // produce: a personal playlist name holding "/" (a file name cannot), and a failing smart playlist
 // listing (the real one always succeeds). Defining these symbols here keeps the static libraries'
 // real definitions out of this one program.
-#include "ScriptedPlaylistPlatform.h"
+#include "tests/playlists/ScriptedPlaylistPlatform.h"
 
-#include "HarmonaHandler.h"
-#include "PlaylistList.h"
+#include "platform/playlist/PlaylistList.h"
+#include "src/handler/HarmonaHandler.h"
 
 namespace harmona::test {
 

@@ -2,10 +2,10 @@
 // files.
 #include <gtest/gtest.h>
 
-#include "Fixtures.h"
-#include "InProcess.h"
-#include "PlaylistFixtures.h"
-#include "SmartPlaylists.h"
+#include "src/playlists/SmartPlaylists.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
+#include "tests/playlists/InProcess.h"
 
 using namespace harmona::test;
 

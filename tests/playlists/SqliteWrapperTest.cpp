@@ -3,8 +3,8 @@
 
 #include <utility>
 
-#include "sqlite/Database.h"
-#include "Fixtures.h"
+#include "platform/lib/sqlite/Database.h"
+#include "tests/harness/Fixtures.h"
 
 using harmona::sqlite::Database;
 using harmona::sqlite::Statement;

@@ -2,9 +2,9 @@
 // ContentDirectory.
 #include <gtest/gtest.h>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
-#include "ScriptedHttpServer.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/ScriptedHttpServer.h"
 
 using namespace harmona::test;
 

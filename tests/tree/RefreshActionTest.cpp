@@ -2,13 +2,13 @@
 // error envelope of a failing refresh.
 #include <gtest/gtest.h>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
-#include "HarmonaHandler.h"
-#include "IPodFixtures.h"
-#include "PlaylistFixtures.h"
-#include "Refresh.h"
-#include "TreeFixture.h"
+#include "src/handler/HarmonaHandler.h"
+#include "src/tree/Refresh.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/IPodFixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
+#include "tests/tree/TreeFixture.h"
 
 using namespace harmona::test;
 using Strings = std::vector<std::string>;

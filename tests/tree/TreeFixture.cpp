@@ -1,11 +1,11 @@
-#include "TreeFixture.h"
+#include "tests/tree/TreeFixture.h"
 
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include "Fixtures.h"
-#include "IPodFixtures.h"
-#include "PlaylistFixtures.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/IPodFixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
 
 namespace harmona::test {
 

@@ -7,8 +7,8 @@
 #include <string>
 #include <vector>
 
-#include "CgiRunner.h"
-#include "ScriptedDaemon.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/ScriptedDaemon.h"
 
 namespace harmona::test {
 

@@ -3,7 +3,7 @@
 // routable addresses.
 #include <gtest/gtest.h>
 
-#include "Announcement.h"
+#include "services/vanuaudiod/Announcement.h"
 
 using namespace vanuaudiod;
 

@@ -1,4 +1,4 @@
-#include "DaemonKit.h"
+#include "tests/vanuaudiod/DaemonKit.h"
 
 #include <arpa/inet.h>
 #include <fcntl.h>
@@ -17,7 +17,7 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "Fixtures.h"
+#include "tests/harness/Fixtures.h"
 
 #ifndef HARMONA_VANUAUDIOD_PATH
 #error "HARMONA_VANUAUDIOD_PATH must name the built daemon"

@@ -16,8 +16,8 @@
 #include <thread>
 #include <vector>
 
-#include "CgiRunner.h"
-#include "Sandbox.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Sandbox.h"
 
 namespace harmona::test {
 

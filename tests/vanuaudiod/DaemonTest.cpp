@@ -13,12 +13,12 @@
 #include <cstring>
 #include <future>
 
-#include "DMABrowse.h"
-#include "DMAParser.h"
-#include "DaemonAccount.h"
-#include "DaemonKit.h"
-#include "Fixtures.h"
-#include "gupnp/HttpFetch.h"
+#include "platform/dma/DMABrowse.h"
+#include "platform/dma/DMAParser.h"
+#include "platform/lib/gupnp/HttpFetch.h"
+#include "platform/paths/DaemonAccount.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/vanuaudiod/DaemonKit.h"
 
 using namespace harmona::test;
 

@@ -11,9 +11,9 @@
 #include <chrono>
 #include <thread>
 
-#include "Description.h"
-#include "Url.h"
-#include "gupnp/HttpFetch.h"
+#include "platform/lib/gupnp/HttpFetch.h"
+#include "services/vanuaudiod/Description.h"
+#include "services/vanuaudiod/Url.h"
 
 using namespace vanuaudiod;
 

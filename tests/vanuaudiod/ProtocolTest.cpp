@@ -6,8 +6,8 @@
 
 #include <cstring>
 
-#include "CgiRunner.h"
-#include "Protocol.h"
+#include "services/vanuaudiod/Protocol.h"
+#include "tests/harness/CgiRunner.h"
 
 using namespace vanuaudiod;
 

@@ -1,7 +1,7 @@
 // vanuaudiod's list of found servers: order, byebye, expiry, moved devices, failed descriptions.
 #include <gtest/gtest.h>
 
-#include "ServerList.h"
+#include "services/vanuaudiod/ServerList.h"
 
 using namespace vanuaudiod;
 

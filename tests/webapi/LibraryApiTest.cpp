@@ -8,11 +8,11 @@
 
 #include <string>
 
-#include "CgiRunner.h"
-#include "Fixtures.h"
-#include "PlaylistFixtures.h"
-#include "ScriptedDaemon.h"
-#include "ScriptedHttpServer.h"
+#include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
+#include "tests/harness/PlaylistFixtures.h"
+#include "tests/harness/ScriptedDaemon.h"
+#include "tests/harness/ScriptedHttpServer.h"
 
 using namespace harmona::test;
 

@@ -9,7 +9,7 @@
 #include <fstream>
 #include <string>
 
-#include "LocalizedStringParser.h"
+#include "platform/texts/LocalizedStringParser.h"
 
 namespace {
 

@@ -5,7 +5,7 @@
 // A caller that the platform refuses gets the platform's 401 and no body.
 #include <json/value.h>
 
-#include "ActionHandler.h"
+#include "platform/cgi/ActionHandler.h"
 
 namespace {
 

@@ -1,4 +1,4 @@
-#include "curl/Easy.h"
+#include "platform/lib/curl/Easy.h"
 
 namespace harmona::curl {
 

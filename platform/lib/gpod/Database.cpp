@@ -1,4 +1,4 @@
-#include "gpod/Database.h"
+#include "platform/lib/gpod/Database.h"
 
 namespace harmona::gpod {
 

@@ -1,4 +1,4 @@
-#include "gupnp/ContextManager.h"
+#include "platform/lib/gupnp/ContextManager.h"
 
 #include <utility>
 

@@ -7,8 +7,8 @@
 
 #include <functional>
 
-#include "gupnp/Object.h"
-#include "gupnp/Signal.h"
+#include "platform/lib/gupnp/Object.h"
+#include "platform/lib/gupnp/Signal.h"
 
 namespace harmona::gupnp {
 

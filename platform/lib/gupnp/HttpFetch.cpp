@@ -1,4 +1,4 @@
-#include "gupnp/HttpFetch.h"
+#include "platform/lib/gupnp/HttpFetch.h"
 
 #include <utility>
 

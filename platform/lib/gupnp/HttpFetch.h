@@ -12,7 +12,7 @@
 #include <set>
 #include <string>
 
-#include "gupnp/Object.h"
+#include "platform/lib/gupnp/Object.h"
 
 namespace harmona::gupnp {
 

@@ -1,4 +1,4 @@
-#include "gupnp/MainLoop.h"
+#include "platform/lib/gupnp/MainLoop.h"
 
 #include <gio/gio.h>
 #include <glib-unix.h>

@@ -1,4 +1,4 @@
-#include "gupnp/ServiceAction.h"
+#include "platform/lib/gupnp/ServiceAction.h"
 
 #include <libsoup/soup.h>
 

@@ -1,4 +1,4 @@
-#include "posix/ChildProcess.h"
+#include "platform/lib/posix/ChildProcess.h"
 
 #include <fcntl.h>
 #include <signal.h>

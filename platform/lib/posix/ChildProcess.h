@@ -7,7 +7,7 @@
 
 #include <functional>
 
-#include "posix/FileDescriptor.h"
+#include "platform/lib/posix/FileDescriptor.h"
 
 namespace harmona::posix {
 

@@ -1,4 +1,4 @@
-#include "sqlite/Database.h"
+#include "platform/lib/sqlite/Database.h"
 
 #include <utility>
 
