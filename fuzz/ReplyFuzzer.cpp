@@ -7,8 +7,8 @@
 #include <memory>
 #include <string>
 
+#include "common/util/Utf8.h"
 #include "platform/cgi/ActionHandler.h"
-#include "platform/cgi/Utf8.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     const std::string input(reinterpret_cast<const char*>(data), size);
@@ -29,7 +29,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
         start = bar + 1;
     }
     const std::string text = harmona::cgi::SerializeReply(reply);
-    if (!harmona::cgi::IsValidUtf8(text))
+    if (!harmona::util::IsValidUtf8(text))
         std::abort();
     Json::CharReaderBuilder builder;
     Json::CharReaderBuilder::strictMode(&builder.settings_);
@@ -38,8 +38,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     std::string errors;
     if (!reader->parse(text.data(), text.data() + text.size(), &parsed, &errors))
         std::abort();
-    if (harmona::cgi::RepairUtf8(harmona::cgi::RepairUtf8(input)) !=
-        harmona::cgi::RepairUtf8(input))
+    if (harmona::util::RepairUtf8(harmona::util::RepairUtf8(input)) !=
+        harmona::util::RepairUtf8(input))
         std::abort();
     return 0;
 }

@@ -18,8 +18,8 @@
 #include <vector>
 
 #include "platform/lib/sqlite/Database.h"
+#include "platform/medialib/LibrarySchema.h"
 #include "services/harmona-mediad/ContentDirectory.h"
-#include "services/medialib/LibrarySchema.h"
 
 namespace {
 

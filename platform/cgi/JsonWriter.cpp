@@ -8,7 +8,7 @@
 #include <cstring>
 #include <map>
 
-#include "platform/cgi/Utf8.h"
+#include "common/util/Utf8.h"
 
 namespace harmona::cgi {
 namespace {
@@ -111,7 +111,7 @@ void WriteString(const char* begin, const char* end, Output& out) {
             WriteEscapedChar(c, out);
             ++i;
         } else {
-            const std::size_t length = Utf8SequenceLength(text, i);
+            const std::size_t length = util::Utf8SequenceLength(text, i);
             if (length == 0) {
                 out.text += "\xEF\xBF\xBD";
                 ++i;
@@ -142,8 +142,8 @@ void WriteRepairedMembers(const Json::Value& value, Output& out) {
     for (auto it = value.begin(), end = value.end(); it != end; ++it) {
         const char* nameEnd = nullptr;
         const char* name = it.memberName(&nameEnd);
-        repaired[RepairUtf8(std::string_view(name, static_cast<std::size_t>(nameEnd - name)))] =
-            &*it;
+        repaired[util::RepairUtf8(
+            std::string_view(name, static_cast<std::size_t>(nameEnd - name)))] = &*it;
     }
     bool first = true;
     for (const auto& [name, member] : repaired) {
@@ -164,7 +164,7 @@ void WriteObject(const Json::Value& value, Output& out) {
     for (auto it = value.begin(), end = value.end(); it != end; ++it) {
         const char* nameEnd = nullptr;
         const char* name = it.memberName(&nameEnd);
-        if (!IsValidUtf8(std::string_view(name, static_cast<std::size_t>(nameEnd - name)))) {
+        if (!util::IsValidUtf8(std::string_view(name, static_cast<std::size_t>(nameEnd - name)))) {
             namesValid = false;
             break;
         }

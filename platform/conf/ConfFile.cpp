@@ -8,7 +8,7 @@
 #include <cerrno>
 #include <string>
 
-#include "platform/lib/posix/FileDescriptor.h"
+#include "common/io/FileDescriptor.h"
 
 namespace harmona::conf {
 namespace {
@@ -132,7 +132,7 @@ void ParseConf(std::string_view text, ConfVisitor& visitor) {
 ReadResult ReadConf(const char* path, ConfVisitor& visitor) {
     if (path == nullptr)
         return ReadResult::missing;
-    harmona::posix::FileDescriptor fd(open(path, O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
+    harmona::io::FileDescriptor fd(open(path, O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
     if (fd.Get() < 0)
         return (errno == ENOENT || errno == ENOTDIR) ? ReadResult::missing : ReadResult::unreadable;
     struct stat st {};

@@ -6,45 +6,10 @@
 #include <pugixml.hpp>
 #include <string_view>
 
+#include "common/util/XmlEscape.h"
 #include "platform/dma/ItemNode.h"
 
 namespace harmona::dma {
-
-std::string XmlEscape(const std::string& text) {
-    std::string out;
-    out.reserve(text.size() + text.size() / 8);
-    for (const char c : text) {
-        switch (c) {
-            case '&':
-                out += "&amp;";
-                break;
-            case '<':
-                out += "&lt;";
-                break;
-            case '>':
-                out += "&gt;";
-                break;
-            case '"':
-                out += "&quot;";
-                break;
-            case '\'':
-                out += "&apos;";
-                break;
-            case '\r':
-                out += "&#13;";
-                break;
-            case '\n':
-                out += "&#10;";
-                break;
-            case '\t':
-                out += "&#9;";
-                break;
-            default:
-                out += c;
-        }
-    }
-    return out;
-}
 
 bool IsAbsoluteHttpUrl(const std::string& url) {
     static constexpr char kScheme[] = "http://";
@@ -72,12 +37,12 @@ std::string BuildBrowseEnvelope(const std::string& objectId, const char* browseF
     body += "\" s:encodingStyle=\"http://schemas.xmlsoap.org/soap/encoding/\"><s:Body>";
     body += "<u:Browse xmlns:u=\"";
     body += kContentDirectoryNs;
-    body += "\"><ObjectID>" + XmlEscape(objectId) + "</ObjectID>";
-    body += "<BrowseFlag>" + XmlEscape(browseFlag) + "</BrowseFlag>";
-    body += "<Filter>" + XmlEscape(filter) + "</Filter>";
+    body += "\"><ObjectID>" + util::XmlText(objectId) + "</ObjectID>";
+    body += "<BrowseFlag>" + util::XmlText(browseFlag) + "</BrowseFlag>";
+    body += "<Filter>" + util::XmlText(filter) + "</Filter>";
     body += "<StartingIndex>" + std::to_string(startingIndex) + "</StartingIndex>";
     body += "<RequestedCount>" + std::to_string(requestedCount) + "</RequestedCount>";
-    body += "<SortCriteria>" + XmlEscape(sortCriteria) + "</SortCriteria>";
+    body += "<SortCriteria>" + util::XmlText(sortCriteria) + "</SortCriteria>";
     body += "</u:Browse></s:Body></s:Envelope>\r\n";
     return body;
 }

@@ -46,10 +46,6 @@ inline constexpr std::size_t kMaxBrowseTextBytes = std::size_t{48} << 20;
 // The memory that parsing `didl` would take at most, by the estimate above.
 std::size_t EstimatedDidlTreeBytes(const char* didl, std::size_t size);
 
-// Escapes & < > " ' and CR, LF, TAB (as character references, so that they survive the
-// receiver's line-end and attribute normalisation). Other bytes, UTF-8 included, stay as they are.
-std::string XmlEscape(const std::string& text);
-
 // True for "http://host[:port][/path]" with a non-empty host (scheme case-insensitive).
 bool IsAbsoluteHttpUrl(const std::string& url);
 

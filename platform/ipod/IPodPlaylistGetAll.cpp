@@ -14,9 +14,9 @@
 #include <cstring>
 #include <string>
 
+#include "common/io/ChildProcess.h"
 #include "platform/ipod/IPodPlaylist.h"
 #include "platform/ipod/IPodPluginApi.h"
-#include "platform/lib/posix/ChildProcess.h"
 #include "platform/paths/PlatformPaths.h"
 #include "platform/plugin/Plugin.h"
 
@@ -175,8 +175,8 @@ int VANUIPodPlaylistGetAll(PLAYLIST_INFO** head) {
         return -1;
 
     const Clock::time_point deadline = Clock::now() + std::chrono::milliseconds(kReadTimeoutMs);
-    harmona::posix::FileDescriptor records;
-    harmona::posix::ChildProcess child = harmona::posix::ChildProcess::Start(
+    harmona::io::FileDescriptor records;
+    harmona::io::ChildProcess child = harmona::io::ChildProcess::Start(
         [&mountpoint](int fd) { return ListInChild(mountpoint, fd); }, records);
     if (!child)
         return -1;

@@ -7,8 +7,8 @@
 #include <cstdio>
 #include <cstring>
 
+#include "common/io/FileDescriptor.h"
 #include "platform/ipod/IPodPlaylist.h"
-#include "platform/lib/posix/FileDescriptor.h"
 
 namespace harmona::ipod {
 
@@ -36,7 +36,7 @@ bool ReadMountpoint(const char* path, std::string& mountpoint) {
     mountpoint.clear();
     // O_NONBLOCK: a FIFO planted at the path must not make the request wait; only a regular file
     // is read.
-    const harmona::posix::FileDescriptor file(
+    const harmona::io::FileDescriptor file(
         open(path, O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK));
     if (file.Get() < 0)
         return false;

@@ -26,7 +26,8 @@
 #include <unordered_set>
 #include <vector>
 
-#include "platform/lib/posix/FileDescriptor.h"
+#include "common/io/FileDescriptor.h"
+#include "common/util/Utf8.h"
 #include "platform/lib/sqlite/Database.h"
 #include "platform/paths/PlatformPaths.h"
 #include "platform/playlist/LibraryDatabase.h"
@@ -34,7 +35,7 @@
 namespace harmona::playlist {
 namespace {
 
-using harmona::posix::FileDescriptor;
+using harmona::io::FileDescriptor;
 
 // Artist and title are cut to this many bytes (on a UTF-8 boundary); nothing in the file is
 // trusted, and a display text needs no more.
@@ -70,13 +71,7 @@ Generator SeededGenerator() {
 
 // A playlist line cannot hold a line break; any control byte becomes a space.
 std::string CleanText(std::string_view text) {
-    std::size_t length = text.size();
-    if (length > kMaxTextBytes) {
-        length = kMaxTextBytes;
-        while (length > 0 && (static_cast<unsigned char>(text[length]) & 0xC0) == 0x80)
-            --length;
-    }
-    std::string clean(text.substr(0, length));
+    std::string clean(util::CutUtf8(text, kMaxTextBytes));
     for (char& c : clean) {
         const auto byte = static_cast<unsigned char>(c);
         if (byte < 0x20 || byte == 0x7F)

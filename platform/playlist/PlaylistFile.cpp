@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <string_view>
 
-#include "platform/lib/posix/FileDescriptor.h"
+#include "common/io/FileDescriptor.h"
 
 namespace harmona::playlist {
 
@@ -42,8 +42,8 @@ std::string_view WithoutTrailingCr(std::string_view line) {
 PlaylistFileEntries ReadPlaylistFile(const std::string& path, const std::string& baseDir) {
     PlaylistFileEntries result;
     // O_NONBLOCK: opening a FIFO planted in the file's place must not wait for a writer.
-    posix::FileDescriptor fd(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
-    if (!fd.IsOpen()) {
+    io::FileDescriptor fd(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+    if (!fd) {
         if (errno == ENOENT || errno == ENOTDIR)
             result.status = PlaylistFileStatus::missing;
         return result;

@@ -5,6 +5,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "common/util/Utf8.h"
+
 int VANUPlayListFree(PLAYLIST_INFO* head) {
     while (head != nullptr) {
         PLAYLIST_INFO* next = head->pNext;
@@ -19,12 +21,7 @@ namespace harmona::playlist {
 void CopyUtf8Field(char* field, std::size_t size, std::string_view text) {
     if (size == 0)
         return;
-    std::size_t length = text.size() < size - 1 ? text.size() : size - 1;
-    if (length < text.size()) {
-        // Step back over continuation bytes so that no character is cut in half.
-        while (length > 0 && (static_cast<unsigned char>(text[length]) & 0xC0) == 0x80)
-            --length;
-    }
+    const std::size_t length = util::CutUtf8(text, size - 1).size();
     if (length > 0)  // an empty view may have a null data(), which memcpy must not get
         std::memcpy(field, text.data(), length);
     field[length] = '\0';

@@ -16,9 +16,9 @@
 #include <vector>
 
 #include "platform/lib/sqlite/Database.h"
+#include "platform/medialib/LibrarySchema.h"
+#include "platform/medialib/MediaFiles.h"
 #include "services/harmona-index/TagReader.h"
-#include "services/medialib/LibrarySchema.h"
-#include "services/medialib/MediaFiles.h"
 
 namespace harmona::index {
 namespace {

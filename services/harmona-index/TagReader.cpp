@@ -6,13 +6,13 @@
 
 #include <cstdlib>
 
-#include "platform/cgi/Utf8.h"
+#include "common/util/Utf8.h"
 
 namespace harmona::index {
 namespace {
 
 std::string Utf8(const TagLib::String& text) {
-    return std::string(cgi::CutUtf8(text.to8Bit(true), kMaxTagBytes));
+    return std::string(util::CutUtf8(text.to8Bit(true), kMaxTagBytes));
 }
 
 std::string FirstProperty(const TagLib::PropertyMap& properties, const char* key) {
@@ -36,7 +36,7 @@ std::string TitleFromFileName(const std::string& path) {
     const std::size_t dot = name.rfind('.');
     if (dot != std::string::npos && dot > 0)
         name.erase(dot);
-    return std::string(cgi::CutUtf8(name, kMaxTagBytes));
+    return std::string(util::CutUtf8(name, kMaxTagBytes));
 }
 
 TrackTags ReadTrackTags(const std::string& path) {

@@ -4,9 +4,9 @@
 
 #include <cstdio>
 
+#include "platform/medialib/MediaFiles.h"
 #include "platform/paths/PlatformPaths.h"
 #include "services/harmona-index/Indexer.h"
-#include "services/medialib/MediaFiles.h"
 
 int main() {
     openlog("harmona-index", LOG_PID, LOG_DAEMON);

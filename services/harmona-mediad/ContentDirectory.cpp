@@ -9,10 +9,10 @@
 #include <vector>
 
 #include "platform/lib/sqlite/Database.h"
+#include "platform/medialib/MediaFiles.h"
 #include "services/harmona-mediad/DidlWriter.h"
 #include "services/harmona-mediad/LibraryView.h"
 #include "services/harmona-mediad/ObjectIds.h"
-#include "services/medialib/MediaFiles.h"
 
 namespace harmona::mediad {
 namespace {

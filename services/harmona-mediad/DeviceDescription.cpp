@@ -8,13 +8,13 @@
 #include <cerrno>
 #include <cstring>
 
-#include "platform/dma/SoapBrowse.h"
+#include "common/util/XmlEscape.h"
 
 namespace harmona::mediad {
 namespace {
 
 // The same escaping as the browse library's requests (platform/dma).
-using harmona::dma::XmlEscape;
+using harmona::util::XmlText;
 
 constexpr const char* kContentDirectoryId = "urn:upnp-org:serviceId:ContentDirectory";
 constexpr const char* kConnectionManagerId = "urn:upnp-org:serviceId:ConnectionManager";
@@ -162,7 +162,7 @@ std::string DeviceDescription(const std::string& udn, const std::string& friendl
            "<root xmlns=\"urn:schemas-upnp-org:device-1-0\">"
            "<specVersion><major>1</major><minor>0</minor></specVersion>"
            "<device><deviceType>" +
-           std::string(kMediaServerType) + "</deviceType><friendlyName>" + XmlEscape(friendlyName) +
+           std::string(kMediaServerType) + "</deviceType><friendlyName>" + XmlText(friendlyName) +
            "</friendlyName><manufacturer>Harmona</manufacturer>"
            "<modelDescription>Harmona music library</modelDescription>"
            "<modelName>harmona-mediad</modelName><modelNumber>1</modelNumber><UDN>" +

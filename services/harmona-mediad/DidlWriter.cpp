@@ -3,61 +3,17 @@
 #include <cstdio>
 #include <cstring>
 
-#include "platform/cgi/Utf8.h"
+#include "common/util/XmlEscape.h"
 
 namespace harmona::mediad {
 namespace {
 
-constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
+// Every value is written as well-formed XML text, whatever bytes the library holds.
+using util::AppendXmlText;
+using util::XmlText;
+
 constexpr std::string_view kTrackClassElement =
     "<upnp:class>object.item.audioItem.musicTrack</upnp:class>";
-
-// The code point of the well-formed sequence of `length` bytes at text[i].
-char32_t DecodeUtf8(std::string_view text, std::size_t i, std::size_t length) {
-    const auto byte = [&](std::size_t k) { return static_cast<unsigned char>(text[i + k]); };
-    switch (length) {
-        case 2:
-            return (char32_t(byte(0) & 0x1F) << 6) | (byte(1) & 0x3F);
-        case 3:
-            return (char32_t(byte(0) & 0x0F) << 12) | (char32_t(byte(1) & 0x3F) << 6) |
-                   (byte(2) & 0x3F);
-        default:
-            return (char32_t(byte(0) & 0x07) << 18) | (char32_t(byte(1) & 0x3F) << 12) |
-                   (char32_t(byte(2) & 0x3F) << 6) | (byte(3) & 0x3F);
-    }
-}
-
-bool IsNonCharacter(char32_t code) {
-    return (code >= 0xFDD0 && code <= 0xFDEF) || (code & 0xFFFE) == 0xFFFE;
-}
-
-void AppendAscii(std::string& out, char c) {
-    switch (c) {
-        case '&':
-            out += "&amp;";
-            break;
-        case '<':
-            out += "&lt;";
-            break;
-        case '>':
-            out += "&gt;";
-            break;
-        case '"':
-            out += "&quot;";
-            break;
-        case '\t':
-            out += "&#9;";
-            break;
-        case '\n':
-            out += "&#10;";
-            break;
-        case '\r':
-            out += "&#13;";
-            break;
-        default:
-            out += static_cast<unsigned char>(c) < 0x20 ? ' ' : c;
-    }
-}
 
 void AppendElement(std::string& out, const char* name, std::string_view text) {
     if (text.empty())
@@ -123,33 +79,6 @@ std::string ProtocolInfo(const std::string& mimeType, const std::string& dlnaFea
     AppendXmlText(out, mimeType);
     out += ':';
     AppendXmlText(out, dlnaFeatures.empty() ? "*" : dlnaFeatures);
-    return out;
-}
-
-void AppendXmlText(std::string& out, std::string_view text) {
-    for (std::size_t i = 0; i < text.size();) {
-        const char c = text[i];
-        if (static_cast<unsigned char>(c) < 0x80) {
-            AppendAscii(out, c);
-            ++i;
-            continue;
-        }
-        const std::size_t length = cgi::Utf8SequenceLength(text, i);
-        if (length == 0) {
-            out += kReplacement;
-            ++i;
-            continue;
-        }
-        if (!IsNonCharacter(DecodeUtf8(text, i, length)))
-            out.append(text.data() + i, length);
-        i += length;
-    }
-}
-
-std::string XmlText(std::string_view text) {
-    std::string out;
-    out.reserve(text.size());
-    AppendXmlText(out, text);
     return out;
 }
 

@@ -53,14 +53,6 @@ struct DidlObject {
 // The escaped protocolInfo of a res: "http-get:*:<mime>:<fourth field>".
 std::string ProtocolInfo(const std::string& mimeType, const std::string& dlnaFeatures);
 
-// Appends `text` as XML 1.0 character data, fit for an element or a double-quoted attribute: the
-// five special characters and tab, LF and CR as references; bytes that are not UTF-8 become
-// U+FFFD; other C0 controls become spaces; the non-characters (U+FFFE, U+FFFF, U+FDD0..U+FDEF and
-// the last two code points of every plane) are dropped, since strict XML parsers reject or choke
-// on them.
-void AppendXmlText(std::string& out, std::string_view text);
-std::string XmlText(std::string_view text);
-
 // The whole element of `object` (<container> or <item>), media URLs marked with kMediaBaseMark.
 std::string DidlElement(const DidlObject& object);
 

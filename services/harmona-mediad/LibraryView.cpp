@@ -9,12 +9,12 @@
 #include <numeric>
 #include <tuple>
 
-#include "platform/cgi/Utf8.h"
+#include "common/util/Utf8.h"
 #include "platform/lib/sqlite/Database.h"
+#include "platform/medialib/LibrarySchema.h"
+#include "platform/medialib/MediaFiles.h"
 #include "services/harmona-mediad/DidlWriter.h"
 #include "services/harmona-mediad/ObjectIds.h"
-#include "services/medialib/LibrarySchema.h"
-#include "services/medialib/MediaFiles.h"
 
 namespace harmona::mediad {
 
@@ -45,7 +45,7 @@ constexpr Category kCategories[] = {
 };
 
 std::string Cut(std::string_view text) {
-    return std::string(cgi::CutUtf8(text, kMaxValueBytes));
+    return std::string(util::CutUtf8(text, kMaxValueBytes));
 }
 
 uint64_t HashOf(std::string_view bytes) {

@@ -7,8 +7,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "platform/medialib/MediaFiles.h"
 #include "services/harmona-mediad/ShareFile.h"
-#include "services/medialib/MediaFiles.h"
 
 namespace harmona::mediad {
 namespace {

@@ -26,11 +26,11 @@
 #include <string>
 
 #include "platform/lib/gupnp/MainLoop.h"
+#include "platform/medialib/MediaFiles.h"
 #include "platform/paths/PlatformPaths.h"
 #include "services/harmona-mediad/DeviceDescription.h"
 #include "services/harmona-mediad/LiveLibrary.h"
 #include "services/harmona-mediad/MediaServer.h"
-#include "services/medialib/MediaFiles.h"
 
 namespace {
 

@@ -5,6 +5,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "common/util/Utf8.h"
+
 namespace vanuaudiod {
 namespace {
 
@@ -30,37 +32,6 @@ bool ParseInt(const std::string& text, std::size_t& pos, int& value) {
         return false;
     value = static_cast<int>(signedValue);
     return true;
-}
-
-// Length of the valid UTF-8 sequence at text[pos], or 0 when it is not one (overlong forms,
-// surrogates and values above U+10FFFF refused).
-std::size_t Utf8SequenceLength(const std::string& text, std::size_t pos) {
-    const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
-    const unsigned char lead = byte(pos);
-    if (lead < 0x80)
-        return 1;
-    std::size_t length = 0;
-    unsigned int minimum = 0;
-    unsigned int codepoint = 0;
-    if (lead >= 0xC2 && lead <= 0xDF) {
-        length = 2, minimum = 0x80, codepoint = lead & 0x1F;
-    } else if (lead >= 0xE0 && lead <= 0xEF) {
-        length = 3, minimum = 0x800, codepoint = lead & 0x0F;
-    } else if (lead >= 0xF0 && lead <= 0xF4) {
-        length = 4, minimum = 0x10000, codepoint = lead & 0x07;
-    } else {
-        return 0;
-    }
-    if (pos + length > text.size())
-        return 0;
-    for (std::size_t i = 1; i < length; ++i) {
-        if ((byte(pos + i) & 0xC0) != 0x80)
-            return 0;
-        codepoint = (codepoint << 6) | (byte(pos + i) & 0x3F);
-    }
-    if (codepoint < minimum || codepoint > 0x10FFFF || (codepoint >= 0xD800 && codepoint <= 0xDFFF))
-        return 0;
-    return length;
 }
 
 std::string ElementJson(const MediaServer& server) {
@@ -190,7 +161,7 @@ std::string CleanText(const std::string& text, std::size_t maxBytes) {
     std::string out;
     std::size_t pos = 0;
     while (pos < text.size()) {
-        const std::size_t length = Utf8SequenceLength(text, pos);
+        const std::size_t length = harmona::util::Utf8SequenceLength(text, pos);
         if (length == 0) {
             // Not UTF-8: one byte becomes one space.
             if (out.size() + 1 > maxBytes)

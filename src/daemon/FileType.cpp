@@ -5,17 +5,15 @@
 #include <cstring>
 #include <iterator>
 
+#include "platform/medialib/MediaFiles.h"
 #include "src/daemon/AudioDaemon.h"
 
 namespace {
 
-// The accepted extensions of each selector, compared ignoring case.
+// The accepted extensions of the portable and lossless selectors, compared ignoring case.
 constexpr const char* kPortableList[] = {"mp3", "m4a", "m4b"};
 constexpr const char* kLosslessList[] = {"aac", "aif", "aiff", "ape", "flac", "m4a",
                                          "m4b", "mp3", "ogg",  "wav", "wma"};
-constexpr const char* kDefaultList[] = {"mp3",  "m4a", "ogg", "aac", "wma", "flac",
-                                        "aiff", "aif", "mp1", "mp2", "mpa", "wav",
-                                        "ac3",  "ra",  "ram", "m4p", "m4b", "ape"};
 
 template <size_t N>
 bool InList(const char* const (&list)[N], const char* extension) {
@@ -46,7 +44,7 @@ int IsSupportedAudioFile(int selector, const char* path) {
             return InList(kPortableList, extension) ? 1 : 0;
         case 3:
             return InList(kLosslessList, extension) ? 1 : 0;
-        default:
-            return InList(kDefaultList, extension) ? 1 : 0;
+        default:  // every audio file type, the list the indexer and the media server use too
+            return harmona::medialib::IsAudioExtension(extension) ? 1 : 0;
     }
 }

@@ -11,11 +11,11 @@
 
 #include "platform/dma/DMABrowse.h"
 #include "platform/dma/DMAParser.h"
+#include "platform/medialib/MediaFiles.h"
 #include "platform/paths/PlatformPaths.h"
 #include "platform/playlist/PlaylistFile.h"
 #include "platform/texts/LocalizedStringParser.h"
 #include "platform/users/AudioUsers.h"
-#include "services/medialib/MediaFiles.h"
 #include "src/handler/HarmonaHandler.h"
 
 namespace harmona::webapi {

@@ -3,7 +3,7 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "services/medialib/MediaFiles.h"
+#include "platform/medialib/MediaFiles.h"
 
 namespace harmona::webapi {
 

@@ -14,6 +14,8 @@
 #include <cstring>
 #include <pugixml.hpp>
 
+#include "common/util/XmlEscape.h"
+
 namespace harmona::test {
 
 namespace {
@@ -70,32 +72,6 @@ std::string RecordedRequest::Header(const std::string& name) const {
     return "";
 }
 
-std::string XmlText(const std::string& text) {
-    std::string out;
-    for (const char c : text) {
-        switch (c) {
-            case '&':
-                out += "&amp;";
-                break;
-            case '<':
-                out += "&lt;";
-                break;
-            case '>':
-                out += "&gt;";
-                break;
-            case '"':
-                out += "&quot;";
-                break;
-            case '\'':
-                out += "&apos;";
-                break;
-            default:
-                out += c;
-        }
-    }
-    return out;
-}
-
 std::string DidlLite(const std::vector<DidlObject>& objects) {
     std::string out =
         "<DIDL-Lite xmlns=\"urn:schemas-upnp-org:metadata-1-0/DIDL-Lite/\" "
@@ -105,21 +81,22 @@ std::string DidlLite(const std::vector<DidlObject>& objects) {
         const char* element = o.container ? "container" : "item";
         out += "<";
         out += element;
-        out += " id=\"" + XmlText(o.id) + "\" parentID=\"" + XmlText(o.parentId) +
-               "\" restricted=\"1\"";
+        out += " id=\"" + util::EscapeMarkup(o.id) + "\" parentID=\"" +
+               util::EscapeMarkup(o.parentId) + "\" restricted=\"1\"";
         if (o.childCount >= 0)
             out += " childCount=\"" + std::to_string(o.childCount) + "\"";
-        out += "><dc:title>" + XmlText(o.title) + "</dc:title><upnp:class>";
-        out += XmlText(!o.upnpClass.empty() ? o.upnpClass
-                       : o.container        ? "object.container.storageFolder"
-                                            : "object.item.audioItem.musicTrack");
+        out += "><dc:title>" + util::EscapeMarkup(o.title) + "</dc:title><upnp:class>";
+        out += util::EscapeMarkup(!o.upnpClass.empty() ? o.upnpClass
+                                  : o.container        ? "object.container.storageFolder"
+                                                       : "object.item.audioItem.musicTrack");
         out += "</upnp:class>";
         if (!o.artist.empty())
-            out += "<upnp:artist>" + XmlText(o.artist) + "</upnp:artist>";
+            out += "<upnp:artist>" + util::EscapeMarkup(o.artist) + "</upnp:artist>";
         if (!o.album.empty())
-            out += "<upnp:album>" + XmlText(o.album) + "</upnp:album>";
+            out += "<upnp:album>" + util::EscapeMarkup(o.album) + "</upnp:album>";
         if (!o.res.empty())
-            out += "<res protocolInfo=\"http-get:*:audio/mpeg:*\">" + XmlText(o.res) + "</res>";
+            out += "<res protocolInfo=\"http-get:*:audio/mpeg:*\">" + util::EscapeMarkup(o.res) +
+                   "</res>";
         out += "</";
         out += element;
         out += ">";
@@ -136,7 +113,7 @@ std::string BrowseResponseBody(const std::string& didl, unsigned long numberRetu
         "s:encodingStyle=\"http://schemas.xmlsoap.org/soap/encoding/\"><s:Body>"
         "<u:BrowseResponse xmlns:u=\"urn:schemas-upnp-org:service:ContentDirectory:1\">";
     if (withResult)
-        out += "<Result>" + XmlText(didl) + "</Result>";
+        out += "<Result>" + util::EscapeMarkup(didl) + "</Result>";
     out += "<NumberReturned>" + std::to_string(numberReturned) + "</NumberReturned>";
     out += "<TotalMatches>" + std::to_string(totalMatches) + "</TotalMatches>";
     out += "<UpdateID>1</UpdateID></u:BrowseResponse></s:Body></s:Envelope>\r\n";
@@ -149,7 +126,8 @@ std::string SoapFaultBody(int upnpErrorCode, const std::string& description) {
            "s:encodingStyle=\"http://schemas.xmlsoap.org/soap/encoding/\"><s:Body><s:Fault>"
            "<faultcode>s:Client</faultcode><faultstring>UPnPError</faultstring><detail>"
            "<UPnPError xmlns=\"urn:schemas-upnp-org:control-1-0\"><errorCode>" +
-           std::to_string(upnpErrorCode) + "</errorCode><errorDescription>" + XmlText(description) +
+           std::to_string(upnpErrorCode) + "</errorCode><errorDescription>" +
+           util::EscapeMarkup(description) +
            "</errorDescription></UPnPError></detail></s:Fault></s:Body></s:Envelope>\r\n";
 }
 

@@ -73,7 +73,6 @@ struct ScriptedReply {
 using Responder = std::function<ScriptedReply(const RecordedRequest&)>;
 
 // SOAP and DIDL-Lite writers.
-std::string XmlText(const std::string& text);  // escapes & < > " '
 struct DidlObject {
     bool container = true;
     std::string id;

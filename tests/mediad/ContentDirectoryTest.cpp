@@ -14,10 +14,10 @@
 #include <thread>
 #include <vector>
 
-#include "platform/cgi/Utf8.h"
+#include "common/util/Utf8.h"
 #include "platform/lib/sqlite/Database.h"
+#include "platform/medialib/LibrarySchema.h"
 #include "services/harmona-mediad/ContentDirectory.h"
-#include "services/medialib/LibrarySchema.h"
 #include "tests/harness/Fixtures.h"
 #include "tests/harness/PlaylistFixtures.h"
 #include "tests/harness/Sandbox.h"
@@ -187,7 +187,7 @@ TEST(TagValues, FiveMegabyteTitlesAreCutOnACharacterBoundaryWhenIndexed) {
         for (int column = 0; column < 3; ++column) {
             const std::string value(rows.ColumnText(column));
             EXPECT_EQ(value.size(), 1023u);
-            EXPECT_TRUE(cgi::IsValidUtf8(value));
+            EXPECT_TRUE(util::IsValidUtf8(value));
             EXPECT_EQ(huge.compare(0, value.size(), value), 0);
         }
     }

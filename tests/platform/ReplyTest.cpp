@@ -4,15 +4,15 @@
 
 #include <cstdio>
 
+#include "common/util/Utf8.h"
 #include "platform/cgi/ActionHandler.h"
 #include "platform/cgi/JsonWriter.h"
-#include "platform/cgi/Utf8.h"
 #include "platform/cgi/WebUtils.h"
 #include "tests/harness/CgiRunner.h"
 
-using harmona::cgi::IsValidUtf8;
-using harmona::cgi::RepairUtf8;
 using harmona::cgi::SerializeReply;
+using harmona::util::IsValidUtf8;
+using harmona::util::RepairUtf8;
 
 namespace {
 
@@ -151,7 +151,7 @@ std::string EscapedByteAtATime(const std::string& text) {
         } else if (c < 0x80) {
             out += static_cast<char>(c);
         } else {
-            const std::size_t length = harmona::cgi::Utf8SequenceLength(text, i);
+            const std::size_t length = harmona::util::Utf8SequenceLength(text, i);
             out += length == 0 ? "\xEF\xBF\xBD" : text.substr(i, length);
             i += length == 0 ? 1 : length;
             continue;

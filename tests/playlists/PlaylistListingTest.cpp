@@ -2,7 +2,7 @@
 // and a real library.db.
 #include <gtest/gtest.h>
 
-#include "platform/cgi/Utf8.h"
+#include "common/util/Utf8.h"
 #include "tests/harness/Fixtures.h"
 #include "tests/harness/PlaylistFixtures.h"
 #include "tests/playlists/InProcess.h"
@@ -154,7 +154,7 @@ TEST_F(PlaylistListing, FileNameThatIsNotUtf8GivesAValidUtf8Reply) {
     ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
     ASSERT_EQ(children.size(), 1u);
     const std::string reply = harmona::cgi::SerializeReply(children);
-    EXPECT_TRUE(harmona::cgi::IsValidUtf8(reply));
+    EXPECT_TRUE(harmona::util::IsValidUtf8(reply));
     Json::Value parsed;
     ASSERT_TRUE(ParseJson(reply, parsed)) << reply;
     const std::string text = parsed[0]["text"].asString();

@@ -7,9 +7,9 @@
 
 #include <functional>
 
-#include "platform/lib/posix/FileDescriptor.h"
+#include "common/io/FileDescriptor.h"
 
-namespace harmona::posix {
+namespace harmona::io {
 
 class ChildProcess {
   public:
@@ -38,4 +38,4 @@ class ChildProcess {
     pid_t pid_ = -1;
 };
 
-}  // namespace harmona::posix
+}  // namespace harmona::io

@@ -1,13 +1,8 @@
-#include "platform/cgi/Utf8.h"
+#include "common/util/Utf8.h"
 
 #include <vector>
 
-namespace harmona::cgi {
-namespace {
-
-constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
-
-}  // namespace
+namespace harmona::util {
 
 std::size_t Utf8SequenceLength(std::string_view text, std::size_t i) {
     const auto byte = [&](std::size_t k) { return static_cast<unsigned char>(text[k]); };
@@ -44,6 +39,22 @@ std::size_t Utf8SequenceLength(std::string_view text, std::size_t i) {
     return length;
 }
 
+char32_t DecodeUtf8(std::string_view text, std::size_t i, std::size_t length) {
+    const auto byte = [&](std::size_t k) { return static_cast<unsigned char>(text[i + k]); };
+    switch (length) {
+        case 1:
+            return byte(0);
+        case 2:
+            return (char32_t(byte(0) & 0x1F) << 6) | (byte(1) & 0x3F);
+        case 3:
+            return (char32_t(byte(0) & 0x0F) << 12) | (char32_t(byte(1) & 0x3F) << 6) |
+                   (byte(2) & 0x3F);
+        default:
+            return (char32_t(byte(0) & 0x07) << 18) | (char32_t(byte(1) & 0x3F) << 12) |
+                   (char32_t(byte(2) & 0x3F) << 6) | (byte(3) & 0x3F);
+    }
+}
+
 bool IsValidUtf8(std::string_view text) {
     for (std::size_t i = 0; i < text.size();) {
         if (static_cast<unsigned char>(text[i]) < 0x80) {  // ASCII, the common case
@@ -64,7 +75,7 @@ std::string RepairUtf8(std::string_view text) {
     for (std::size_t i = 0; i < text.size();) {
         const std::size_t length = Utf8SequenceLength(text, i);
         if (length == 0) {
-            out += kReplacement;
+            out += kReplacementCharacter;
             ++i;
         } else {
             out.append(text.substr(i, length));
@@ -83,4 +94,4 @@ std::string_view CutUtf8(std::string_view text, std::size_t maxBytes) {
     return text.substr(0, length);
 }
 
-}  // namespace harmona::cgi
+}  // namespace harmona::util

@@ -1,4 +1,4 @@
-#include "platform/lib/posix/ChildProcess.h"
+#include "common/io/ChildProcess.h"
 
 #include <fcntl.h>
 #include <signal.h>
@@ -7,7 +7,7 @@
 
 #include <cerrno>
 
-namespace harmona::posix {
+namespace harmona::io {
 
 ChildProcess& ChildProcess::operator=(ChildProcess&& other) noexcept {
     if (this != &other) {
@@ -64,4 +64,4 @@ void ChildProcess::Kill() {
     Wait();
 }
 
-}  // namespace harmona::posix
+}  // namespace harmona::io

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <string>
+#include <string_view>
 
 namespace harmona::medialib {
 
@@ -9,7 +10,12 @@ namespace harmona::medialib {
 // without a trailing "/".
 std::string AudioSharePath();
 
-// Whether the indexer takes the file: the CGI's IsSupportedAudioFile with selector 1.
+// Whether `extension` (without the dot, any letter case) is one of the audio file types: the
+// types the player takes by default, each with its MIME type below.
+bool IsAudioExtension(std::string_view extension);
+
+// Whether the indexer takes the file: its extension is an audio file type (what the tree's
+// IsSupportedAudioFile accepts with selector 1 for a local path).
 bool IsIndexableAudioFile(const std::string& path);
 
 // The MIME type served for a file, by its extension (any letter case);

@@ -1,4 +1,4 @@
-#include "services/medialib/LibrarySchema.h"
+#include "platform/medialib/LibrarySchema.h"
 
 namespace harmona::medialib {
 using sqlite::Database;

@@ -1,10 +1,12 @@
-#include "services/medialib/MediaFiles.h"
+#include "platform/medialib/MediaFiles.h"
+
+#include <strings.h>
 
 #include <cctype>
+#include <cstring>
 
 #include "platform/paths/PlatformPaths.h"
 #include "platform/system/VanuSystem.h"
-#include "src/daemon/AudioDaemon.h"
 
 namespace harmona::medialib {
 namespace {
@@ -13,6 +15,7 @@ struct MimeEntry {
     const char* extension;
     const char* mime;
 };
+// The audio file types, each with the MIME type it is served as.
 constexpr MimeEntry kMimeTypes[] = {
     {"mp3", "audio/mpeg"},  {"mp1", "audio/mpeg"},          {"mp2", "audio/mpeg"},
     {"mpa", "audio/mpeg"},  {"m4a", "audio/mp4"},           {"m4b", "audio/mp4"},
@@ -38,8 +41,17 @@ std::string AudioSharePath() {
     return share;
 }
 
+bool IsAudioExtension(std::string_view extension) {
+    for (const MimeEntry& entry : kMimeTypes) {
+        if (extension.size() == std::strlen(entry.extension) &&
+            strncasecmp(extension.data(), entry.extension, extension.size()) == 0)
+            return true;
+    }
+    return false;
+}
+
 bool IsIndexableAudioFile(const std::string& path) {
-    return IsSupportedAudioFile(1, path.c_str()) == 1;
+    return IsAudioExtension(LowerExtension(path));
 }
 
 std::string LowerExtension(const std::string& path) {

@@ -3,7 +3,7 @@
 
 #include <unistd.h>
 
-namespace harmona::posix {
+namespace harmona::io {
 
 class FileDescriptor {
   public:
@@ -22,7 +22,7 @@ class FileDescriptor {
     FileDescriptor& operator=(const FileDescriptor&) = delete;
 
     int Get() const { return fd_; }
-    bool IsOpen() const { return fd_ >= 0; }
+    explicit operator bool() const { return fd_ >= 0; }
 
     // Hands the descriptor over without closing it.
     int Release() {
@@ -47,4 +47,4 @@ class FileDescriptor {
     int fd_ = -1;
 };
 
-}  // namespace harmona::posix
+}  // namespace harmona::io
