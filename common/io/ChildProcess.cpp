@@ -43,6 +43,14 @@ ChildProcess ChildProcess::Start(const std::function<int(int writeFd)>& work,
     return ChildProcess(pid);
 }
 
+namespace {
+
+int ExitStatus(int waitStatus) {
+    return WIFEXITED(waitStatus) ? WEXITSTATUS(waitStatus) : -1;
+}
+
+}  // namespace
+
 int ChildProcess::Wait() {
     if (pid_ <= 0)
         return -1;
@@ -52,9 +60,36 @@ int ChildProcess::Wait() {
         ended = waitpid(pid_, &status, 0);
     while (ended < 0 && errno == EINTR);
     pid_ = -1;
-    if (ended < 0 || !WIFEXITED(status))
-        return -1;
-    return WEXITSTATUS(status);
+    return ended < 0 ? -1 : ExitStatus(status);
+}
+
+bool ChildProcess::HasEnded(int& status) {
+    if (pid_ <= 0)
+        return false;
+    int waitStatus = 0;
+    const pid_t ended = waitpid(pid_, &waitStatus, WNOHANG);
+    if (ended == 0 || (ended < 0 && errno == EINTR))
+        return false;
+    pid_ = -1;
+    status = ended < 0 ? -1 : ExitStatus(waitStatus);
+    return true;
+}
+
+int ChildProcess::Stop(int graceMs) {
+    if (pid_ <= 0)
+        return 0;
+    kill(pid_, SIGTERM);
+    constexpr int kPollMs = 10;
+    int status = -1;
+    for (int waited = 0; waited < graceMs; waited += kPollMs) {
+        if (HasEnded(status))
+            return status;
+        usleep(kPollMs * 1000);
+    }
+    if (HasEnded(status))
+        return status;
+    Kill();
+    return -1;
 }
 
 void ChildProcess::Kill() {

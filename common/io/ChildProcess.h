@@ -1,6 +1,6 @@
 // Move-only owner of a forked child process: a child that its owner lets go of unfinished is
 // killed and reaped, so that no request leaves a process behind (a library call that never
-// returns runs in such a child).
+// returns runs in such a child), and a service's supervisor restarts or stops its children.
 #pragma once
 
 #include <sys/types.h>
@@ -29,6 +29,14 @@ class ChildProcess {
 
     // Waits for the child to end; its exit status, or -1 when it was ended by a signal.
     int Wait();
+
+    // Whether the child has ended, without waiting; when it has, the owner is empty and `status`
+    // holds its exit status (-1 when a signal ended it).
+    bool HasEnded(int& status);
+
+    // Asks the child to end (SIGTERM) and waits up to `graceMs` for it, then kills it (SIGKILL);
+    // its exit status, -1 when a signal ended it, 0 when there was no child.
+    int Stop(int graceMs);
 
     // Kills the child (SIGKILL) and reaps it; nothing when there is no child.
     void Kill();

@@ -12,6 +12,7 @@
 #include <string_view>
 #include <vector>
 
+#include "common/io/DirectoryReader.h"
 #include "platform/lib/sqlite/Database.h"
 #include "platform/paths/PlatformPaths.h"
 #include "platform/playlist/LibraryDatabase.h"
@@ -104,21 +105,19 @@ int VANUPersonalPlaylistListAll(const char* prefDir, PLAYLIST_INFO** head, int o
     // Only a real folder is listed: a symbolic link in its place could show another user's
     // playlist names (O_NOFOLLOW refuses it with ELOOP, like any folder that cannot be read).
     const std::string folder = std::string(prefDir) + "/playlists";
-    const int folderFd = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-    if (folderFd < 0)
+    harmona::io::FileDescriptor folderFd(
+        open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    if (!folderFd)
         return errno == ENOENT ? 0 : -1;
-    DIR* dir = fdopendir(folderFd);
-    if (dir == nullptr) {
-        close(folderFd);
+    harmona::io::DirectoryReader dir(std::move(folderFd));
+    if (!dir)
         return -1;
-    }
 
     std::vector<std::string> names;
     std::string name;
-    errno = 0;
     bool tooMany = false;
-    while (const dirent* entry = readdir(dir)) {
-        if (PlaylistNameOf(entry->d_name, name) && IsRegularFile(dirfd(dir), *entry)) {
+    while (const dirent* entry = dir.Next()) {
+        if (PlaylistNameOf(entry->d_name, name) && IsRegularFile(dir.Fd(), *entry)) {
             // Counted while the folder is read: a folder of millions of files costs no memory.
             if (names.size() == kMaxPlaylistRecords) {
                 tooMany = true;
@@ -126,10 +125,9 @@ int VANUPersonalPlaylistListAll(const char* prefDir, PLAYLIST_INFO** head, int o
             }
             names.push_back(name);
         }
-        errno = 0;
     }
-    const bool readFailed = errno != 0;
-    closedir(dir);
+    const bool readFailed = !tooMany && errno != 0;
+    dir.Reset();
     if (tooMany) {
         LogListTooLong("playlists in " + folder, kMaxPlaylistRecords);
         return -1;

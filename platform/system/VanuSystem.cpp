@@ -10,6 +10,7 @@
 #include <cstring>
 #include <string>
 
+#include "common/io/FileDescriptor.h"
 #include "platform/conf/ConfFile.h"
 #include "platform/paths/PlatformPaths.h"
 
@@ -44,15 +45,15 @@ int VANUServiceStatusGet(int service) {
     if (service < 1 || service > 64)
         return -1;
     const std::string path = harmona::paths::kServicePidDir + std::to_string(service) + ".pid";
-    const int fd = open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY);
-    if (fd < 0)
+    const harmona::io::FileDescriptor fd(
+        open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
+    if (!fd)
         return 0;
     char text[32] = {};
     struct stat st {};
     ssize_t n = -1;
-    if (fstat(fd, &st) == 0 && S_ISREG(st.st_mode))
-        n = read(fd, text, sizeof(text) - 1);
-    close(fd);
+    if (fstat(fd.Get(), &st) == 0 && S_ISREG(st.st_mode))
+        n = read(fd.Get(), text, sizeof(text) - 1);
     if (n <= 0)
         return 0;
     text[n] = '\0';

@@ -15,6 +15,7 @@
 #include <unordered_map>
 #include <vector>
 
+#include "common/io/DirectoryReader.h"
 #include "platform/lib/sqlite/Database.h"
 #include "platform/medialib/LibrarySchema.h"
 #include "platform/medialib/MediaFiles.h"
@@ -73,28 +74,27 @@ int CoverRank(const std::string& name) {
 // Depth-first walk that never follows a symbolic link and skips hidden names (".", "..",
 // ".Trash", the "@eaDir"-style system folders start with "@" and are skipped too). Each audio
 // file carries the cover image of its folder, if there is one.
-void WalkFolder(int dirFd, const std::string& path, int depth, std::vector<FoundFile>& found) {
-    DIR* dir = fdopendir(dirFd);
-    if (dir == nullptr) {
-        close(dirFd);
+void WalkFolder(io::FileDescriptor folder, const std::string& path, int depth,
+                std::vector<FoundFile>& found) {
+    io::DirectoryReader dir(std::move(folder));
+    if (!dir)
         return;
-    }
     std::vector<FoundFile> here;
     std::string cover;
     int coverRank = kNoCover;
-    while (const dirent* entry = readdir(dir)) {
+    while (const dirent* entry = dir.Next()) {
         const char* name = entry->d_name;
         if (name[0] == '.' || name[0] == '@')
             continue;
         struct stat st {};
-        if (fstatat(dirfd(dir), name, &st, AT_SYMLINK_NOFOLLOW) != 0)
+        if (fstatat(dir.Fd(), name, &st, AT_SYMLINK_NOFOLLOW) != 0)
             continue;
         const std::string child = path + "/" + name;
         if (S_ISDIR(st.st_mode) && depth < kMaxFolderDepth) {
-            const int childFd =
-                openat(dirfd(dir), name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-            if (childFd >= 0)
-                WalkFolder(childFd, child, depth + 1, found);
+            io::FileDescriptor childFd(
+                openat(dir.Fd(), name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+            if (childFd)
+                WalkFolder(std::move(childFd), child, depth + 1, found);
         } else if (S_ISREG(st.st_mode) && medialib::IsIndexableAudioFile(child)) {
             here.push_back(
                 {child, static_cast<int64_t>(st.st_mtime), static_cast<int64_t>(st.st_size), {}});
@@ -106,7 +106,6 @@ void WalkFolder(int dirFd, const std::string& path, int depth, std::vector<Found
             }
         }
     }
-    closedir(dir);
     for (FoundFile& file : here) {
         file.artPath = cover;
         found.push_back(std::move(file));
@@ -247,24 +246,22 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath,
                        const std::atomic<bool>* stop) {
     const auto stopped = [stop] { return stop != nullptr && stop->load(); };
     IndexReport report;
-    const int shareFd = open(share.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    if (shareFd < 0)
+    io::FileDescriptor shareFd(open(share.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (!shareFd)
         return Fail(report, "the audio share " + share + " is not a readable folder");
 
     MakeParentDirs(dbPath);
     Database db =
         Database::Open(dbPath.c_str(), SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, kBusyTimeoutMs);
     if (!db) {
-        close(shareFd);
         return Fail(report, "cannot open " + dbPath + ": " + db.Error());
     }
     if (!medialib::EnsureLibrarySchema(db)) {
-        close(shareFd);
         return Fail(report, "cannot create the schema of " + dbPath + ": " + db.Error());
     }
 
     std::vector<FoundFile> found;
-    WalkFolder(shareFd, share, 0, found);
+    WalkFolder(std::move(shareFd), share, 0, found);
     report.filesSeen = found.size();
 
     std::unordered_map<std::string, KnownRow> known = LoadKnownRows(db);

@@ -8,6 +8,7 @@
 #include <deque>
 #include <vector>
 
+#include "common/io/FileDescriptor.h"
 #include "platform/lib/sqlite/Database.h"
 #include "platform/medialib/MediaFiles.h"
 #include "services/harmona-mediad/DidlWriter.h"
@@ -286,18 +287,17 @@ ContentDirectory::~ContentDirectory() = default;
 // even within one tick of the file system's clock.
 ContentDirectory::FileStamp ContentDirectory::StampOfDatabase() const {
     FileStamp stamp;
-    const int fd = open(dbPath_.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY);
-    if (fd < 0)
+    const io::FileDescriptor fd(open(dbPath_.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY));
+    if (!fd)
         return stamp;
     struct stat st {};
     unsigned char counter[4] = {};
-    if (fstat(fd, &st) == 0) {
+    if (fstat(fd.Get(), &st) == 0) {
         stamp = FileStamp{st.st_dev, st.st_ino, st.st_size, st.st_mtim, 0};
-        if (pread(fd, counter, sizeof counter, 24) == static_cast<ssize_t>(sizeof counter))
+        if (pread(fd.Get(), counter, sizeof counter, 24) == static_cast<ssize_t>(sizeof counter))
             stamp.changeCounter = (uint32_t(counter[0]) << 24) | (uint32_t(counter[1]) << 16) |
                                   (uint32_t(counter[2]) << 8) | counter[3];
     }
-    close(fd);
     return stamp;
 }
 

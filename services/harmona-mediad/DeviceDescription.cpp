@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <cstring>
 
+#include "common/io/FileDescriptor.h"
 #include "common/util/XmlEscape.h"
 
 namespace harmona::mediad {
@@ -120,24 +121,24 @@ std::string ServiceElement(const char* type, const char* id, const char* scpd, c
 
 bool WriteWholeFile(const std::string& path, const std::string& text) {
     unlink(path.c_str());
-    const int fd = open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644);
-    if (fd < 0)
+    io::FileDescriptor fd(
+        open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644));
+    if (!fd)
         return false;
-    const bool written = write(fd, text.data(), text.size()) == static_cast<ssize_t>(text.size());
-    fchmod(fd, 0644);  // whatever the umask: the unprivileged server reads these
-    close(fd);
-    return written;
+    const bool written =
+        write(fd.Get(), text.data(), text.size()) == static_cast<ssize_t>(text.size());
+    fchmod(fd.Get(), 0644);  // whatever the umask: the unprivileged server reads these
+    return fd.Close() && written;
 }
 
 }  // namespace
 
 std::string MakeUdn() {
     std::string hex;
-    const int fd = open("/etc/machine-id", O_RDONLY | O_CLOEXEC);
-    if (fd >= 0) {
+    const io::FileDescriptor fd(open("/etc/machine-id", O_RDONLY | O_CLOEXEC));
+    if (fd) {
         char buffer[64] = {};
-        const ssize_t got = read(fd, buffer, sizeof(buffer) - 1);
-        close(fd);
+        const ssize_t got = read(fd.Get(), buffer, sizeof(buffer) - 1);
         for (ssize_t i = 0; i < got; ++i) {
             if (std::isxdigit(static_cast<unsigned char>(buffer[i])))
                 hex += static_cast<char>(std::tolower(static_cast<unsigned char>(buffer[i])));

@@ -13,6 +13,8 @@
 #include <cerrno>
 #include <cstring>
 
+#include "common/io/DirectoryReader.h"
+
 namespace harmona::mediad {
 namespace {
 
@@ -49,9 +51,9 @@ LiveLibrary::~LiveLibrary() {
 bool LiveLibrary::Start(std::string* error) {
     if (thread_.joinable())
         return true;
-    inotifyFd_ = inotify_init1(IN_NONBLOCK | IN_CLOEXEC);
-    wakeFd_ = eventfd(0, EFD_NONBLOCK | EFD_CLOEXEC);
-    if (inotifyFd_ < 0 || wakeFd_ < 0) {
+    inotifyFd_ = io::FileDescriptor(inotify_init1(IN_NONBLOCK | IN_CLOEXEC));
+    wakeFd_ = io::FileDescriptor(eventfd(0, EFD_NONBLOCK | EFD_CLOEXEC));
+    if (!inotifyFd_ || !wakeFd_) {
         *error = std::string("cannot watch the share: ") + std::strerror(errno);
         Stop();
         return false;
@@ -63,19 +65,16 @@ bool LiveLibrary::Start(std::string* error) {
 
 void LiveLibrary::Stop() {
     stopping_ = true;
-    if (wakeFd_ >= 0) {
+    if (wakeFd_) {
         const uint64_t one = 1;
-        if (write(wakeFd_, &one, sizeof one) < 0) {
+        if (write(wakeFd_.Get(), &one, sizeof one) < 0) {
             // The counter is full: the thread is being woken already.
         }
     }
     if (thread_.joinable())
         thread_.join();
-    if (inotifyFd_ >= 0)
-        close(inotifyFd_);
-    if (wakeFd_ >= 0)
-        close(wakeFd_);
-    inotifyFd_ = wakeFd_ = -1;
+    inotifyFd_.Reset();
+    wakeFd_.Reset();
     std::lock_guard<std::mutex> lock(watchesMutex_);
     watches_.clear();
 }
@@ -112,7 +111,7 @@ bool LiveLibrary::WaitForEvents(Clock::time_point now) {
         const int rescan = MillisecondsUntil(now, lastPass_ + options_.unwatchedRescan);
         timeout = timeout < 0 ? rescan : std::min(timeout, rescan);
     }
-    pollfd fds[2] = {{inotifyFd_, POLLIN, 0}, {wakeFd_, POLLIN, 0}};
+    pollfd fds[2] = {{inotifyFd_.Get(), POLLIN, 0}, {wakeFd_.Get(), POLLIN, 0}};
     const int ready = poll(fds, 2, timeout);
     if (stopping_)
         return false;
@@ -129,7 +128,7 @@ void LiveLibrary::ReadEvents() {
     alignas(inotify_event) char buffer[kEventBufferBytes];
     bool changed = false;
     for (;;) {
-        const ssize_t got = read(inotifyFd_, buffer, sizeof buffer);
+        const ssize_t got = read(inotifyFd_.Get(), buffer, sizeof buffer);
         if (got <= 0)
             break;
         for (ssize_t at = 0; at < got;) {
@@ -202,7 +201,7 @@ void LiveLibrary::WatchTree(const std::string& path, int depth) {
             return;
         }
     }
-    const int wd = inotify_add_watch(inotifyFd_, path.c_str(), kFolderEvents);
+    const int wd = inotify_add_watch(inotifyFd_.Get(), path.c_str(), kFolderEvents);
     if (wd < 0) {
         if (errno == ENOSPC) {
             watchesComplete_ = false;
@@ -221,14 +220,11 @@ void LiveLibrary::WatchTree(const std::string& path, int depth) {
         watches_[wd] = path;
     }
     // Not through a link swapped in since the watch was set: only the share's own folders.
-    const int fd = open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-    DIR* dir = fd >= 0 ? fdopendir(fd) : nullptr;
-    if (dir == nullptr) {
-        if (fd >= 0)
-            close(fd);
+    io::FileDescriptor fd(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    io::DirectoryReader dir(std::move(fd));
+    if (!dir)
         return;
-    }
-    while (const dirent* entry = readdir(dir)) {
+    while (const dirent* entry = dir.Next()) {
         if (IsSkippedName(entry->d_name))
             continue;
         const std::string child = path + "/" + entry->d_name;
@@ -236,7 +232,6 @@ void LiveLibrary::WatchTree(const std::string& path, int depth) {
         if (lstat(child.c_str(), &st) == 0 && S_ISDIR(st.st_mode))
             WatchTree(child, depth + 1);
     }
-    closedir(dir);
 }
 
 void LiveLibrary::IndexNow() {

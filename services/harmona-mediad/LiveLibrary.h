@@ -16,6 +16,7 @@
 #include <thread>
 #include <unordered_map>
 
+#include "common/io/FileDescriptor.h"
 #include "services/harmona-index/Indexer.h"
 
 namespace harmona::mediad {
@@ -61,8 +62,8 @@ class LiveLibrary {
     void IndexNow();
 
     LiveLibraryOptions options_;
-    int inotifyFd_ = -1;
-    int wakeFd_ = -1;
+    io::FileDescriptor inotifyFd_;
+    io::FileDescriptor wakeFd_;
     std::thread thread_;
     std::atomic<bool> stopping_{false};
     std::atomic<std::size_t> passes_{0};

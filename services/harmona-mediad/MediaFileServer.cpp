@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <utility>
 
 #include "platform/medialib/MediaFiles.h"
 #include "services/harmona-mediad/ShareFile.h"
@@ -17,7 +18,7 @@ constexpr std::size_t kChunkBytes = 64 * 1024;
 
 // One response in flight: the open file and how much of the range is still to be sent.
 struct Transfer {
-    int fd = -1;
+    io::FileDescriptor fd;
     off_t next = 0;
     off_t end = 0;  // one past the last byte to send
 };
@@ -33,7 +34,7 @@ void AppendNextChunk(SoupServerMessage* message, Transfer* transfer) {
     auto* buffer = static_cast<char*>(g_malloc(wanted));
     ssize_t got = 0;
     do {
-        got = pread(transfer->fd, buffer, wanted, transfer->next);
+        got = pread(transfer->fd.Get(), buffer, wanted, transfer->next);
     } while (got < 0 && errno == EINTR);
     if (got <= 0) {
         // The file shrank or failed under us: end the body early; the client sees a short
@@ -52,10 +53,7 @@ void OnWroteChunk(SoupServerMessage* message, gpointer data) {
 }
 
 void FreeTransfer(gpointer data, GClosure*) {
-    auto* transfer = static_cast<Transfer*>(data);
-    if (transfer->fd >= 0)
-        close(transfer->fd);
-    delete transfer;
+    delete static_cast<Transfer*>(data);
 }
 
 // 1 to 18 decimal digits and nothing else (no sign, no space): a byte offset or an id that
@@ -160,7 +158,7 @@ void MediaFileServer::Handle(SoupServer*, SoupServerMessage* message, const char
 
 // "/media/<track id>.<extension>" (the track's file) or "/media/art/<track id>.<jpg|png>" (its
 // cover art) -> an open descriptor of the indexed file, beneath the share, or -1.
-int MediaFileServer::Open(const std::string& urlPath, ServedFile* served) const {
+io::FileDescriptor MediaFileServer::Open(const std::string& urlPath, ServedFile* served) const {
     const std::string prefix = std::string(kMediaPath) + "/";
     const std::string artPrefix = prefix + kArtFolder + "/";
     int64_t id = 0;
@@ -169,26 +167,26 @@ int MediaFileServer::Open(const std::string& urlPath, ServedFile* served) const 
         served->image = true;
         if (!ParseIdName(urlPath.substr(artPrefix.size()), &id, &extension) ||
             !directory_.LookUpArtFile(id, &served->path))
-            return -1;
+            return {};
         const std::string real = medialib::LowerExtension(served->path);
         // The URL says what the listing said: png for a PNG cover, jpg for every other.
         if (extension != (real == "png" ? "png" : "jpg"))
-            return -1;
+            return {};
         served->mimeType = real == "png" ? "image/png" : "image/jpeg";
     } else if (urlPath.compare(0, prefix.size(), prefix) == 0) {
         TrackFile track;
         if (!ParseIdName(urlPath.substr(prefix.size()), &id, &extension) ||
             !directory_.LookUpTrack(id, &track) ||
             extension != medialib::LowerExtension(track.path))
-            return -1;
+            return {};
         served->path = std::move(track.path);
         served->mimeType = std::move(track.mimeType);
         served->contentFeatures = std::move(track.contentFeatures);
     } else {
-        return -1;
+        return {};
     }
     const std::string relative = PathBelowShare(sharePath_, served->path);
-    return relative.empty() ? -1 : OpenBeneathShare(sharePath_, relative);
+    return relative.empty() ? io::FileDescriptor() : OpenBeneathShare(sharePath_, relative);
 }
 
 void MediaFileServer::Serve(SoupServerMessage* message, const std::string& path) const {
@@ -199,11 +197,9 @@ void MediaFileServer::Serve(SoupServerMessage* message, const std::string& path)
         return;
     }
     ServedFile file;
-    const int fd = Open(path, &file);
+    io::FileDescriptor fd = Open(path, &file);
     struct stat st {};
-    if (fd < 0 || fstat(fd, &st) != 0) {
-        if (fd >= 0)
-            close(fd);
+    if (!fd || fstat(fd.Get(), &st) != 0) {
         soup_server_message_set_status(message, SOUP_STATUS_NOT_FOUND, nullptr);
         return;
     }
@@ -216,7 +212,6 @@ void MediaFileServer::Serve(SoupServerMessage* message, const std::string& path)
     else
         SetAudioHeaders(response, file);
     if (range.kind == ByteRange::Kind::Unsatisfiable) {
-        close(fd);
         const std::string contentRange = "bytes */" + std::to_string(st.st_size);
         soup_message_headers_replace(response, "Content-Range", contentRange.c_str());
         soup_server_message_set_status(message, SOUP_STATUS_REQUESTED_RANGE_NOT_SATISFIABLE,
@@ -224,7 +219,7 @@ void MediaFileServer::Serve(SoupServerMessage* message, const std::string& path)
         return;
     }
     auto* transfer = new Transfer;
-    transfer->fd = fd;
+    transfer->fd = std::move(fd);
     transfer->next = range.first;
     transfer->end = st.st_size == 0 ? 0 : range.last + 1;
     if (range.kind == ByteRange::Kind::Part) {

@@ -10,6 +10,7 @@
 
 #include <string>
 
+#include "common/io/FileDescriptor.h"
 #include "services/harmona-mediad/ContentDirectory.h"
 
 namespace harmona::mediad {
@@ -50,7 +51,7 @@ class MediaFileServer {
     static void Handle(SoupServer* server, SoupServerMessage* message, const char* path,
                        GHashTable* query, gpointer self);
     void Serve(SoupServerMessage* message, const std::string& path) const;
-    int Open(const std::string& urlPath, ServedFile* served) const;
+    io::FileDescriptor Open(const std::string& urlPath, ServedFile* served) const;
 
     GUPnPContext* context_;
     const ContentDirectory& directory_;

@@ -11,6 +11,7 @@
 #include <cerrno>
 #include <cstring>
 
+#include "common/io/FileDescriptor.h"
 #include "services/harmona-mediad/DeviceDescription.h"
 
 namespace harmona::mediad {
@@ -39,8 +40,9 @@ GSSDPResourceGroup* ResourceGroupOf(GUPnPRootDevice* device) {
 // route lookup GSSDP's sends do, without sending anything.
 bool MulticastCanLeave(const std::string& interfaceName, const std::string& address,
                        std::string* why) {
-    const int s = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
-    if (s < 0) {
+    const io::FileDescriptor socketFd(socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+    const int s = socketFd.Get();
+    if (!socketFd) {
         *why = std::strerror(errno);
         return false;
     }
@@ -68,7 +70,6 @@ bool MulticastCanLeave(const std::string& interfaceName, const std::string& addr
         if (!ok)
             *why = std::strerror(errno);
     }
-    close(s);
     return ok;
 }
 

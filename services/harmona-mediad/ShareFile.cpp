@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <utility>
 #include <vector>
 
 namespace harmona::mediad {
@@ -32,74 +33,75 @@ bool SplitComponents(const std::string& relative, std::vector<std::string>* part
 
 // Regular files only; O_NONBLOCK kept off the returned descriptor (it was there only so that
 // opening a FIFO planted in the share cannot block the server).
-int KeepRegularFile(int fd) {
+io::FileDescriptor KeepRegularFile(io::FileDescriptor fd) {
     struct stat st {};
-    if (fstat(fd, &st) != 0 || !S_ISREG(st.st_mode)) {
-        close(fd);
+    if (fstat(fd.Get(), &st) != 0 || !S_ISREG(st.st_mode)) {
         errno = EACCES;
-        return -1;
+        return {};
     }
-    const int flags = fcntl(fd, F_GETFL);
+    const int flags = fcntl(fd.Get(), F_GETFL);
     if (flags >= 0)
-        fcntl(fd, F_SETFL, flags & ~O_NONBLOCK);
+        fcntl(fd.Get(), F_SETFL, flags & ~O_NONBLOCK);
     return fd;
+}
+
+// Closes `fd` without changing errno, which tells the caller why an open failed.
+void CloseKeepingErrno(io::FileDescriptor& fd) {
+    const int saved = errno;
+    fd.Reset();
+    errno = saved;
 }
 
 constexpr int kFileFlags = O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK;
 
-int OpenWithOpenat2(int directoryFd, const std::string& relative) {
+io::FileDescriptor OpenWithOpenat2(int directoryFd, const std::string& relative) {
     open_how how{};
     how.flags = kFileFlags;
     how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS | RESOLVE_NO_MAGICLINKS;
-    return static_cast<int>(syscall(SYS_openat2, directoryFd, relative.c_str(), &how, sizeof how));
+    return io::FileDescriptor(
+        static_cast<int>(syscall(SYS_openat2, directoryFd, relative.c_str(), &how, sizeof how)));
 }
 
-int OpenByWalking(int directoryFd, const std::vector<std::string>& parts) {
-    int current = fcntl(directoryFd, F_DUPFD_CLOEXEC, 0);
-    for (std::size_t i = 0; current >= 0 && i + 1 < parts.size(); ++i) {
-        const int next =
-            openat(current, parts[i].c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-        const int saved = errno;
-        close(current);
-        errno = saved;
-        current = next;
+io::FileDescriptor OpenByWalking(int directoryFd, const std::vector<std::string>& parts) {
+    io::FileDescriptor current(fcntl(directoryFd, F_DUPFD_CLOEXEC, 0));
+    for (std::size_t i = 0; current && i + 1 < parts.size(); ++i) {
+        io::FileDescriptor next(
+            openat(current.Get(), parts[i].c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+        CloseKeepingErrno(current);
+        current = std::move(next);
     }
-    if (current < 0)
-        return -1;
-    const int fd = openat(current, parts.back().c_str(), kFileFlags | O_NOFOLLOW);
-    const int saved = errno;
-    close(current);
-    errno = saved;
+    if (!current)
+        return {};
+    io::FileDescriptor fd(openat(current.Get(), parts.back().c_str(), kFileFlags | O_NOFOLLOW));
+    CloseKeepingErrno(current);
     return fd;
 }
 
 }  // namespace
 
-int OpenBeneath(int directoryFd, const std::string& relative, bool allowOpenat2) {
+io::FileDescriptor OpenBeneath(int directoryFd, const std::string& relative, bool allowOpenat2) {
     std::vector<std::string> parts;
     if (!SplitComponents(relative, &parts)) {
         errno = EINVAL;
-        return -1;
+        return {};
     }
-    int fd = -1;
+    io::FileDescriptor fd;
     if (allowOpenat2) {
         fd = OpenWithOpenat2(directoryFd, relative);
-        if (fd < 0 && errno != ENOSYS)
-            return -1;
+        if (!fd && errno != ENOSYS)
+            return {};
     }
-    if (fd < 0)
+    if (!fd)
         fd = OpenByWalking(directoryFd, parts);
-    return fd < 0 ? -1 : KeepRegularFile(fd);
+    return fd ? KeepRegularFile(std::move(fd)) : io::FileDescriptor();
 }
 
-int OpenBeneathShare(const std::string& sharePath, const std::string& relative) {
-    const int share = open(sharePath.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC);
-    if (share < 0)
-        return -1;
-    const int fd = OpenBeneath(share, relative);
-    const int saved = errno;
-    close(share);
-    errno = saved;
+io::FileDescriptor OpenBeneathShare(const std::string& sharePath, const std::string& relative) {
+    io::FileDescriptor share(open(sharePath.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    if (!share)
+        return {};
+    io::FileDescriptor fd = OpenBeneath(share.Get(), relative);
+    CloseKeepingErrno(share);
     return fd;
 }
 

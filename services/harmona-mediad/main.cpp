@@ -25,6 +25,8 @@
 #include <cstring>
 #include <string>
 
+#include "common/io/ChildProcess.h"
+#include "common/io/FileDescriptor.h"
 #include "platform/lib/gupnp/MainLoop.h"
 #include "platform/medialib/MediaFiles.h"
 #include "platform/paths/PlatformPaths.h"
@@ -61,14 +63,14 @@ bool WritePidFile() {
     const std::string path = PidFilePath();
     const std::string temporary = path + ".tmp";
     unlink(temporary.c_str());
-    const int fd =
-        open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644);
-    if (fd < 0)
+    harmona::io::FileDescriptor fd(
+        open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644));
+    if (!fd)
         return false;
     const std::string text = std::to_string(getpid()) + "\n";
-    const bool written = write(fd, text.data(), text.size()) == static_cast<ssize_t>(text.size());
-    close(fd);
-    if (!written || rename(temporary.c_str(), path.c_str()) != 0) {
+    const bool written =
+        write(fd.Get(), text.data(), text.size()) == static_cast<ssize_t>(text.size());
+    if (!fd.Close() || !written || rename(temporary.c_str(), path.c_str()) != 0) {
         unlink(temporary.c_str());
         return false;
     }
@@ -79,11 +81,10 @@ bool WritePidFile() {
 void RemovePidFile() {
     const std::string path = PidFilePath();
     char buffer[32] = {};
-    const int fd = open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC);
-    if (fd < 0)
+    const harmona::io::FileDescriptor fd(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC));
+    if (!fd)
         return;
-    const ssize_t got = read(fd, buffer, sizeof(buffer) - 1);
-    close(fd);
+    const ssize_t got = read(fd.Get(), buffer, sizeof(buffer) - 1);
     if (got > 0 && std::atol(buffer) == static_cast<long>(getpid()))
         unlink(path.c_str());
 }
@@ -147,53 +148,26 @@ int RunServer(const harmona::mediad::MediaServerOptions& options, int readyFd) {
 
 // --- The supervisor (parent) --------------------------------------------------------------------
 
+// A child of the supervisor, and for the server the read end of the pipe on which it says that it
+// serves 127.0.0.1. The child's work ends with std::exit, not _exit, so that its exit handlers
+// (the sanitizers' leak check among them) run as in any process that ends.
 struct Child {
-    pid_t pid = -1;
-    int readyFd = -1;
+    harmona::io::ChildProcess process;
+    harmona::io::FileDescriptor ready;
 };
 
 Child StartServer(const harmona::mediad::MediaServerOptions& options) {
-    int ready[2];
-    if (pipe2(ready, O_CLOEXEC) != 0)
-        return {};
-    const pid_t pid = fork();
-    if (pid == 0) {
-        close(ready[0]);
-        std::exit(RunServer(options, ready[1]));
-    }
-    close(ready[1]);
-    if (pid < 0) {
-        close(ready[0]);
-        return {};
-    }
-    return {pid, ready[0]};
+    Child child;
+    child.process = harmona::io::ChildProcess::Start(
+        [&options](int readyFd) -> int { std::exit(RunServer(options, readyFd)); }, child.ready);
+    return child;
 }
 
 // Waits up to `ms` for the child to say it serves 127.0.0.1.
 bool WaitReady(const Child& child, int ms) {
-    pollfd pfd{child.readyFd, POLLIN, 0};
+    pollfd pfd{child.ready.Get(), POLLIN, 0};
     char byte = 0;
-    return poll(&pfd, 1, ms) > 0 && read(child.readyFd, &byte, 1) == 1;
-}
-
-// SIGTERM, then the server's wait status (SIGKILL after kStopWaitMs). 0 when none was running.
-int StopServer(Child* child) {
-    if (child->pid <= 0)
-        return 0;
-    kill(child->pid, SIGTERM);
-    int status = 0;
-    for (int waited = 0; waitpid(child->pid, &status, WNOHANG) == 0; waited += 10) {
-        if (waited >= kStopWaitMs) {
-            kill(child->pid, SIGKILL);
-            waitpid(child->pid, &status, 0);
-            break;
-        }
-        usleep(10 * 1000);
-    }
-    child->pid = -1;
-    if (child->readyFd >= 0)
-        close(child->readyFd);
-    return status;
+    return poll(&pfd, 1, ms) > 0 && read(child.ready.Get(), &byte, 1) == 1;
 }
 
 // --- The live library (child) -------------------------------------------------------------------
@@ -228,25 +202,24 @@ int RunLiveLibrary(const harmona::mediad::MediaServerOptions& options) {
 }
 
 Child StartLiveLibrary(const harmona::mediad::MediaServerOptions& options) {
-    const pid_t pid = fork();
-    if (pid == 0)
-        std::exit(RunLiveLibrary(options));
-    return {pid, -1};
+    Child child;
+    child.process = harmona::io::ChildProcess::Start(
+        [&options](int) -> int { std::exit(RunLiveLibrary(options)); }, child.ready);
+    child.ready.Reset();  // it says nothing when ready
+    return child;
 }
 
 // Starts `child` again when it ended on its own (or never started), a second after it ended.
 template <typename Start>
-void RestartIfEnded(Child* child, const char* what, Start start) {
+void RestartIfEnded(Child& child, const char* what, Start start) {
     int status = 0;
-    if (child->pid > 0 && waitpid(child->pid, &status, WNOHANG) == child->pid) {
+    if (child.process.HasEnded(status)) {
         syslog(LOG_ERR, "the %s process ended (status %d); starting it again", what, status);
-        if (child->readyFd >= 0)
-            close(child->readyFd);
-        *child = {};
+        child = {};
         usleep(kRestartDelayMs * 1000);
     }
-    if (child->pid <= 0)
-        *child = start();
+    if (!child.process)
+        child = start();
 }
 
 }  // namespace
@@ -283,7 +256,7 @@ int main(int argc, char** argv) {
 
     Child server = StartServer(options);
     bool pidWritten = false;
-    if (server.pid > 0 && WaitReady(server, kReadyWaitMs))
+    if (server.process && WaitReady(server, kReadyWaitMs))
         pidWritten = WritePidFile();
     if (!pidWritten)
         syslog(LOG_WARNING, "127.0.0.1 not served yet; the pid file waits for it");
@@ -292,19 +265,19 @@ int main(int argc, char** argv) {
 
     int received = 0;
     for (;;) {
-        if (!pidWritten && server.pid > 0 && WaitReady(server, 0))
+        if (!pidWritten && server.process && WaitReady(server, 0))
             pidWritten = WritePidFile();
         timespec tick{0, 200 * 1000 * 1000};
         siginfo_t info{};
         received = sigtimedwait(&signals, &info, &tick);
         if (received == SIGTERM || received == SIGINT)
             break;
-        RestartIfEnded(&server, "server", [&] { return StartServer(options); });
-        RestartIfEnded(&liveLibrary, "live library", [&] { return StartLiveLibrary(options); });
+        RestartIfEnded(server, "server", [&] { return StartServer(options); });
+        RestartIfEnded(liveLibrary, "live library", [&] { return StartLiveLibrary(options); });
     }
     RemovePidFile();
-    const int liveStatus = StopServer(&liveLibrary);
-    const int status = StopServer(&server);
+    const int liveStatus = liveLibrary.process.Stop(kStopWaitMs);
+    const int status = server.process.Stop(kStopWaitMs);
     harmona::mediad::RemoveDescriptionFolder(options.descriptionFolder);
     syslog(LOG_INFO, "stopped by signal %d", received);
     // A process that did not end cleanly (a fault, a sanitizer report) makes the stop fail too.

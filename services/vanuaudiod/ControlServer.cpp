@@ -30,13 +30,9 @@ bool FillAddress(const std::string& path, sockaddr_un& address) {
 
 // Whether a daemon answers on `path` now (a stale file refuses the connection).
 bool SomeoneListens(const sockaddr_un& address) {
-    const int probe = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    if (probe < 0)
-        return false;
-    const bool live =
-        connect(probe, reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0;
-    close(probe);
-    return live;
+    const harmona::io::FileDescriptor probe(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    return probe &&
+           connect(probe.Get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0;
 }
 
 }  // namespace
@@ -46,16 +42,9 @@ ControlServer::ControlServer(ServerList& servers, std::function<void()> startSea
     : servers_(servers), startSearch_(std::move(startSearch)), options_(std::move(options)) {}
 
 ControlServer::~ControlServer() {
-    for (auto& [fd, client] : clients_)
-        close(fd);
-    clients_.clear();
-    if (listenFd_ >= 0) {
-        close(listenFd_);
+    if (listenFd_) {
+        listenFd_.Reset();
         RemoveSocketFile();
-    }
-    for (int fd : {epollFd_, signalFd_, stopFd_}) {
-        if (fd >= 0)
-            close(fd);
     }
 }
 
@@ -67,19 +56,19 @@ bool ControlServer::Open(std::string& error) {
     }
     if (!ClearTheWay(address, error))
         return false;
-    listenFd_ = socket(AF_UNIX, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0);
-    if (listenFd_ < 0) {
+    listenFd_ =
+        harmona::io::FileDescriptor(socket(AF_UNIX, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0));
+    if (!listenFd_) {
         error = std::string("socket: ") + std::strerror(errno);
         return false;
     }
     // Bind with a closed umask and open up afterwards with chmod, so the mode is exactly ours.
     const mode_t previous = umask(0177);
-    const int bound = bind(listenFd_, reinterpret_cast<sockaddr*>(&address), sizeof(address));
+    const int bound = bind(listenFd_.Get(), reinterpret_cast<sockaddr*>(&address), sizeof(address));
     umask(previous);
     if (bound != 0) {
         error = "bind " + options_.socketPath + ": " + std::strerror(errno);
-        close(listenFd_);
-        listenFd_ = -1;
+        listenFd_.Reset();
         return false;
     }
     struct stat own {};
@@ -90,7 +79,7 @@ bool ControlServer::Open(std::string& error) {
     // Owned by the daemon's account (which removes it at exit), in the web server's group.
     if (lchown(options_.socketPath.c_str(), options_.socketOwner, options_.socketGroup) != 0 ||
         chmod(options_.socketPath.c_str(), options_.socketMode) != 0 ||
-        listen(listenFd_, SOMAXCONN) != 0) {
+        listen(listenFd_.Get(), SOMAXCONN) != 0) {
         error = std::string("chown/chmod/listen: ") + std::strerror(errno);
         return false;
     }
@@ -98,18 +87,18 @@ bool ControlServer::Open(std::string& error) {
     sigemptyset(&stopSignals);
     sigaddset(&stopSignals, SIGTERM);
     sigaddset(&stopSignals, SIGINT);
-    signalFd_ = signalfd(-1, &stopSignals, SFD_NONBLOCK | SFD_CLOEXEC);
-    stopFd_ = eventfd(0, EFD_NONBLOCK | EFD_CLOEXEC);
-    epollFd_ = epoll_create1(EPOLL_CLOEXEC);
-    if (signalFd_ < 0 || stopFd_ < 0 || epollFd_ < 0) {
+    signalFd_ = harmona::io::FileDescriptor(signalfd(-1, &stopSignals, SFD_NONBLOCK | SFD_CLOEXEC));
+    stopFd_ = harmona::io::FileDescriptor(eventfd(0, EFD_NONBLOCK | EFD_CLOEXEC));
+    epollFd_ = harmona::io::FileDescriptor(epoll_create1(EPOLL_CLOEXEC));
+    if (!signalFd_ || !stopFd_ || !epollFd_) {
         error = std::string("signalfd/eventfd/epoll: ") + std::strerror(errno);
         return false;
     }
-    for (int fd : {listenFd_, signalFd_, stopFd_}) {
+    for (int fd : {listenFd_.Get(), signalFd_.Get(), stopFd_.Get()}) {
         epoll_event event{};
         event.events = EPOLLIN;
         event.data.fd = fd;
-        if (epoll_ctl(epollFd_, EPOLL_CTL_ADD, fd, &event) != 0) {
+        if (epoll_ctl(epollFd_.Get(), EPOLL_CTL_ADD, fd, &event) != 0) {
             error = std::string("epoll_ctl: ") + std::strerror(errno);
             return false;
         }
@@ -148,23 +137,23 @@ bool ControlServer::ClearTheWay(const sockaddr_un& address, std::string& error) 
 
 void ControlServer::RequestStop() {
     const uint64_t one = 1;
-    if (stopFd_ >= 0)
-        (void)!write(stopFd_, &one, sizeof(one));
+    if (stopFd_)
+        (void)!write(stopFd_.Get(), &one, sizeof(one));
 }
 
 void ControlServer::Run() {
     epoll_event events[64];
     for (;;) {
-        const int ready = epoll_wait(epollFd_, events, 64, NextTimeoutMs());
+        const int ready = epoll_wait(epollFd_.Get(), events, 64, NextTimeoutMs());
         if (ready < 0 && errno != EINTR) {
             syslog(LOG_ERR, "epoll_wait: %m");
             return;
         }
         for (int i = 0; i < ready; ++i) {
             const int fd = events[i].data.fd;
-            if (fd == signalFd_ || fd == stopFd_)
+            if (fd == signalFd_.Get() || fd == stopFd_.Get())
                 return;
-            if (fd == listenFd_)
+            if (fd == listenFd_.Get())
                 Accept();
             else
                 Readable(fd);
@@ -175,8 +164,10 @@ void ControlServer::Run() {
 
 void ControlServer::Accept() {
     for (;;) {
-        const int fd = accept4(listenFd_, nullptr, nullptr, SOCK_NONBLOCK | SOCK_CLOEXEC);
-        if (fd < 0) {
+        harmona::io::FileDescriptor connection(
+            accept4(listenFd_.Get(), nullptr, nullptr, SOCK_NONBLOCK | SOCK_CLOEXEC));
+        const int fd = connection.Get();
+        if (!connection) {
             if (errno == EINTR || errno == ECONNABORTED)
                 continue;
             if (errno != EAGAIN && errno != EWOULDBLOCK)
@@ -184,18 +175,15 @@ void ControlServer::Accept() {
             return;
         }
         uid_t uid = 0;
-        if (clients_.size() >= options_.maxClients || !AdmitPeer(fd, uid)) {
-            close(fd);  // overloaded: the client sees a closed connection, not a hang
-            continue;
-        }
+        if (clients_.size() >= options_.maxClients || !AdmitPeer(fd, uid))
+            continue;  // closed when `connection` goes: the client sees no hang
         epoll_event event{};
         event.events = EPOLLIN | EPOLLRDHUP;
         event.data.fd = fd;
-        if (epoll_ctl(epollFd_, EPOLL_CTL_ADD, fd, &event) != 0) {
-            close(fd);
+        if (epoll_ctl(epollFd_.Get(), EPOLL_CTL_ADD, fd, &event) != 0)
             continue;
-        }
         Client& client = clients_[fd];
+        client.connection = std::move(connection);
         client.received = 0;
         client.uid = uid;
         ++clientsPerUser_[uid];
@@ -264,11 +252,10 @@ void ControlServer::Finish(int fd, const std::string& reply) {
 }
 
 void ControlServer::Drop(int fd) {
-    epoll_ctl(epollFd_, EPOLL_CTL_DEL, fd, nullptr);
-    close(fd);
+    epoll_ctl(epollFd_.Get(), EPOLL_CTL_DEL, fd, nullptr);
     const auto found = clients_.find(fd);
     if (found == clients_.end())
-        return;
+        return;  // every descriptor handed to Drop is a client's, which erase closes
     const auto count = clientsPerUser_.find(found->second.uid);
     if (count != clientsPerUser_.end() && --count->second == 0)
         clientsPerUser_.erase(count);

@@ -12,6 +12,7 @@
 #include <string>
 #include <unordered_map>
 
+#include "common/io/FileDescriptor.h"
 #include "services/vanuaudiod/Protocol.h"
 #include "services/vanuaudiod/ServerList.h"
 
@@ -47,6 +48,7 @@ class ControlServer {
 
   private:
     struct Client {
+        harmona::io::FileDescriptor connection;  // the map's key is its number
         unsigned char record[kRequestSize];
         std::size_t received = 0;
         std::chrono::steady_clock::time_point deadline;
@@ -65,10 +67,10 @@ class ControlServer {
     ServerList& servers_;
     std::function<void()> startSearch_;
     ControlServerOptions options_;
-    int listenFd_ = -1;
-    int epollFd_ = -1;
-    int signalFd_ = -1;
-    int stopFd_ = -1;  // eventfd for RequestStop
+    harmona::io::FileDescriptor listenFd_;
+    harmona::io::FileDescriptor epollFd_;
+    harmona::io::FileDescriptor signalFd_;
+    harmona::io::FileDescriptor stopFd_;  // eventfd for RequestStop
     dev_t socketDev_ = 0;
     ino_t socketIno_ = 0;
     std::unordered_map<int, Client> clients_;

@@ -14,6 +14,7 @@
 #include <map>
 #include <memory>
 
+#include "common/io/FileDescriptor.h"
 #include "platform/lib/gupnp/ContextManager.h"
 #include "platform/lib/gupnp/HttpFetch.h"
 #include "platform/lib/gupnp/MainLoop.h"
@@ -77,17 +78,16 @@ std::string BroadcastOf(GSSDPClient* client) {
 std::string MulticastRouteProblem(GInetAddress* address) {
     if (g_inet_address_get_family(address) != G_SOCKET_FAMILY_IPV4)
         return "";  // IPv6 SSDP uses the link-scope group, which needs no route
-    const int fd = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, IPPROTO_UDP);
-    if (fd < 0)
+    const harmona::io::FileDescriptor fd(socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, IPPROTO_UDP));
+    if (!fd)
         return "";
     sockaddr_in group{};
     group.sin_family = AF_INET;
     group.sin_port = htons(1900);
     inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
     std::string problem;
-    if (connect(fd, reinterpret_cast<sockaddr*>(&group), sizeof(group)) != 0)
+    if (connect(fd.Get(), reinterpret_cast<sockaddr*>(&group), sizeof(group)) != 0)
         problem = std::strerror(errno);
-    close(fd);
     return problem;
 }
 

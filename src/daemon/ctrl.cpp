@@ -12,6 +12,7 @@
 
 #include <sys/stat.h>
 
+#include "common/io/FileDescriptor.h"
 #include "platform/paths/DaemonAccount.h"
 #include "platform/paths/PlatformPaths.h"
 #include "platform/system/VanuSystem.h"
@@ -106,9 +107,9 @@ bool OwnedByTheDaemon(const char* path) {
 int AudioDaemonConnect() {
     // Non-blocking, so that a daemon whose listen queue is full fails the connect at once
     // instead of holding the request; the exchange waits with select() anyway.
-    const int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0);
-    if (fd < 0)
-        return fd;
+    harmona::io::FileDescriptor fd(socket(AF_UNIX, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0));
+    if (!fd)
+        return -1;
     sockaddr_un address;
     std::memset(&address, 0, sizeof(address));
     address.sun_family = AF_UNIX;
@@ -117,16 +118,14 @@ int AudioDaemonConnect() {
         errno = EACCES;
         syslog(LOG_ERR, "%s:%d Failed to connect to %s. [%m]", kUnit, kLineConnectFailed,
                harmona::paths::kDaemonSocket);
-        close(fd);
         return -1;
     }
-    if (connect(fd, reinterpret_cast<const sockaddr*>(&address), sizeof(address)) != 0) {
+    if (connect(fd.Get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)) != 0) {
         syslog(LOG_ERR, "%s:%d Failed to connect to %s. [%m]", kUnit, kLineConnectFailed,
                harmona::paths::kDaemonSocket);
-        close(fd);
         return -1;
     }
-    return fd;
+    return fd.Release();
 }
 
 int AudioDaemonCall(const AudioDaemonRequest* request, char* reply, int replySize) {

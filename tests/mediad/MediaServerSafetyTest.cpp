@@ -372,18 +372,15 @@ TEST_P(ShareFileOpening, OnlyRegularFilesBeneathTheDirectoryWithoutLinks) {
     mkfifo("/tmp/share/a/pipe.flac", 0644);
     const int share = open("/tmp/share", O_PATH | O_DIRECTORY | O_CLOEXEC);
     ASSERT_GE(share, 0);
-    const int good = harmona::mediad::OpenBeneath(share, "a/song.flac", openat2);
-    EXPECT_GE(good, 0);
-    if (good >= 0)
-        close(good);
+    const harmona::io::FileDescriptor good =
+        harmona::mediad::OpenBeneath(share, "a/song.flac", openat2);
+    EXPECT_GE(good.Get(), 0);
     for (const char* bad :
          {"up/secret", "a/link.flac", "a/pipe.flac", "../secret", "a/../a/song.flac", "/tmp/secret",
           "a", "", "a//song.flac", "missing.flac"}) {
         SCOPED_TRACE(bad);
-        const int fd = harmona::mediad::OpenBeneath(share, bad, openat2);
-        EXPECT_LT(fd, 0);
-        if (fd >= 0)
-            close(fd);
+        const harmona::io::FileDescriptor fd = harmona::mediad::OpenBeneath(share, bad, openat2);
+        EXPECT_LT(fd.Get(), 0);
     }
     close(share);
     EXPECT_EQ(harmona::mediad::PathBelowShare("/volume1/music", "/volume1/music/a/b.mp3"),
