@@ -5,6 +5,7 @@
 #include <string>
 #include <utility>
 
+#include "common/util/Number.h"
 #include "platform/lib/gupnp/MainLoop.h"
 #include "platform/lib/gupnp/ServiceAction.h"
 
@@ -17,11 +18,8 @@ bool ParseUnsigned(const std::string& text, uint32_t* value) {
     std::string digits = text;
     digits.erase(0, digits.find_first_not_of(" \t\r\n"));
     digits.erase(digits.find_last_not_of(" \t\r\n") + 1);
-    if (digits.empty() || digits.size() > 10 ||
-        digits.find_first_not_of("0123456789") != std::string::npos)
-        return false;
-    const unsigned long long parsed = std::strtoull(digits.c_str(), nullptr, 10);
-    if (parsed > 0xffffffffULL)
+    int64_t parsed = 0;
+    if (digits.size() > 10 || !util::ParseDecimalDigits(digits, parsed) || parsed > 0xffffffffLL)
         return false;
     *value = static_cast<uint32_t>(parsed);
     return true;

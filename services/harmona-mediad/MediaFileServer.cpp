@@ -8,6 +8,7 @@
 #include <cstring>
 #include <utility>
 
+#include "common/util/Number.h"
 #include "platform/medialib/MediaFiles.h"
 #include "services/harmona-mediad/ShareFile.h"
 
@@ -56,19 +57,9 @@ void FreeTransfer(gpointer data, GClosure*) {
     delete static_cast<Transfer*>(data);
 }
 
-// 1 to 18 decimal digits and nothing else (no sign, no space): a byte offset or an id that
-// cannot overflow.
-bool ParseDigits(const std::string& text, int64_t* value) {
-    if (text.empty() || text.size() > 18 ||
-        text.find_first_not_of("0123456789") != std::string::npos)
-        return false;
-    *value = std::strtoll(text.c_str(), nullptr, 10);
-    return true;
-}
-
 bool ParseOffset(const std::string& text, off_t* value) {
     int64_t digits = 0;
-    if (!ParseDigits(text, &digits))
+    if (!util::ParseDecimalDigits(text, digits))
         return false;
     *value = static_cast<off_t>(digits);
     return true;
@@ -96,7 +87,7 @@ bool ParseIdName(std::string name, int64_t* id, std::string* extension) {
         *extension = name.substr(dot + 1);
         name.erase(dot);
     }
-    return ParseDigits(name, id);
+    return util::ParseDecimalDigits(name, *id);
 }
 
 }  // namespace

@@ -3,6 +3,8 @@
 #include <cctype>
 #include <cstdlib>
 
+#include "common/util/Number.h"
+
 namespace harmona::mediad {
 namespace {
 
@@ -132,14 +134,6 @@ std::string TrackIdIn(const std::string& containerId, int64_t trackId) {
 
 namespace {
 
-bool ParseTrackNumber(const std::string& digits, int64_t* id) {
-    if (digits.empty() || digits.size() > 18 ||
-        digits.find_first_not_of("0123456789") != std::string::npos)
-        return false;
-    *id = std::strtoll(digits.c_str(), nullptr, 10);
-    return true;
-}
-
 // "AA/NAME" of an album id: both parts unescaped, the name not empty.
 bool ParseAlbumParts(const std::string& rest, ObjectRef* ref) {
     const std::size_t slash = rest.find('/');
@@ -152,7 +146,7 @@ ObjectRef ParseContainerOrTrackId(const std::string& id);
 // "<container id>/track:N", the container being one that lists tracks.
 bool ParseTrackIn(const std::string& id, ObjectRef* ref) {
     const std::size_t at = id.rfind("/track:");
-    if (at == std::string::npos || !ParseTrackNumber(id.substr(at + 7), &ref->trackId))
+    if (at == std::string::npos || !util::ParseDecimalDigits(id.substr(at + 7), ref->trackId))
         return false;
     ref->container = id.substr(0, at);
     const ObjectRef listing = ParseContainerOrTrackId(ref->container);
@@ -218,7 +212,7 @@ ObjectRef ParseContainerOrTrackId(const std::string& id) {
         if (UnescapeIdPart(rest, &ref.name) && !ref.name.empty())
             ref.kind = ObjectKind::Genre;
     } else if (StartsWith(id, "track:", &rest)) {
-        if (ParseTrackNumber(rest, &ref.trackId))
+        if (util::ParseDecimalDigits(rest, ref.trackId))
             ref.kind = ObjectKind::Track;
     }
     return ref;
