@@ -9,7 +9,7 @@
 #include "services/vanuaudiod/Protocol.h"
 #include "services/vanuaudiod/Url.h"
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 namespace {
 
 constexpr const char kMediaServerPrefix[] = "urn:schemas-upnp-org:device:MediaServer:";
@@ -109,4 +109,4 @@ std::string RefuseLocation(const std::string& location, const AnnouncerFacts& fa
     return "";
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

@@ -6,7 +6,7 @@
 
 #include <string>
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 
 enum class AnnouncementKind { kAlive, kByebye, kOther };
 
@@ -33,4 +33,4 @@ struct AnnouncerFacts {
 // Empty when the description at `location` may be fetched; else why not (for the log).
 std::string RefuseLocation(const std::string& location, const AnnouncerFacts& facts);
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

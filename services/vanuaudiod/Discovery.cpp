@@ -22,7 +22,7 @@
 #include "services/vanuaudiod/Announcement.h"
 #include "services/vanuaudiod/Description.h"
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 namespace {
 
 using harmona::gupnp::ObjectRef;
@@ -425,4 +425,4 @@ void Discovery::Stop() {
     thread_.join();
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

@@ -5,7 +5,7 @@
 #include <cstdlib>
 #include <cstring>
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 namespace {
 
 // Parses [-]digits from text[pos]; advances pos. Refuses empty digit runs and int overflow.
@@ -211,4 +211,4 @@ std::string CleanText(const std::string& text, std::size_t maxBytes) {
     return out;
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

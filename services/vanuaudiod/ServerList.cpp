@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 namespace {
 
 // A device that announces no usable max-age is kept for the UPnP default of 30 minutes; a huge
@@ -187,4 +187,4 @@ void ServerList::RebuildSnapshotLocked() {
     snapshot_ = std::move(servers);
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

@@ -11,7 +11,7 @@
 #include <string>
 #include <vector>
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 
 using Clock = std::chrono::steady_clock;
 
@@ -98,4 +98,4 @@ class ServerList {
     ServerSnapshot snapshot_;
 };
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

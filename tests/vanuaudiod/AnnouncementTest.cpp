@@ -5,7 +5,7 @@
 
 #include "services/vanuaudiod/Announcement.h"
 
-using namespace vanuaudiod;
+using namespace harmona::vanuaudiod;
 
 namespace {
 

@@ -3,7 +3,7 @@
 
 #include "services/vanuaudiod/ServerList.h"
 
-using namespace vanuaudiod;
+using namespace harmona::vanuaudiod;
 
 namespace {
 
