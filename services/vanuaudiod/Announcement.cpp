@@ -71,14 +71,14 @@ Announcement ReadAnnouncement(const char* typeHeader, const char* nts, const cha
         return out;
     out.udn = udn;
     if (nts != nullptr && std::strcmp(nts, "ssdp:byebye") == 0) {
-        out.kind = AnnouncementKind::kByebye;
+        out.kind = AnnouncementKind::byebye;
         return out;
     }
     if (nts != nullptr && std::strcmp(nts, "ssdp:alive") != 0)
         return out;  // ssdp:update and the like: nothing to do
     if (location == nullptr || !Printable(location, kMaxControlUrlBytes))
         return out;
-    out.kind = AnnouncementKind::kAlive;
+    out.kind = AnnouncementKind::alive;
     out.location = location;
     out.maxAgeSeconds = MaxAge(cacheControl);
     return out;

@@ -8,10 +8,10 @@
 
 namespace harmona::vanuaudiod {
 
-enum class AnnouncementKind { kAlive, kByebye, kOther };
+enum class AnnouncementKind { alive, byebye, other };
 
 struct Announcement {
-    AnnouncementKind kind = AnnouncementKind::kOther;
+    AnnouncementKind kind = AnnouncementKind::other;
     std::string udn;        // "uuid:..." from the USN
     std::string location;   // LOCATION (alive only)
     int maxAgeSeconds = 0;  // from CACHE-CONTROL; 0 when absent or unreadable
