@@ -13,7 +13,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     std::string didl = reply;  // the same bytes as a bare DIDL-Lite document too
 
     harmona::dma::BrowsePage page;
-    if (harmona::dma::ParseBrowseResponse(reply, page) == harmona::dma::ReplyStatus::Ok &&
+    if (harmona::dma::ParseBrowseResponse(reply, page) == harmona::dma::ReplyStatus::ok &&
         page.hasResult)
         didl = page.ResultText();
 

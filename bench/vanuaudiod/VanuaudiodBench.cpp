@@ -155,7 +155,7 @@ int main(int argc, char** argv) {
     EnterSandbox();
     ResetSandbox();
     PeerNetwork peer;
-    if (!peer.ok())
+    if (!peer)
         return 1;
     // This build's daemon says when discovery listens; another build's may not.
     Process daemon = StartDaemon(kHostInterface, !otherDaemon);

@@ -9,6 +9,9 @@
 // Where a CGI program stands in the platform's web application; 3 is the application's own CGI.
 enum tag_cgi_position { CGI_POSITION_APPLICATION = 3 };
 
+// The access level that the application's own CGI programs ask IsAuthorized for.
+inline constexpr int kApplicationAccessLevel = 3;
+
 class WebMan {
   public:
     // Nonzero when REMOTE_USER names a valid user (1 to 64 bytes, no '/', no control byte or 0x7f,

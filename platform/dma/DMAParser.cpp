@@ -119,9 +119,9 @@ int DMAParser::Parse(DMABrowse* browse) {
         harmona::dma::BrowsePage page;
         const harmona::dma::ReplyStatus status =
             harmona::dma::ParseBrowseResponse(reply.data, page);
-        if (status == harmona::dma::ReplyStatus::Fault)
+        if (status == harmona::dma::ReplyStatus::fault)
             return Fail("SOAP fault");
-        if (status != harmona::dma::ReplyStatus::Ok)
+        if (status != harmona::dma::ReplyStatus::ok)
             return Fail("not a BrowseResponse");
         totalMatches_ = page.totalMatches;
         if (firstPage)

@@ -82,7 +82,7 @@ extern "C" __attribute__((visibility("default"))) int harmona_http_post(
         return -1;
     }
     harmona::curl::GlobalInit global;
-    if (!global.Ok()) {
+    if (!global) {
         SetError(result, "curl_global_init failed");
         return -1;
     }

@@ -158,15 +158,15 @@ ReplyStatus ParseBrowseResponse(std::string& reply, BrowsePage& page) {
     page = BrowsePage{};
     pugi::xml_document document;
     if (!ParseInPlace(document, reply.data(), reply.size()))
-        return ReplyStatus::Malformed;
+        return ReplyStatus::malformed;
     const pugi::xml_node envelope = document.document_element();
     if (!Is(envelope, kSoapEnvelopeNs, "Envelope"))
-        return ReplyStatus::Malformed;
+        return ReplyStatus::malformed;
     const pugi::xml_node body = FindChild(envelope, kSoapEnvelopeNs, "Body");
     if (!body)
-        return ReplyStatus::Malformed;
+        return ReplyStatus::malformed;
     if (FindChild(body, kSoapEnvelopeNs, "Fault"))
-        return ReplyStatus::Fault;
+        return ReplyStatus::fault;
     pugi::xml_node response;
     for (pugi::xml_node child : body.children()) {
         if (child.type() == pugi::node_element &&
@@ -178,13 +178,13 @@ ReplyStatus ParseBrowseResponse(std::string& reply, BrowsePage& page) {
         }
     }
     if (!response)
-        return ReplyStatus::NotBrowseResponse;
+        return ReplyStatus::notBrowseResponse;
     const pugi::xml_node result = FindArgument(response, "Result");
     if (result)
         TakeResult(result, page);
     page.totalMatches = ToUnsigned(TextOf(FindArgument(response, "TotalMatches")));
     page.numberReturned = ToUnsigned(TextOf(FindArgument(response, "NumberReturned")));
-    return ReplyStatus::Ok;
+    return ReplyStatus::ok;
 }
 
 namespace {

@@ -71,7 +71,7 @@ struct BrowsePage {
     std::string joined;
 };
 
-enum class ReplyStatus { Ok, Malformed, Fault, NotBrowseResponse };
+enum class ReplyStatus { ok, malformed, fault, notBrowseResponse };
 
 // Parses a SOAP reply (modified in place: pugixml parses the buffer itself; `page` may point into
 // it).

@@ -105,7 +105,8 @@ class TrackTable {
           byRowid_(
               db.Prepare("SELECT path, artist, title, duration_ms FROM track WHERE rowid = ?1")) {}
 
-    bool Ready() const { return static_cast<bool>(byRowid_); }
+    // The track query was prepared (the database holds a readable track table).
+    explicit operator bool() const { return static_cast<bool>(byRowid_); }
 
     // The smallest and largest rowid; false when the table is empty or the query failed.
     bool RowidRange(std::int64_t& first, std::int64_t& last, bool& failed) {
@@ -217,7 +218,7 @@ bool DrawByScan(TrackTable& table, std::size_t count, Generator& random,
 // The random tracks; false when the database could not be read (an empty result is not a failure).
 bool DrawTracks(sqlite::Database& db, std::size_t count, std::vector<Track>& tracks) {
     TrackTable table(db);
-    if (!table.Ready())
+    if (!table)
         return false;
     std::int64_t first = 0;
     std::int64_t last = 0;

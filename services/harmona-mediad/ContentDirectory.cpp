@@ -21,7 +21,7 @@ namespace {
 // A file request waits this long for an indexer that holds library.db locked.
 constexpr int kLookUpBusyTimeoutMs = 3000;
 
-enum class SortKey { Title, Artist, Album, TrackNumber, Date };
+enum class SortKey { title, artist, album, trackNumber, date };
 
 struct SortField {
     SortKey key;
@@ -33,9 +33,9 @@ struct SortProperty {
     SortKey key;
 };
 constexpr SortProperty kSortProperties[] = {
-    {"dc:title", SortKey::Title},   {"upnp:artist", SortKey::Artist},
-    {"upnp:album", SortKey::Album}, {"upnp:originalTrackNumber", SortKey::TrackNumber},
-    {"dc:date", SortKey::Date},
+    {"dc:title", SortKey::title},   {"upnp:artist", SortKey::artist},
+    {"upnp:album", SortKey::album}, {"upnp:originalTrackNumber", SortKey::trackNumber},
+    {"dc:date", SortKey::date},
 };
 
 std::string Trimmed(const std::string& text) {
@@ -91,15 +91,15 @@ SortValues ValuesOf(const LibraryView& view, const ViewChild& child) {
 
 int CompareBy(SortKey key, const SortValues& a, const SortValues& b) {
     switch (key) {
-        case SortKey::Title:
+        case SortKey::title:
             return CompareNoCase(a.title, b.title);
-        case SortKey::Artist:
+        case SortKey::artist:
             return CompareNoCase(a.artist, b.artist);
-        case SortKey::Album:
+        case SortKey::album:
             return CompareNoCase(a.album, b.album);
-        case SortKey::TrackNumber:
+        case SortKey::trackNumber:
             return a.trackNo == b.trackNo ? 0 : a.trackNo < b.trackNo ? -1 : 1;
-        case SortKey::Date:
+        case SortKey::date:
             return a.year == b.year ? 0 : a.year < b.year ? -1 : 1;
     }
     return 0;
@@ -164,9 +164,9 @@ uint32_t ClampCount(std::size_t value) {
 // item of this view.
 const ViewTrack* FindItem(const LibraryView& view, const std::string& id, uint32_t* container) {
     const ObjectRef ref = ParseObjectId(id);
-    if (ref.kind == ObjectKind::Track) {
+    if (ref.kind == ObjectKind::track) {
         *container = view.allMusic();
-    } else if (ref.kind == ObjectKind::TrackIn) {
+    } else if (ref.kind == ObjectKind::trackIn) {
         *container = view.ContainerIndex(ref.container);
     } else {
         return nullptr;

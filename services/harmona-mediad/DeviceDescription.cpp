@@ -175,9 +175,9 @@ std::string DeviceDescription(const std::string& udn, const std::string& friendl
            "</serviceList></device></root>\n";
 }
 
-bool WriteDescriptionFolder(const std::string& folder, const std::string& udn, std::string* error) {
+bool WriteDescriptionFolder(const std::string& folder, const std::string& udn, std::string& error) {
     if (mkdir(folder.c_str(), 0755) != 0 && errno != EEXIST) {
-        *error = "cannot create " + folder + ": " + std::strerror(errno);
+        error = "cannot create " + folder + ": " + std::strerror(errno);
         return false;
     }
     chmod(folder.c_str(), 0755);
@@ -185,7 +185,7 @@ bool WriteDescriptionFolder(const std::string& folder, const std::string& udn, s
     if (!WriteWholeFile(base + kDescriptionFile, DeviceDescription(udn, DefaultFriendlyName())) ||
         !WriteWholeFile(base + kContentDirectoryScpdFile, kContentDirectoryScpd) ||
         !WriteWholeFile(base + kConnectionManagerScpdFile, kConnectionManagerScpd)) {
-        *error = "cannot write the device description into " + folder;
+        error = "cannot write the device description into " + folder;
         return false;
     }
     return true;

@@ -26,7 +26,7 @@ std::string DefaultFriendlyName();
 
 // Writes the description and both SCPDs into `folder` (created 0755, files 0644, so that the
 // service still reads them after it dropped root). False with `error` set when it cannot.
-bool WriteDescriptionFolder(const std::string& folder, const std::string& udn, std::string* error);
+bool WriteDescriptionFolder(const std::string& folder, const std::string& udn, std::string& error);
 
 // Removes what WriteDescriptionFolder wrote, and the folder.
 void RemoveDescriptionFolder(const std::string& folder);

@@ -48,13 +48,13 @@ LiveLibrary::~LiveLibrary() {
     Stop();
 }
 
-bool LiveLibrary::Start(std::string* error) {
+bool LiveLibrary::Start(std::string& error) {
     if (thread_.joinable())
         return true;
     inotifyFd_ = io::FileDescriptor(inotify_init1(IN_NONBLOCK | IN_CLOEXEC));
     wakeFd_ = io::FileDescriptor(eventfd(0, EFD_NONBLOCK | EFD_CLOEXEC));
     if (!inotifyFd_ || !wakeFd_) {
-        *error = std::string("cannot watch the share: ") + std::strerror(errno);
+        error = std::string("cannot watch the share: ") + std::strerror(errno);
         Stop();
         return false;
     }

@@ -46,7 +46,7 @@ class LiveLibrary {
 
     // Starts the thread, which watches the share and runs a first pass at once (changes made
     // while the server was not running). False, with `error` set, when inotify is unavailable.
-    bool Start(std::string* error);
+    bool Start(std::string& error);
     // Ends the thread: a running pass stops at its next batch, nothing half written.
     void Stop();
 

@@ -111,22 +111,22 @@ ByteRange ParseByteRange(const char* header, off_t size) {
     off_t first = 0, last = 0;
     if (from.empty()) {  // the last n bytes
         if (!ParseOffset(to, &last) || last == 0) {
-            range.kind = ByteRange::Kind::Unsatisfiable;
+            range.kind = ByteRange::Kind::unsatisfiable;
             return range;
         }
-        range.kind = ByteRange::Kind::Part;
+        range.kind = ByteRange::Kind::part;
         range.first = last >= size ? 0 : size - last;
         range.last = size - 1;
     } else {
         if (!ParseOffset(from, &first) || (!to.empty() && !ParseOffset(to, &last)) ||
             (!to.empty() && last < first))
             return range;  // malformed: ignored, the whole file
-        range.kind = ByteRange::Kind::Part;
+        range.kind = ByteRange::Kind::part;
         range.first = first;
         range.last = to.empty() || last >= size ? size - 1 : last;
     }
     if (size == 0 || range.first >= size)
-        range.kind = ByteRange::Kind::Unsatisfiable;
+        range.kind = ByteRange::Kind::unsatisfiable;
     return range;
 }
 
@@ -202,7 +202,7 @@ void MediaFileServer::Serve(SoupServerMessage* message, const std::string& path)
         SetImageHeaders(response, file);
     else
         SetAudioHeaders(response, file);
-    if (range.kind == ByteRange::Kind::Unsatisfiable) {
+    if (range.kind == ByteRange::Kind::unsatisfiable) {
         const std::string contentRange = "bytes */" + std::to_string(st.st_size);
         soup_message_headers_replace(response, "Content-Range", contentRange.c_str());
         soup_server_message_set_status(message, SOUP_STATUS_REQUESTED_RANGE_NOT_SATISFIABLE,
@@ -213,7 +213,7 @@ void MediaFileServer::Serve(SoupServerMessage* message, const std::string& path)
     transfer->fd = std::move(fd);
     transfer->next = range.first;
     transfer->end = st.st_size == 0 ? 0 : range.last + 1;
-    if (range.kind == ByteRange::Kind::Part) {
+    if (range.kind == ByteRange::Kind::part) {
         soup_message_headers_set_content_range(response, range.first, range.last, st.st_size);
         soup_server_message_set_status(message, SOUP_STATUS_PARTIAL_CONTENT, nullptr);
     } else {

@@ -29,7 +29,7 @@ struct ServedFile {
 
 // One byte range of a file of `size` bytes; parsed from a Range header.
 struct ByteRange {
-    enum class Kind { Whole, Part, Unsatisfiable } kind = Kind::Whole;
+    enum class Kind { whole, part, unsatisfiable } kind = Kind::whole;
     off_t first = 0;
     off_t last = 0;  // inclusive
 };

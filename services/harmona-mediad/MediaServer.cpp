@@ -39,25 +39,25 @@ GSSDPResourceGroup* ResourceGroupOf(GUPnPRootDevice* device) {
 // interface that is down, has no carrier or does not do multicast; and connect() still does the
 // route lookup GSSDP's sends do, without sending anything.
 bool MulticastCanLeave(const std::string& interfaceName, const std::string& address,
-                       std::string* why) {
+                       std::string& why) {
     const io::FileDescriptor socketFd(socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0));
     const int s = socketFd.Get();
     if (!socketFd) {
-        *why = std::strerror(errno);
+        why = std::strerror(errno);
         return false;
     }
     ifreq request{};
     std::strncpy(request.ifr_name, interfaceName.c_str(), IFNAMSIZ - 1);
     bool ok = ioctl(s, SIOCGIFFLAGS, &request) == 0;
     if (!ok)
-        *why = std::strerror(errno);
+        why = std::strerror(errno);
     else if ((request.ifr_flags & IFF_UP) == 0)
-        *why = "interface down";
+        why = "interface down";
     else if ((request.ifr_flags & IFF_RUNNING) == 0)
-        *why = "no carrier";
+        why = "no carrier";
     else if ((request.ifr_flags & IFF_MULTICAST) == 0)
-        *why = "multicast off";
-    ok = ok && why->empty();
+        why = "multicast off";
+    ok = ok && why.empty();
     if (ok) {
         in_addr local{};
         inet_pton(AF_INET, address.c_str(), &local);
@@ -68,7 +68,7 @@ bool MulticastCanLeave(const std::string& interfaceName, const std::string& addr
         inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
         ok = connect(s, reinterpret_cast<sockaddr*>(&group), sizeof(group)) == 0;
         if (!ok)
-            *why = std::strerror(errno);
+            why = std::strerror(errno);
     }
     return ok;
 }
@@ -80,7 +80,7 @@ bool MulticastCanLeave(const std::string& interfaceName, const std::string& addr
 std::unique_ptr<ServedContext> ServedContext::Create(
     GUPnPContext* context, const MediaServerOptions& options,
     std::shared_ptr<ContentDirectory> directory, std::function<void(ServedContext&)> onAvailable,
-    std::string* error) {
+    std::string& error) {
     std::unique_ptr<ServedContext> served(new ServedContext);
     served->context_ = gupnp::ObjectRef<GUPnPContext>::Share(context);
     served->address_ = OrEmpty(gssdp_client_get_host_ip(GSSDP_CLIENT(context)));
@@ -92,7 +92,7 @@ std::unique_ptr<ServedContext> ServedContext::Create(
     served->device_ = gupnp::ObjectRef<GUPnPRootDevice>::Adopt(gupnp_root_device_new(
         context, kDescriptionFile, options.descriptionFolder.c_str(), gerror.out()));
     if (!served->device_) {
-        *error = std::string("no root device on ") + served->address_ + ": " + gerror.message();
+        error = std::string("no root device on ") + served->address_ + ": " + gerror.message();
         return nullptr;
     }
     GUPnPDeviceInfo* info = GUPNP_DEVICE_INFO(served->device_.get());
@@ -101,7 +101,7 @@ std::unique_ptr<ServedContext> ServedContext::Create(
     auto connectionManager = gupnp::ObjectRef<GUPnPServiceInfo>::Adopt(
         gupnp_device_info_get_service(info, kConnectionManagerType));
     if (!contentDirectory || !connectionManager) {
-        *error = "the device description lacks its services";
+        error = "the device description lacks its services";
         return nullptr;
     }
     served->contentDirectoryService_ = std::make_unique<ContentDirectoryService>(
@@ -182,7 +182,7 @@ void ServedContext::NotifyIfLibraryChanged() {
 
 void ServedContext::CheckMulticast() {
     std::string why;
-    const bool ok = MulticastCanLeave(interface_, address_, &why);
+    const bool ok = MulticastCanLeave(interface_, address_, why);
     if (ok == multicastOk_)
         return;
     multicastOk_ = ok;
@@ -257,7 +257,7 @@ bool MediaServer::TryLoopback() {
         gupnp_context_new_full("lo", address, options_.port, GSSDP_UDA_VERSION_1_0, gerror.out()));
     g_object_unref(address);
     std::string error = gerror.message();
-    if (!context || !ServeLoopback(context.get(), &error)) {
+    if (!context || !ServeLoopback(context.get(), error)) {
         static bool logged = false;
         if (!logged)
             syslog(LOG_ERR, "cannot serve 127.0.0.1:%u yet (%s); trying again every %u s",
@@ -268,7 +268,7 @@ bool MediaServer::TryLoopback() {
     return true;
 }
 
-bool MediaServer::ServeLoopback(GUPnPContext* context, std::string* error) {
+bool MediaServer::ServeLoopback(GUPnPContext* context, std::string& error) {
     loopback_ = ServedContext::Create(
         context, options_, directory_,
         [this](ServedContext&) {
@@ -303,7 +303,7 @@ void MediaServer::OnContextAvailable(GUPnPContextManager*, GUPnPContext* context
         // to bind (GUPnP warns once). Should the manager have got there first, its context
         // serves 127.0.0.1 instead.
         std::string error;
-        if (!me->loopback_ && me->ServeLoopback(context, &error))
+        if (!me->loopback_ && me->ServeLoopback(context, error))
             me->loopbackRetry_.Remove();
         return;
     }
@@ -316,7 +316,7 @@ void MediaServer::OnContextAvailable(GUPnPContextManager*, GUPnPContext* context
             available.ScheduleAnnouncements();
             available.CheckMulticast();
         },
-        &error);
+        error);
     if (!served) {
         syslog(LOG_ERR, "cannot serve %s (%s): %s", interfaceName.c_str(), address.c_str(),
                error.c_str());

@@ -45,7 +45,7 @@ class ServedContext {
                                                  const MediaServerOptions& options,
                                                  std::shared_ptr<ContentDirectory> directory,
                                                  std::function<void(ServedContext&)> onAvailable,
-                                                 std::string* error);
+                                                 std::string& error);
     ~ServedContext();
 
     const std::string& address() const { return address_; }
@@ -94,7 +94,7 @@ class MediaServer {
 
   private:
     bool TryLoopback();
-    bool ServeLoopback(GUPnPContext* context, std::string* error);
+    bool ServeLoopback(GUPnPContext* context, std::string& error);
     void StartContextManager();
     static void OnContextAvailable(GUPnPContextManager* manager, GUPnPContext* context,
                                    gpointer self);

@@ -151,11 +151,11 @@ bool ParseTrackIn(const std::string& id, ObjectRef* ref) {
     ref->container = id.substr(0, at);
     const ObjectRef listing = ParseContainerOrTrackId(ref->container);
     switch (listing.kind) {
-        case ObjectKind::Category:
+        case ObjectKind::category:
             return ref->container != kAllMusicId;
-        case ObjectKind::Folder:
-        case ObjectKind::Album:
-        case ObjectKind::Genre:
+        case ObjectKind::folder:
+        case ObjectKind::album:
+        case ObjectKind::genre:
             return true;
         default:
             return false;
@@ -167,7 +167,7 @@ bool ParseTrackIn(const std::string& id, ObjectRef* ref) {
 ObjectRef ParseObjectId(const std::string& id) {
     ObjectRef ref;
     if (ParseTrackIn(id, &ref)) {
-        ref.kind = ObjectKind::TrackIn;
+        ref.kind = ObjectKind::trackIn;
         return ref;
     }
     return ParseContainerOrTrackId(id);
@@ -179,41 +179,41 @@ ObjectRef ParseContainerOrTrackId(const std::string& id) {
     ObjectRef ref;
     std::string rest;
     if (id == kRootId) {
-        ref.kind = ObjectKind::Root;
+        ref.kind = ObjectKind::root;
         return ref;
     }
     for (const char* category : kCategories) {
         if (id == category) {
-            ref.kind = ObjectKind::Category;
+            ref.kind = ObjectKind::category;
             ref.category = id;
             return ref;
         }
     }
     if (StartsWith(id, "folder:", &rest)) {
         if (ParseFolder(rest, &ref.folder))
-            ref.kind = ObjectKind::Folder;
+            ref.kind = ObjectKind::folder;
     } else if (StartsWith(id, "album:", &rest)) {
         if (ParseAlbumParts(rest, &ref))
-            ref.kind = ObjectKind::Album;
+            ref.kind = ObjectKind::album;
     } else if (StartsWith(id, "latest:", &rest)) {
         if (ParseAlbumParts(rest, &ref)) {
-            ref.kind = ObjectKind::Album;
-            ref.albumView = AlbumView::Latest;
+            ref.kind = ObjectKind::album;
+            ref.albumView = AlbumView::latest;
         }
     } else if (StartsWith(id, "artist:", &rest)) {
         if (rest.find('/') != std::string::npos) {
             if (ParseAlbumParts(rest, &ref) && !ref.albumArtist.empty()) {
-                ref.kind = ObjectKind::Album;
-                ref.albumView = AlbumView::Artist;
+                ref.kind = ObjectKind::album;
+                ref.albumView = AlbumView::artist;
             }
         } else if (UnescapeIdPart(rest, &ref.albumArtist) && !ref.albumArtist.empty())
-            ref.kind = ObjectKind::Artist;
+            ref.kind = ObjectKind::artist;
     } else if (StartsWith(id, "genre:", &rest)) {
         if (UnescapeIdPart(rest, &ref.name) && !ref.name.empty())
-            ref.kind = ObjectKind::Genre;
+            ref.kind = ObjectKind::genre;
     } else if (StartsWith(id, "track:", &rest)) {
         if (util::ParseDecimalDigits(rest, ref.trackId))
-            ref.kind = ObjectKind::Track;
+            ref.kind = ObjectKind::track;
     }
     return ref;
 }

@@ -26,18 +26,18 @@ inline constexpr const char* kGenresId = "music_genre";
 inline constexpr const char* kRandomId = "random";
 inline constexpr const char* kLatestAlbumsId = "music_latestalbum";
 
-enum class ObjectKind { Invalid, Root, Category, Folder, Album, Artist, Genre, Track, TrackIn };
+enum class ObjectKind { invalid, root, category, folder, album, artist, genre, track, trackIn };
 
 // Where an album container is listed.
-enum class AlbumView { Albums, Artist, Latest };
+enum class AlbumView { albums, artist, latest };
 
 struct ObjectRef {
-    ObjectKind kind = ObjectKind::Invalid;
+    ObjectKind kind = ObjectKind::invalid;
     std::string category;     // Category: its id
     std::string folder;       // Folder: path relative to the share, no leading or trailing "/"
     std::string albumArtist;  // Album: the album artist ("" when none); Artist: the name
     std::string name;         // Album: the album; Genre: the genre
-    AlbumView albumView = AlbumView::Albums;  // Album
+    AlbumView albumView = AlbumView::albums;  // Album
     int64_t trackId = 0;                      // Track, TrackIn
     std::string container;                    // TrackIn: the id of the listing container
 };

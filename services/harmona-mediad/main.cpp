@@ -185,7 +185,7 @@ int RunLiveLibrary(const harmona::mediad::MediaServerOptions& options) {
     live.dbPath = options.dbPath;
     harmona::mediad::LiveLibrary library(live);
     std::string error;
-    if (!library.Start(&error)) {
+    if (!library.Start(error)) {
         // Not worth restarting for: without inotify the library is as the last indexer run left it.
         syslog(LOG_ERR, "the library will not follow the share: %s", error.c_str());
     }
@@ -248,7 +248,7 @@ int main(int argc, char** argv) {
     options.descriptionFolder = "/run/harmona-mediad." + std::to_string(getpid());
     std::string error;
     if (!harmona::mediad::WriteDescriptionFolder(options.descriptionFolder,
-                                                 harmona::mediad::MakeUdn(), &error)) {
+                                                 harmona::mediad::MakeUdn(), error)) {
         syslog(LOG_ERR, "cannot start: %s", error.c_str());
         std::fprintf(stderr, "harmona-mediad: %s\n", error.c_str());
         return 1;

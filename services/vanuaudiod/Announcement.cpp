@@ -9,7 +9,7 @@
 #include "services/vanuaudiod/Protocol.h"
 #include "services/vanuaudiod/Url.h"
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 namespace {
 
 constexpr const char kMediaServerPrefix[] = "urn:schemas-upnp-org:device:MediaServer:";
@@ -71,14 +71,14 @@ Announcement ReadAnnouncement(const char* typeHeader, const char* nts, const cha
         return out;
     out.udn = udn;
     if (nts != nullptr && std::strcmp(nts, "ssdp:byebye") == 0) {
-        out.kind = AnnouncementKind::kByebye;
+        out.kind = AnnouncementKind::byebye;
         return out;
     }
     if (nts != nullptr && std::strcmp(nts, "ssdp:alive") != 0)
         return out;  // ssdp:update and the like: nothing to do
     if (location == nullptr || !Printable(location, kMaxControlUrlBytes))
         return out;
-    out.kind = AnnouncementKind::kAlive;
+    out.kind = AnnouncementKind::alive;
     out.location = location;
     out.maxAgeSeconds = MaxAge(cacheControl);
     return out;
@@ -109,4 +109,4 @@ std::string RefuseLocation(const std::string& location, const AnnouncerFacts& fa
     return "";
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

@@ -6,12 +6,12 @@
 
 #include <string>
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 
-enum class AnnouncementKind { kAlive, kByebye, kOther };
+enum class AnnouncementKind { alive, byebye, other };
 
 struct Announcement {
-    AnnouncementKind kind = AnnouncementKind::kOther;
+    AnnouncementKind kind = AnnouncementKind::other;
     std::string udn;        // "uuid:..." from the USN
     std::string location;   // LOCATION (alive only)
     int maxAgeSeconds = 0;  // from CACHE-CONTROL; 0 when absent or unreadable
@@ -33,4 +33,4 @@ struct AnnouncerFacts {
 // Empty when the description at `location` may be fetched; else why not (for the log).
 std::string RefuseLocation(const std::string& location, const AnnouncerFacts& facts);
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

@@ -14,7 +14,7 @@
 #include <cerrno>
 #include <cstring>
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 namespace {
 
 using SteadyClock = std::chrono::steady_clock;
@@ -292,4 +292,4 @@ void ControlServer::RemoveSocketFile() {
         unlink(options_.socketPath.c_str());
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

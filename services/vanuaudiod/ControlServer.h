@@ -16,7 +16,7 @@
 #include "services/vanuaudiod/Protocol.h"
 #include "services/vanuaudiod/ServerList.h"
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 
 struct ControlServerOptions {
     std::string socketPath;
@@ -77,4 +77,4 @@ class ControlServer {
     std::unordered_map<uid_t, std::size_t> clientsPerUser_;
 };
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

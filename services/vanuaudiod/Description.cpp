@@ -9,7 +9,7 @@
 #include "services/vanuaudiod/Protocol.h"
 #include "services/vanuaudiod/Url.h"
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 namespace {
 
 constexpr const char kMediaServerType[] = "urn:schemas-upnp-org:device:MediaServer:";
@@ -119,4 +119,4 @@ bool ParseDeviceDescription(const std::string& xml, const std::string& location,
     return true;
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

@@ -6,7 +6,7 @@
 
 #include "services/vanuaudiod/ServerList.h"
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 
 // Parses `xml`, fetched from `location`. The media server is the root device or the first
 // embedded device whose deviceType is a MediaServer (preferring one whose UDN is `udn`); its
@@ -23,4 +23,4 @@ std::string ResolveUrl(const std::string& base, const std::string& relative);
 // The host part of an http URL (IPv6 without brackets); empty when it is not one.
 std::string HostOfUrl(const std::string& url);
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

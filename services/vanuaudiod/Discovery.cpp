@@ -23,7 +23,7 @@
 #include "services/vanuaudiod/Announcement.h"
 #include "services/vanuaudiod/Description.h"
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 namespace {
 
 using harmona::gupnp::ObjectRef;
@@ -243,9 +243,9 @@ class Discovery::Worker {
                              soup_message_headers_get_one(headers, "USN"),
                              soup_message_headers_get_one(headers, "LOCATION"),
                              soup_message_headers_get_one(headers, "CACHE-CONTROL"));
-        if (announcement.kind == AnnouncementKind::kByebye)
+        if (announcement.kind == AnnouncementKind::byebye)
             Byebye(announcement.udn, fromIp);
-        else if (announcement.kind == AnnouncementKind::kAlive)
+        else if (announcement.kind == AnnouncementKind::alive)
             Alive(address, announcement, fromIp);
     }
 
@@ -269,18 +269,18 @@ class Discovery::Worker {
         }
         switch (servers_.Seen(announcement.udn, announcement.location, fromIp,
                               announcement.maxAgeSeconds, Clock::now())) {
-            case SeenOutcome::kFetch:
+            case SeenOutcome::fetch:
                 Enqueue({announcement.udn, announcement.location, fromIp});
                 return;
-            case SeenOutcome::kAnnouncerFull:
+            case SeenOutcome::announcerFull:
                 Refused(announcement.udn, fromIp,
                         "its address announces " + std::to_string(kMaxDevicesPerAnnouncer) +
                             " devices already");
                 return;
-            case SeenOutcome::kTableFull:
+            case SeenOutcome::tableFull:
                 Refused(announcement.udn, fromIp, "the device table is full");
                 return;
-            case SeenOutcome::kNothing:
+            case SeenOutcome::nothing:
                 return;
         }
     }
@@ -425,4 +425,4 @@ void Discovery::Stop() {
     thread_.join();
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

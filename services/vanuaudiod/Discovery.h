@@ -14,7 +14,7 @@
 
 #include "services/vanuaudiod/ServerList.h"
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 
 struct DiscoveryOptions {
     const char* interfaceName = nullptr;  // nullptr: every interface with an address
@@ -54,4 +54,4 @@ class Discovery {
     std::thread thread_;
 };
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

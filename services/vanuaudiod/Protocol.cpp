@@ -7,7 +7,7 @@
 
 #include "common/util/Utf8.h"
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 namespace {
 
 // Parses [-]digits from text[pos]; advances pos. Refuses empty digit runs and int overflow.
@@ -182,4 +182,4 @@ std::string CleanText(const std::string& text, std::size_t maxBytes) {
     return out;
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

@@ -9,7 +9,7 @@
 
 #include "services/vanuaudiod/ServerList.h"
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 
 // The request record: a native-order int32 command and 8192 bytes of NUL-terminated argument text.
 inline constexpr std::size_t kCommandSize = 4;
@@ -64,4 +64,4 @@ std::string JsonString(const std::string& text);
 // cut to at most `maxBytes` on a character boundary.
 std::string CleanText(const std::string& text, std::size_t maxBytes);
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

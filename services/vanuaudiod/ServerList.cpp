@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 namespace {
 
 // A device that announces no usable max-age is kept for the UPnP default of 30 minutes; a huge
@@ -31,9 +31,9 @@ SeenOutcome ServerList::Seen(const std::string& udn, const std::string& location
     auto found = entries_.find(udn);
     if (found == entries_.end()) {
         if (CountFromLocked(announcer) >= kMaxDevicesPerAnnouncer)
-            return SeenOutcome::kAnnouncerFull;
+            return SeenOutcome::announcerFull;
         if (entries_.size() >= kMaxKnownDevices && !EvictUndescribedLocked())
-            return SeenOutcome::kTableFull;
+            return SeenOutcome::tableFull;
         Entry entry;
         entry.location = location;
         entry.announcer = announcer;
@@ -42,7 +42,7 @@ SeenOutcome ServerList::Seen(const std::string& udn, const std::string& location
         entry.expiresAt = std::min(expiresAt, now + kUndescribedHold);
         entry.fetchPending = true;
         entries_.emplace(udn, std::move(entry));
-        return SeenOutcome::kFetch;
+        return SeenOutcome::fetch;
     }
     Entry& entry = found->second;
     entry.announcedUntil = std::max(entry.announcedUntil, expiresAt);
@@ -50,7 +50,7 @@ SeenOutcome ServerList::Seen(const std::string& udn, const std::string& location
         // Moved (new address or port): the old description no longer holds. The new address
         // must have room as a newcomer would.
         if (entry.announcer != announcer && CountFromLocked(announcer) >= kMaxDevicesPerAnnouncer)
-            return SeenOutcome::kAnnouncerFull;
+            return SeenOutcome::announcerFull;
         const bool wasListed = entry.described;
         entry.location = location;
         entry.announcer = announcer;
@@ -60,19 +60,19 @@ SeenOutcome ServerList::Seen(const std::string& udn, const std::string& location
         entry.expiresAt = std::min(expiresAt, now + kUndescribedHold);
         if (wasListed)
             RebuildSnapshotLocked();
-        return SeenOutcome::kFetch;
+        return SeenOutcome::fetch;
     }
     if (entry.described) {
         entry.expiresAt = std::max(entry.expiresAt, expiresAt);
-        return SeenOutcome::kNothing;
+        return SeenOutcome::nothing;
     }
     if (entry.fetchPending)
-        return SeenOutcome::kNothing;
+        return SeenOutcome::nothing;
     if (entry.failed && now - entry.lastFailure < kRetryAfterFailure)
-        return SeenOutcome::kNothing;
+        return SeenOutcome::nothing;
     entry.fetchPending = true;
     entry.expiresAt = std::min(expiresAt, now + kUndescribedHold);
-    return SeenOutcome::kFetch;
+    return SeenOutcome::fetch;
 }
 
 bool ServerList::Described(const std::string& udn, const std::string& location, bool ok,
@@ -187,4 +187,4 @@ void ServerList::RebuildSnapshotLocked() {
     snapshot_ = std::move(servers);
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

@@ -11,7 +11,7 @@
 #include <string>
 #include <vector>
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 
 using Clock = std::chrono::steady_clock;
 
@@ -27,10 +27,10 @@ using ServerSnapshot = std::shared_ptr<const std::vector<MediaServer>>;
 
 // What an announcement leads to.
 enum class SeenOutcome {
-    kFetch,          // fetch the description now
-    kNothing,        // known already (described, or a fetch is pending or failed lately)
-    kAnnouncerFull,  // its announcer has as many devices as one address may have
-    kTableFull,      // every slot holds a described server or a pending fetch
+    fetch,          // fetch the description now
+    nothing,        // known already (described, or a fetch is pending or failed lately)
+    announcerFull,  // its announcer has as many devices as one address may have
+    tableFull,      // every slot holds a described server or a pending fetch
 };
 
 // The table's bounds: a flood of announcements may not push real servers out, nor hold slots
@@ -98,4 +98,4 @@ class ServerList {
     ServerSnapshot snapshot_;
 };
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

@@ -4,7 +4,7 @@
 
 #include <cstdlib>
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 
 bool SplitHttpUrl(const std::string& url, UrlParts& out) {
     static const char kScheme[] = "http://";
@@ -54,4 +54,4 @@ bool SplitHttpUrl(const std::string& url, UrlParts& out) {
     return true;
 }
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

@@ -4,7 +4,7 @@
 
 #include <string>
 
-namespace vanuaudiod {
+namespace harmona::vanuaudiod {
 
 struct UrlParts {
     std::string host;  // without brackets for IPv6 literals
@@ -16,4 +16,4 @@ struct UrlParts {
 // user info, empty or malformed host or port).
 bool SplitHttpUrl(const std::string& url, UrlParts& out);
 
-}  // namespace vanuaudiod
+}  // namespace harmona::vanuaudiod

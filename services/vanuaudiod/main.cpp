@@ -129,20 +129,20 @@ int main(int argc, char** argv) {
     PrepareSignals();
     RaiseDescriptorLimit();
 
-    vanuaudiod::ServerList servers;
-    vanuaudiod::DiscoveryOptions discoveryOptions;
+    harmona::vanuaudiod::ServerList servers;
+    harmona::vanuaudiod::DiscoveryOptions discoveryOptions;
     discoveryOptions.interfaceName = arguments.interfaceName;
-    vanuaudiod::Discovery discovery(servers, discoveryOptions);
+    harmona::vanuaudiod::Discovery discovery(servers, discoveryOptions);
 
     std::string error;
     Account account;
     if (!ChooseAccount(account, error))
         return Fail(error);
-    vanuaudiod::ControlServerOptions serverOptions;
+    harmona::vanuaudiod::ControlServerOptions serverOptions;
     serverOptions.socketPath = arguments.socketPath;
     serverOptions.socketOwner = account.uid;
     serverOptions.socketGroup = account.socketGroup;
-    vanuaudiod::ControlServer control(
+    harmona::vanuaudiod::ControlServer control(
         servers, [&discovery] { discovery.RequestSearch(); }, serverOptions);
 
     if (!control.Open(error))

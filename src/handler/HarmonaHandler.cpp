@@ -10,7 +10,7 @@ HarmonaHandler::HarmonaHandler() : userPermission(0) {}
 HarmonaHandler::~HarmonaHandler() = default;
 
 int HarmonaHandler::Process() {
-    if (!webMan.IsAuthorized(nullptr, 3, static_cast<tag_cgi_position>(3)))
+    if (!webMan.IsAuthorized(nullptr, kApplicationAccessLevel, CGI_POSITION_APPLICATION))
         return 0;
     webMan.LoadIn();
     userPermission = AudioUsers::GetUserPermission(webMan.GetLoginUserName());

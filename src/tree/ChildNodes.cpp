@@ -1,8 +1,16 @@
 // Child node routing: the children of a node that the browser expands, by the family of its id.
 #include <cstring>
+#include <string_view>
 #include <utility>
 
 #include "src/handler/HarmonaHandler.h"
+
+namespace {
+
+// The id family of the music library's nodes ("musiclib_<object id>").
+constexpr std::string_view kMusicLibraryFamily = "musiclib";
+
+}  // namespace
 
 int HarmonaHandler::GetChildNodes(const char* nodeId) {
     Json::Value reply;
@@ -10,7 +18,7 @@ int HarmonaHandler::GetChildNodes(const char* nodeId) {
     const char* underscore = std::strchr(nodeId, '_');
     // No underscore, or nothing after it: a malformed id, answered with the empty reply.
     if (underscore != nullptr && underscore[1] != '\0') {
-        if (std::strncmp(nodeId, "musiclib", 8) == 0)
+        if (std::strncmp(nodeId, kMusicLibraryFamily.data(), kMusicLibraryFamily.size()) == 0)
             result = GetMusicLibraryNodes(reply, underscore + 1) != 0 ? 1 : 0;
         else
             result = 1;  // other families come inline with the root tree or through "refresh"

@@ -1,7 +1,8 @@
 // Root tree: the top-level categories, each with its children, in one reply.
-#include "src/tree/RootTree.h"
-
+#include <json/value.h>
 #include <sys/stat.h>
+
+#include <vector>
 
 #include "platform/paths/PlatformPaths.h"
 #include "platform/system/VanuSystem.h"
@@ -18,8 +19,25 @@ namespace {
 constexpr const char* kBlankIcon = "3rdparty/Harmona/images/s.gif";
 constexpr const char* kHiddenIconClass = "x-tree-hide-icon";
 
-}  // namespace
+// When a root category is shown: library categories when a music share exists and the local media
+// server runs, the iPod when its directory exists and the user may use it, the media servers when
+// the user may see them, radio always.
+enum class RootCondition { library, ipod, always, mediaServer };
 
+using ChildBuilder = int (*)(HarmonaHandler& handler, Json::Value& children);
+
+struct RootCategory {
+    const char* id;
+    const char* textSection;
+    const char* textKey;
+    RootCondition condition;
+    ChildBuilder build;
+    const char* errorSection;
+    const char* errorKey;
+    bool expanded;
+};
+
+// The six categories in reply order.
 const std::vector<RootCategory>& RootCategories() {
     static const std::vector<RootCategory> categories = {
         {"musiclib_root", "playlist", "music_library", RootCondition::library,
@@ -44,7 +62,7 @@ const std::vector<RootCategory>& RootCategories() {
     return categories;
 }
 
-int BuildRootTreeFrom(HarmonaHandler& handler, const std::vector<RootCategory>& categories) {
+int BuildRootTree(HarmonaHandler& handler) {
     Json::Value reply;
     const Json::Value texts = handler.LoadUITexts();  // first, whatever categories will be shown
 
@@ -54,7 +72,7 @@ int BuildRootTreeFrom(HarmonaHandler& handler, const std::vector<RootCategory>& 
     bool ipodChecked = false;
     bool ipodShown = false;
 
-    for (const RootCategory& category : categories) {
+    for (const RootCategory& category : RootCategories()) {
         bool shown = true;
         switch (category.condition) {
             case RootCondition::library:
@@ -98,10 +116,11 @@ int BuildRootTreeFrom(HarmonaHandler& handler, const std::vector<RootCategory>& 
     return 1;
 }
 
+}  // namespace
 }  // namespace harmona::tree
 
 int HarmonaHandler::BuildRootTree() {
-    return harmona::tree::BuildRootTreeFrom(*this, harmona::tree::RootCategories());
+    return harmona::tree::BuildRootTree(*this);
 }
 
 bool HarmonaHandler::HasIPodDirectory() {

@@ -118,7 +118,7 @@ std::string FindPersonalPlaylistFile(const std::string& folder, const std::strin
 }  // namespace
 
 int LibraryApi::Process() {
-    if (!webMan.IsAuthorized(nullptr, 3, CGI_POSITION_APPLICATION))
+    if (!webMan.IsAuthorized(nullptr, kApplicationAccessLevel, CGI_POSITION_APPLICATION))
         return 0;
     webMan.LoadIn();
     permission_ = AudioUsers::GetUserPermission(webMan.GetLoginUserName());

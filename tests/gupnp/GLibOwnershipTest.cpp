@@ -66,11 +66,11 @@ TEST(GLibOwnership, SignalHandlerIsDisconnectedWithItsConnection) {
     int calls = 0;
     {
         SignalConnection connection(object.get(), "notify", G_CALLBACK(CountNotify), &calls);
-        ASSERT_TRUE(connection.connected());
+        ASSERT_TRUE(connection);
         g_object_notify(object.get(), "nonexistent-is-ignored");
         SignalConnection moved = std::move(connection);
-        EXPECT_FALSE(connection.connected());
-        EXPECT_TRUE(moved.connected());
+        EXPECT_FALSE(connection);
+        EXPECT_TRUE(moved);
     }
     const guint remaining = g_signal_handlers_disconnect_matched(object.get(), G_SIGNAL_MATCH_DATA,
                                                                  0, 0, nullptr, nullptr, &calls);
@@ -85,7 +85,7 @@ TEST(GLibOwnership, ConnectionOutlivingItsInstanceIsHarmless) {
     g_object_unref(object);
     ASSERT_TRUE(watch.finalized);
     connection.Disconnect();
-    EXPECT_FALSE(connection.connected());
+    EXPECT_FALSE(connection);
 }
 
 TEST(GLibOwnership, TimeoutSourceRunsUntilItsCallbackSaysStop) {

@@ -150,26 +150,26 @@ TEST(DmaBrowseLibrary, EntitiesOfADtdAreNeverExpanded) {
 TEST(DmaBrowseLibrary, SoapReplyParsingFaultsAndMissingResult) {
     std::string ok = BrowseResponseBody(DidlLite({}), 0, 0);
     BrowsePage page;
-    EXPECT_EQ(ParseBrowseResponse(ok, page), ReplyStatus::Ok);
+    EXPECT_EQ(ParseBrowseResponse(ok, page), ReplyStatus::ok);
     EXPECT_TRUE(page.hasResult);
     std::string none = BrowseResponseBody("", 0, 0, false);
-    EXPECT_EQ(ParseBrowseResponse(none, page), ReplyStatus::Ok);
+    EXPECT_EQ(ParseBrowseResponse(none, page), ReplyStatus::ok);
     EXPECT_FALSE(page.hasResult);
     std::string empty = BrowseResponseBody("", 0, 0, true);
-    EXPECT_EQ(ParseBrowseResponse(empty, page), ReplyStatus::Ok);
+    EXPECT_EQ(ParseBrowseResponse(empty, page), ReplyStatus::ok);
     EXPECT_FALSE(page.hasResult);
     std::string fault = SoapFaultBody(701, "No such object");
-    EXPECT_EQ(ParseBrowseResponse(fault, page), ReplyStatus::Fault);
+    EXPECT_EQ(ParseBrowseResponse(fault, page), ReplyStatus::fault);
     std::string garbage =
         "<s:Envelope xmlns:s=\"http://schemas.xmlsoap.org/soap/envelope/\"><s:Body>";
-    EXPECT_EQ(ParseBrowseResponse(garbage, page), ReplyStatus::Malformed);
+    EXPECT_EQ(ParseBrowseResponse(garbage, page), ReplyStatus::malformed);
     std::string wrongEnvelope = "<Envelope><Body><BrowseResponse/></Body></Envelope>";
-    EXPECT_EQ(ParseBrowseResponse(wrongEnvelope, page), ReplyStatus::Malformed);
+    EXPECT_EQ(ParseBrowseResponse(wrongEnvelope, page), ReplyStatus::malformed);
     std::string otherAction =
         "<E:Envelope xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\"><E:Body>"
         "<m:SearchResponse "
         "xmlns:m=\"urn:schemas-upnp-org:service:ContentDirectory:1\"/></E:Body></E:Envelope>";
-    EXPECT_EQ(ParseBrowseResponse(otherAction, page), ReplyStatus::NotBrowseResponse);
+    EXPECT_EQ(ParseBrowseResponse(otherAction, page), ReplyStatus::notBrowseResponse);
     // Other prefixes, a CDATA Result, TotalMatches read.
     std::string cdata =
         "<E:Envelope xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\"><E:Body>"
@@ -179,7 +179,7 @@ TEST(DmaBrowseLibrary, SoapReplyParsingFaultsAndMissingResult) {
         "]]></Result><NumberReturned>1</NumberReturned><TotalMatches>9</TotalMatches></"
         "m:BrowseResponse>"
         "</E:Body></E:Envelope>";
-    ASSERT_EQ(ParseBrowseResponse(cdata, page), ReplyStatus::Ok);
+    ASSERT_EQ(ParseBrowseResponse(cdata, page), ReplyStatus::ok);
     EXPECT_TRUE(page.hasResult);
     EXPECT_EQ(page.totalMatches, 9u);
     std::vector<ItemNode*> items;

@@ -89,7 +89,7 @@ class LiveShare : public ::testing::Test {
         };
         live_ = std::make_unique<LiveLibrary>(options);
         std::string error;
-        ASSERT_TRUE(live_->Start(&error)) << error;
+        ASSERT_TRUE(live_->Start(error)) << error;
         ASSERT_TRUE(WaitUntil([&] { return live_->passes() >= 1; }));
         ASSERT_TRUE(Reports().front().ok) << Reports().front().error;
         EXPECT_EQ(Reports().front().added, 5u);

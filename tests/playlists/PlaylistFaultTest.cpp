@@ -1,6 +1,6 @@
-// Playlist categories and listing over scripted platform answers (ScriptedPlaylistPlatform.cpp):
-// a failing smart playlist listing, which the real one never reports, and a personal playlist
-// name that holds "/", which no file name can.
+// Playlist categories, listing and the refresh action over scripted platform answers
+// (ScriptedPlaylistPlatform.cpp): a failing smart playlist listing, which the real one never
+// reports, and a personal playlist name that holds "/", which no file name can.
 #include <gtest/gtest.h>
 
 #include "tests/harness/Fixtures.h"
@@ -61,6 +61,23 @@ TEST_F(PlaylistCategoryFaults, FailedOrdinaryListingSkipsTheSmartListing) {
     EXPECT_EQ(request.handler.AddSharedPlaylistCategory(shared), 0);
     EXPECT_EQ(shared["errinfo"]["line"].asInt(), 399);
     EXPECT_TRUE(Scripted().smartCategories.empty());
+}
+
+// The refresh action over a failing smart listing: the ordinary playlists it listed are dropped.
+TEST_F(PlaylistCategoryFaults,
+       RefreshWithPlainPlaylistsListedButSmartOnesFailingGivesAnErrorWithoutItems) {
+    Scripted().personal.records = {{1, "Road trip"}};
+    Scripted().smartResult = 0;
+    ::testing::internal::CaptureStdout();
+    request.handler.RefreshNode("personal");
+    const std::string output = ::testing::internal::GetCapturedStdout();
+    Json::Value reply;
+    ASSERT_TRUE(ParseJson(output.substr(output.find("\r\n\r\n") + 4), reply)) << output;
+    EXPECT_FALSE(reply.isMember("items"));
+    EXPECT_EQ(reply["success"], false);
+    EXPECT_EQ(reply["errinfo"]["key"], "error_system");
+    EXPECT_EQ(output.find("Road trip"), std::string::npos);  // nodes already listed are dropped
+    EXPECT_EQ(Scripted().smartCategories, std::vector<std::string>{"music_personal"});
 }
 
 using PlaylistListingFaults = PlaylistCategoryFaults;

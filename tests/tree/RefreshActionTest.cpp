@@ -3,7 +3,6 @@
 #include <gtest/gtest.h>
 
 #include "src/handler/HarmonaHandler.h"
-#include "src/tree/Refresh.h"
 #include "tests/harness/CgiRunner.h"
 #include "tests/harness/Fixtures.h"
 #include "tests/harness/IPodFixtures.h"
@@ -101,25 +100,6 @@ TEST(RefreshAction, FailingSharedListingPrintsTheErrorEnvelope) {
     EXPECT_EQ(r.exitStatus, 1);
     EXPECT_FALSE(r.json.isMember("items"));
     EXPECT_EQ(r.json["errinfo"]["key"], "error_system");
-}
-
-// The smart playlist listing cannot fail from outside (it always succeeds), so its failure is made
-// here.
-TEST(RefreshAction, PlainPlaylistsListButSmartOnesFailGivesAnErrorWithoutItems) {
-    TreeFixture fixture(TreeWorld{});
-    setenv("REMOTE_USER", "admin", 1);
-    HarmonaHandler handler;
-    harmona::tree::RefreshListers listers = harmona::tree::DefaultRefreshListers();
-    listers.smartPlaylists = [](HarmonaHandler&, Json::Value&, const char*) { return 0; };
-    ::testing::internal::CaptureStdout();
-    harmona::tree::RefreshNodeWith(handler, "personal", listers);
-    const std::string output = ::testing::internal::GetCapturedStdout();
-    Json::Value reply;
-    ASSERT_TRUE(ParseJson(output.substr(output.find("\r\n\r\n") + 4), reply)) << output;
-    EXPECT_FALSE(reply.isMember("items"));
-    EXPECT_EQ(reply["success"], false);
-    EXPECT_EQ(reply["errinfo"]["key"], "error_system");
-    EXPECT_EQ(output.find("Road trip"), std::string::npos);  // nodes already listed are dropped
 }
 
 TEST(RefreshAction, CapitalisedEmptyAndAbsentTargetsGiveAnEmptyReply) {

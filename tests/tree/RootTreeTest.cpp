@@ -4,7 +4,6 @@
 #include <sys/stat.h>
 
 #include "src/handler/HarmonaHandler.h"
-#include "src/tree/RootTree.h"
 #include "tests/harness/CgiRunner.h"
 #include "tests/harness/Fixtures.h"
 #include "tests/harness/IPodFixtures.h"
@@ -233,32 +232,6 @@ TEST(RootTree, SharedLibraryThatIsNotADatabaseEndsTheTree) {
     EXPECT_EQ(Ids(r.json["items"]), (Strings{"musiclib_root", "musiclib_music_personal"}));
 }
 
-// The radio builder cannot fail from outside (it always returns 1): its failure is made here, on
-// the root tree's own table, with a radio builder that fails.
-TEST(RootTree, RadioBuilderFailureAfterFourCategoriesKeepsThemAndReportsTheError) {
-    TreeFixture fixture(TreeWorld{});
-    setenv("REMOTE_USER", "admin", 1);
-    unsetenv("HTTP_ACCEPT_LANGUAGE");
-    std::vector<harmona::tree::RootCategory> table = harmona::tree::RootCategories();
-    ASSERT_EQ(table[4].id, std::string("inetradio_root"));
-    table[4].build = [](HarmonaHandler&, Json::Value&) { return 0; };
-    HarmonaHandler handler;
-    handler.userPermission = 1 | 8;
-    ::testing::internal::CaptureStdout();
-    const int result = harmona::tree::BuildRootTreeFrom(handler, table);
-    const std::string output = ::testing::internal::GetCapturedStdout();
-    EXPECT_EQ(result, 0);  // Process turns it into exit status 0
-    const std::size_t bodyStart = output.find("\r\n\r\n");
-    ASSERT_NE(bodyStart, std::string::npos) << output;
-    Json::Value reply;
-    ASSERT_TRUE(ParseJson(output.substr(bodyStart + 4), reply)) << output;
-    EXPECT_EQ(Ids(reply["items"]), (Strings{"musiclib_root", "musiclib_music_personal",
-                                            "musiclib_music_shared", "ipod_root"}));
-    EXPECT_EQ(reply["success"], false);
-    EXPECT_EQ(reply["errinfo"]["sec"], "common");
-    EXPECT_EQ(reply["errinfo"]["key"], "error_system");
-    EXPECT_EQ(output.find("mediaserver_root"), std::string::npos);
-}
 
 TEST(RootTree, TextsAreLoadedEvenWhenOnlyRadioIsShown) {
     TreeWorld world;

@@ -5,7 +5,7 @@
 
 #include "services/vanuaudiod/Announcement.h"
 
-using namespace vanuaudiod;
+using namespace harmona::vanuaudiod;
 
 namespace {
 
@@ -24,7 +24,7 @@ TEST(Vanuaudiod_Announcement, AliveNotifyGivesUdnLocationAndMaxAge) {
     const std::string usn = std::string("uuid:abc::") + kType;
     const Announcement a = ReadAnnouncement(
         kType, "ssdp:alive", usn.c_str(), "http://10.0.0.2:8200/d.xml", "no-cache, max-age = 130");
-    EXPECT_EQ(a.kind, AnnouncementKind::kAlive);
+    EXPECT_EQ(a.kind, AnnouncementKind::alive);
     EXPECT_EQ(a.udn, "uuid:abc");
     EXPECT_EQ(a.location, "http://10.0.0.2:8200/d.xml");
     EXPECT_EQ(a.maxAgeSeconds, 130);
@@ -34,20 +34,20 @@ TEST(Vanuaudiod_Announcement, SearchAnswersAndByebyesAndOtherTypes) {
     EXPECT_EQ(ReadAnnouncement("urn:schemas-upnp-org:device:MediaServer:4", nullptr, "uuid:x",
                                "http://10.0.0.2/", "max-age=60")
                   .kind,
-              AnnouncementKind::kAlive);
+              AnnouncementKind::alive);
     const Announcement bye = ReadAnnouncement(kType, "ssdp:byebye", "uuid:x::y", nullptr, nullptr);
-    EXPECT_EQ(bye.kind, AnnouncementKind::kByebye);
+    EXPECT_EQ(bye.kind, AnnouncementKind::byebye);
     EXPECT_EQ(bye.udn, "uuid:x");
     EXPECT_EQ(ReadAnnouncement("urn:schemas-upnp-org:device:MediaRenderer:1", "ssdp:alive",
                                "uuid:x", "http://10.0.0.2/", "max-age=60")
                   .kind,
-              AnnouncementKind::kOther);
+              AnnouncementKind::other);
     EXPECT_EQ(ReadAnnouncement(kType, "ssdp:alive", "no-uuid", "http://10.0.0.2/", nullptr).kind,
-              AnnouncementKind::kOther);
+              AnnouncementKind::other);
     EXPECT_EQ(ReadAnnouncement(kType, "ssdp:alive", "uuid:x", "http://10.0.0.2/a b", nullptr).kind,
-              AnnouncementKind::kOther);
+              AnnouncementKind::other);
     EXPECT_EQ(ReadAnnouncement(kType, "ssdp:alive", "uuid:x", nullptr, nullptr).kind,
-              AnnouncementKind::kOther);
+              AnnouncementKind::other);
 }
 
 TEST(Vanuaudiod_Announcement, ALocationOnTheSendersOwnAddressIsAccepted) {

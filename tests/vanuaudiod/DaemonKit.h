@@ -39,7 +39,8 @@ class Process {
     Process& operator=(const Process&) = delete;
 
     pid_t pid() const { return pid_; }
-    bool started() const { return pid_ > 0; }
+    // A child was started and is held by this object.
+    explicit operator bool() const { return pid_ > 0; }
     // Sends `signal` and waits up to `timeoutMs` for the exit; SIGKILL after that. Returns the
     // wait status (or -1).
     int Stop(int signal, int timeoutMs);
@@ -63,7 +64,8 @@ class PeerNetwork {
     ~PeerNetwork();
     PeerNetwork(const PeerNetwork&) = delete;
     PeerNetwork& operator=(const PeerNetwork&) = delete;
-    bool ok() const { return ok_; }
+    // The link is up on both sides.
+    explicit operator bool() const { return ok_; }
     // Runs a program on the peer host.
     Process SpawnOnPeer(const std::vector<std::string>& argv, const std::string& logPath);
 

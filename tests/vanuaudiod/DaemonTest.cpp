@@ -88,11 +88,11 @@ bool HasServer(const Json::Value& list, const std::string& name) {
 
 class Vanuaudiod : public ::testing::Test {
   protected:
-    void SetUp() override { ASSERT_TRUE(peer_.ok()); }
+    void SetUp() override { ASSERT_TRUE(peer_); }
     // The daemon of the test ends the way a service manager ends it: SIGTERM, then a clean exit
     // with nothing from the sanitizers (in the sanitizer build) in its output.
     void TearDown() override {
-        if (!daemon_.started())
+        if (!daemon_)
             return;
         const int status = daemon_.Stop(SIGTERM, 5000);
         EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << "status " << status;

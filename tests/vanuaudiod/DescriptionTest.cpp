@@ -15,7 +15,7 @@
 #include "services/vanuaudiod/Description.h"
 #include "services/vanuaudiod/Url.h"
 
-using namespace vanuaudiod;
+using namespace harmona::vanuaudiod;
 
 namespace {
 

@@ -9,7 +9,7 @@
 #include "services/vanuaudiod/Protocol.h"
 #include "tests/harness/CgiRunner.h"
 
-using namespace vanuaudiod;
+using namespace harmona::vanuaudiod;
 
 namespace {
 

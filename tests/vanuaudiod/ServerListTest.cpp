@@ -3,7 +3,7 @@
 
 #include "services/vanuaudiod/ServerList.h"
 
-using namespace vanuaudiod;
+using namespace harmona::vanuaudiod;
 
 namespace {
 
@@ -16,7 +16,7 @@ constexpr const char* kAnnouncer = "10.0.0.1";
 // An announcement from kAnnouncer; true when it asks for a fetch.
 bool Seen(ServerList& list, const std::string& udn, const std::string& location, int maxAge,
           Clock::time_point now) {
-    return list.Seen(udn, location, kAnnouncer, maxAge, now) == SeenOutcome::kFetch;
+    return list.Seen(udn, location, kAnnouncer, maxAge, now) == SeenOutcome::fetch;
 }
 
 void Add(ServerList& list, const std::string& udn, const std::string& name, int maxAge,
@@ -121,10 +121,10 @@ TEST(Vanuaudiod_ServerList, OneAddressHoldsAtMostSixteenDevices) {
     for (std::size_t i = 0; i < kMaxDevicesPerAnnouncer; ++i) {
         const std::string udn = "uuid:flood-" + std::to_string(i);
         EXPECT_EQ(list.Seen(udn, "http://10.0.0.9/" + udn, "10.0.0.9", 86400, now),
-                  SeenOutcome::kFetch);
+                  SeenOutcome::fetch);
     }
     EXPECT_EQ(list.Seen("uuid:one-more", "http://10.0.0.9/x", "10.0.0.9", 86400, now),
-              SeenOutcome::kAnnouncerFull);
+              SeenOutcome::announcerFull);
     // Another host is not held back by it.
     EXPECT_TRUE(Seen(list, "uuid:real", "http://10.0.0.1/real", 100, now));
     EXPECT_EQ(list.KnownCount(), kMaxDevicesPerAnnouncer + 1);
@@ -151,7 +151,7 @@ TEST(Vanuaudiod_ServerList, AFullTableMakesRoomForANewcomerByDroppingAnUndescrib
     for (std::size_t i = 0; i < kMaxKnownDevices; ++i) {
         const std::string host = "10.1." + std::to_string(i / 16) + ".1";
         const std::string udn = "uuid:fake-" + std::to_string(i);
-        ASSERT_EQ(list.Seen(udn, "http://" + host + "/d", host, 86400, now), SeenOutcome::kFetch);
+        ASSERT_EQ(list.Seen(udn, "http://" + host + "/d", host, 86400, now), SeenOutcome::fetch);
         list.Described(udn, "http://" + host + "/d", false, {}, now);
     }
     EXPECT_EQ(list.KnownCount(), kMaxKnownDevices);

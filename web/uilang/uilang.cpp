@@ -14,7 +14,7 @@ const char kReplyType[] = "application/json; charset=\"UTF-8\"";
 class UILanguageHandler : public ActionHandler {
   public:
     int Process() override {
-        if (!webMan.IsAuthorized(nullptr, 3, CGI_POSITION_APPLICATION))
+        if (!webMan.IsAuthorized(nullptr, kApplicationAccessLevel, CGI_POSITION_APPLICATION))
             return 0;
         Json::Value reply(Json::objectValue);
         reply["language"] = webMan.GetUILanguage();

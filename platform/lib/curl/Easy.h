@@ -20,7 +20,7 @@ class GlobalInit {
     GlobalInit(const GlobalInit&) = delete;
     GlobalInit& operator=(const GlobalInit&) = delete;
 
-    bool Ok() const { return code_ == CURLE_OK; }
+    explicit operator bool() const { return code_ == CURLE_OK; }
 
   private:
     CURLcode code_;

@@ -30,7 +30,7 @@ class SignalConnection {
     SignalConnection(const SignalConnection&) = delete;
     SignalConnection& operator=(const SignalConnection&) = delete;
 
-    bool connected() const { return id_ != 0; }
+    explicit operator bool() const { return id_ != 0; }
 
     void Disconnect() {
         if (id_ == 0)
