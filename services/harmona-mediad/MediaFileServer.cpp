@@ -7,6 +7,7 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "services/harmona-mediad/ObjectIds.h"
 #include "services/harmona-mediad/ShareFile.h"
 #include "services/medialib/MediaFiles.h"
 
@@ -58,19 +59,9 @@ void FreeTransfer(gpointer data, GClosure*) {
     delete transfer;
 }
 
-// 1 to 18 decimal digits and nothing else (no sign, no space): a byte offset or an id that
-// cannot overflow.
-bool ParseDigits(const std::string& text, int64_t* value) {
-    if (text.empty() || text.size() > 18 ||
-        text.find_first_not_of("0123456789") != std::string::npos)
-        return false;
-    *value = std::strtoll(text.c_str(), nullptr, 10);
-    return true;
-}
-
 bool ParseOffset(const std::string& text, off_t* value) {
     int64_t digits = 0;
-    if (!ParseDigits(text, &digits))
+    if (!ParseDecimalDigits(text, &digits))
         return false;
     *value = static_cast<off_t>(digits);
     return true;
@@ -98,7 +89,7 @@ bool ParseIdName(std::string name, int64_t* id, std::string* extension) {
         *extension = name.substr(dot + 1);
         name.erase(dot);
     }
-    return ParseDigits(name, id);
+    return ParseDecimalDigits(name, id);
 }
 
 }  // namespace

@@ -3,6 +3,8 @@
 #include <cctype>
 #include <cstdlib>
 
+#include "common/util/HexDigit.h"
+
 namespace harmona::mediad {
 namespace {
 
@@ -15,16 +17,6 @@ bool StartsWith(const std::string& text, const char* prefix, std::string* rest) 
         return false;
     *rest = text.substr(p.size());
     return true;
-}
-
-int HexValue(char c) {
-    if (c >= '0' && c <= '9')
-        return c - '0';
-    if (c >= 'A' && c <= 'F')
-        return c - 'A' + 10;
-    if (c >= 'a' && c <= 'f')
-        return c - 'a' + 10;
-    return -1;
 }
 
 // A relative folder path: non-empty parts, none "." or "..".
@@ -75,11 +67,10 @@ bool UnescapeIdPart(const std::string& text, std::string* out) {
         }
         if (i + 2 >= text.size())
             return false;
-        const int high = HexValue(text[i + 1]);
-        const int low = HexValue(text[i + 2]);
-        if (high < 0 || low < 0)
+        const int byte = util::HexByteValue(text[i + 1], text[i + 2]);
+        if (byte < 0)
             return false;
-        out->push_back(static_cast<char>(high * 16 + low));
+        out->push_back(static_cast<char>(byte));
         i += 2;
     }
     return true;
@@ -132,14 +123,6 @@ std::string TrackIdIn(const std::string& containerId, int64_t trackId) {
 
 namespace {
 
-bool ParseTrackNumber(const std::string& digits, int64_t* id) {
-    if (digits.empty() || digits.size() > 18 ||
-        digits.find_first_not_of("0123456789") != std::string::npos)
-        return false;
-    *id = std::strtoll(digits.c_str(), nullptr, 10);
-    return true;
-}
-
 // "AA/NAME" of an album id: both parts unescaped, the name not empty.
 bool ParseAlbumParts(const std::string& rest, ObjectRef* ref) {
     const std::size_t slash = rest.find('/');
@@ -152,7 +135,7 @@ ObjectRef ParseContainerOrTrackId(const std::string& id);
 // "<container id>/track:N", the container being one that lists tracks.
 bool ParseTrackIn(const std::string& id, ObjectRef* ref) {
     const std::size_t at = id.rfind("/track:");
-    if (at == std::string::npos || !ParseTrackNumber(id.substr(at + 7), &ref->trackId))
+    if (at == std::string::npos || !ParseDecimalDigits(id.substr(at + 7), &ref->trackId))
         return false;
     ref->container = id.substr(0, at);
     const ObjectRef listing = ParseContainerOrTrackId(ref->container);
@@ -169,6 +152,14 @@ bool ParseTrackIn(const std::string& id, ObjectRef* ref) {
 }
 
 }  // namespace
+
+bool ParseDecimalDigits(const std::string& text, int64_t* value) {
+    if (text.empty() || text.size() > 18 ||
+        text.find_first_not_of("0123456789") != std::string::npos)
+        return false;
+    *value = std::strtoll(text.c_str(), nullptr, 10);
+    return true;
+}
 
 ObjectRef ParseObjectId(const std::string& id) {
     ObjectRef ref;
@@ -218,7 +209,7 @@ ObjectRef ParseContainerOrTrackId(const std::string& id) {
         if (UnescapeIdPart(rest, &ref.name) && !ref.name.empty())
             ref.kind = ObjectKind::Genre;
     } else if (StartsWith(id, "track:", &rest)) {
-        if (ParseTrackNumber(rest, &ref.trackId))
+        if (ParseDecimalDigits(rest, &ref.trackId))
             ref.kind = ObjectKind::Track;
     }
     return ref;

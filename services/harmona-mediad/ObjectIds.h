@@ -61,4 +61,8 @@ std::string TrackIdIn(const std::string& containerId, int64_t trackId);
 // Parses any id the server hands out; kind Invalid for anything else.
 ObjectRef ParseObjectId(const std::string& id);
 
+// 1 to 18 decimal digits and nothing else (no sign, no space): a track id, in an object id or a
+// media URL, or a byte offset, that cannot overflow. False, `value` untouched, for anything else.
+bool ParseDecimalDigits(const std::string& text, int64_t* value);
+
 }  // namespace harmona::mediad
