@@ -7,6 +7,7 @@
 // the CGI entry does it, with the request's environment set as a web server would set it.
 #pragma once
 
+#include <gtest/gtest.h>
 #include <json/json.h>
 #include <stdlib.h>
 #include <syslog.h>
@@ -60,6 +61,18 @@ inline std::vector<std::string> Texts(const Json::Value& nodes) {
     for (const Json::Value& node : nodes)
         texts.push_back(node["text"].asString());
     return texts;
+}
+
+// Checks the error envelope that SetError writes into a builder's children array: the system error
+// of the common section with the line `line`, and the nodes the builder had added, in `itemIds`.
+inline void ExpectSystemError(const Json::Value& children, int line,
+                              const std::vector<std::string>& itemIds) {
+    ASSERT_TRUE(children.isObject());
+    EXPECT_FALSE(children["success"].asBool());
+    EXPECT_EQ(children["errinfo"]["sec"].asString(), "common");
+    EXPECT_EQ(children["errinfo"]["key"].asString(), "error_system");
+    EXPECT_EQ(children["errinfo"]["line"].asInt(), line);
+    EXPECT_EQ(Ids(children["items"]), itemIds);
 }
 
 }  // namespace harmona::test

@@ -21,15 +21,6 @@ class PlaylistCategoryFaults : public ::testing::Test {
     Json::Value children{Json::arrayValue};
 };
 
-void ExpectSystemError(const Json::Value& reply, int line, const std::vector<std::string>& ids) {
-    ASSERT_TRUE(reply.isObject());
-    EXPECT_FALSE(reply["success"].asBool());
-    EXPECT_EQ(reply["errinfo"]["sec"].asString(), "common");
-    EXPECT_EQ(reply["errinfo"]["key"].asString(), "error_system");
-    EXPECT_EQ(reply["errinfo"]["line"].asInt(), line);
-    EXPECT_EQ(Ids(reply["items"]), ids);
-}
-
 TEST_F(PlaylistCategoryFaults,
        FailedPersonalSmartListingGivesErrorLine369AfterTheOrdinaryPlaylists) {
     Scripted().personal.records = {{1, "mine"}};
