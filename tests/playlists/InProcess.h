@@ -63,6 +63,20 @@ inline std::vector<std::string> Texts(const Json::Value& nodes) {
     return texts;
 }
 
+// Checks a playlist node: its id, parent id, text and icon, and a leaf that is neither dragged,
+// dropped on nor expanded.
+inline void ExpectPlaylistNode(const Json::Value& node, const std::string& id,
+                               const std::string& parentId, const std::string& text,
+                               const std::string& icon) {
+    EXPECT_EQ(node["id"].asString(), id);
+    EXPECT_EQ(node["pid"].asString(), parentId);
+    EXPECT_EQ(node["text"].asString(), text);
+    EXPECT_EQ(node["icon"].asString(), icon);
+    EXPECT_TRUE(node["leaf"].asBool());
+    for (const char* flag : {"allowDrag", "allowDrop", "draggable", "expanded"})
+        EXPECT_FALSE(node[flag].asBool()) << flag;
+}
+
 // Checks the error envelope that SetError writes into a builder's children array: the system error
 // of the common section with the line `line`, and the nodes the builder had added, in `itemIds`.
 inline void ExpectSystemError(const Json::Value& children, int line,

@@ -62,14 +62,8 @@ TEST_F(SmartPlaylists, PersonalNodesCarryIdParentIconAndLeafFlagOnly) {
     WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"Best of <80s>"});
     ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
     ASSERT_EQ(children.size(), 1u);
-    const Json::Value& node = children[0];
-    EXPECT_EQ(node["id"].asString(), "musiclib_music_personal/smart/Best of <80s>");
-    EXPECT_EQ(node["pid"].asString(), "musiclib_music_personal");
-    EXPECT_EQ(node["text"].asString(), "Best of &lt;80s&gt;");
-    EXPECT_EQ(node["icon"].asString(), kSmartIcon);
-    EXPECT_TRUE(node["leaf"].asBool());
-    for (const char* flag : {"allowDrag", "allowDrop", "draggable", "expanded"})
-        EXPECT_FALSE(node[flag].asBool()) << flag;
+    ExpectPlaylistNode(children[0], "musiclib_music_personal/smart/Best of <80s>",
+                       "musiclib_music_personal", "Best of &lt;80s&gt;", kSmartIcon);
 }
 
 TEST_F(SmartPlaylists, SharedCategoryReadsTheSharedFileAndAddressesByName) {
