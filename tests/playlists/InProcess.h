@@ -17,6 +17,7 @@
 
 #include "src/handler/HarmonaHandler.h"
 #include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
 #include "tests/harness/Sandbox.h"
 
 namespace harmona::test {
@@ -38,6 +39,15 @@ struct InProcessHandler {
         handler.userPermission = permission;
     }
     HarmonaHandler handler;
+};
+
+// The fixture of the tests of one builder: the standard fixture files, a request by "admin" with
+// every permission a playlist builder looks at, and the array the builder fills.
+class PlaylistBuilderTest : public ::testing::Test {
+  protected:
+    void SetUp() override { StandardFixture(); }
+    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
+    Json::Value children{Json::arrayValue};
 };
 
 // The messages that the test process sent to the system log since the last call.

@@ -11,14 +11,12 @@ using namespace harmona::test;
 
 namespace {
 
-class PlaylistCategoryFaults : public ::testing::Test {
+class PlaylistCategoryFaults : public PlaylistBuilderTest {
   protected:
     void SetUp() override {
-        StandardFixture();
+        PlaylistBuilderTest::SetUp();
         Scripted() = ScriptedPlatform();
     }
-    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
-    Json::Value children{Json::arrayValue};
 };
 
 TEST_F(PlaylistCategoryFaults,

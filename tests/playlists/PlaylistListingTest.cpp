@@ -14,12 +14,7 @@ namespace {
 constexpr const char* kFailureLog = "audio:642 Failed to enum user's playlist!";
 constexpr const char* kPlaylistIcon = "3rdparty/Harmona/images/files_class/icon_playlist.png";
 
-class PlaylistListing : public ::testing::Test {
-  protected:
-    void SetUp() override { StandardFixture(); }
-    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
-    Json::Value children{Json::arrayValue};
-};
+class PlaylistListing : public PlaylistBuilderTest {};
 
 TEST_F(PlaylistListing, CategoryDifferingOnlyInLetterCaseIsUnknownLogsAndFails) {
     WritePersonalPlaylistFile("admin", "mine.m3u");

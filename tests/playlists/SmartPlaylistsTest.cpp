@@ -13,12 +13,8 @@ namespace {
 
 constexpr const char* kSmartIcon = "3rdparty/Harmona/images/files_class/icon_smartpls.png";
 
-class SmartPlaylists : public ::testing::Test {
+class SmartPlaylists : public PlaylistBuilderTest {
   protected:
-    void SetUp() override { StandardFixture(); }
-    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
-    Json::Value children{Json::arrayValue};
-
     std::vector<std::string> PersonalTexts(const std::vector<std::string>& enumerated) {
         WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), enumerated);
         Json::Value nodes(Json::arrayValue);
