@@ -288,6 +288,12 @@ CgiResult Post(const std::string& body, const std::string& queryString, const st
     return RunCgi(request);
 }
 
+void ExpectNoReply(const CgiResult& r) {
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.output, "");
+}
+
 CgiRequest FormPostWithLength(const std::string& body, const std::string& contentLength) {
     CgiRequest request = PostRequest(body, "application/x-www-form-urlencoded");
     request.hasContentLength = true;
