@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <chrono>
+#include <cstdio>
 #include <cstdlib>
 #include <fstream>
 
@@ -125,6 +126,30 @@ long PeakMemoryKb(const std::string& program, const std::vector<std::string>& en
         ptrace(PTRACE_CONT, pid, nullptr, reinterpret_cast<void*>(static_cast<long>(signal)));
     }
     return peakKb;
+}
+
+void RequireReplyHolds(const char* benchmark, const std::string& label, const std::string& output,
+                       const std::string& expected) {
+    if (output.find(expected) != std::string::npos)
+        return;
+    std::fprintf(stderr, "%s: %s: unexpected reply:\n%.2000s\n", benchmark, label.c_str(),
+                 output.c_str());
+    std::exit(2);
+}
+
+std::vector<std::vector<double>> TimeInRotatedRounds(
+    std::size_t count, int warmUps, int rounds, const std::function<double(std::size_t)>& runOnce) {
+    for (int warm = 0; warm < warmUps; ++warm)
+        for (std::size_t k = 0; k < count; ++k)
+            runOnce(k);
+    std::vector<std::vector<double>> times(count);
+    for (int round = 0; round < rounds; ++round) {
+        for (std::size_t step = 0; step < count; ++step) {
+            const std::size_t k = (step + static_cast<std::size_t>(round)) % count;
+            times[k].push_back(runOnce(k));
+        }
+    }
+    return times;
 }
 
 double Median(std::vector<double> samples) {

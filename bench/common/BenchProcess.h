@@ -3,6 +3,8 @@
 // also count the benchmark process, whose pages a spawned child shares until its exec).
 #pragma once
 
+#include <cstddef>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -28,6 +30,19 @@ int RunWrapped(std::vector<std::string> command, const std::string& program,
 
 // A GET request's CGI environment.
 std::vector<std::string> CgiEnvironment(const std::string& queryString, const std::string& user);
+
+// Exits with status 2, printing the reply, when `output` of the request named `label` does not hold
+// `expected`: a request that does not answer as it should is not worth timing. `benchmark` names
+// the program in the message.
+void RequireReplyHolds(const char* benchmark, const std::string& label, const std::string& output,
+                       const std::string& expected);
+
+// Times `count` programs in interleaved rounds, so that drift of the machine hits all alike:
+// `warmUps` rounds whose times are dropped, then `rounds` rounds whose order is rotated each time,
+// so that no program always runs right after another. `runOnce(k)` runs program k and gives its
+// wall time in ms; the result holds the `rounds` times of each program.
+std::vector<std::vector<double>> TimeInRotatedRounds(
+    std::size_t count, int warmUps, int rounds, const std::function<double(std::size_t)>& runOnce);
 
 double Median(std::vector<double> samples);
 // p from 0 to 1.

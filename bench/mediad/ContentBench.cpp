@@ -20,12 +20,13 @@
 #include "platform/lib/sqlite/Database.h"
 #include "platform/medialib/LibrarySchema.h"
 #include "services/harmona-mediad/ContentDirectory.h"
+#include "tests/mediad/DirectBrowse.h"
 
 namespace {
 
-using harmona::mediad::BrowseArgs;
 using harmona::mediad::BrowseResult;
 using harmona::mediad::ContentDirectory;
+using harmona::test::mediad::Browse;
 using Clock = std::chrono::steady_clock;
 
 constexpr const char* kShare = "/volume1/music";
@@ -107,17 +108,6 @@ double RawQuery(const std::string& dbPath, int limit, int runs) {
         if (bytes == 0)
             std::fprintf(stderr, "content bench: the raw query read nothing\n");
     });
-}
-
-BrowseResult Browse(const ContentDirectory& directory, const std::string& id, bool metadata,
-                    uint32_t start = 0, uint32_t count = 0, const std::string& sort = "") {
-    BrowseArgs args;
-    args.objectId = id;
-    args.metadata = metadata;
-    args.startingIndex = start;
-    args.requestedCount = count;
-    args.sortCriteria = sort;
-    return directory.Browse(args);
 }
 
 long ResidentKiB() {

@@ -116,7 +116,7 @@ struct Program {
     std::string user;
     std::string expect;  // a text the reply must hold
     std::vector<double> ms;
-    std::vector<long> maxRssKb;  // peak resident memory (VmHWM) of one traced run
+    std::vector<double> maxRssKb;  // peak resident memory (VmHWM, KiB) of one traced run
 };
 
 std::vector<std::string> Environment(const Program& program) {
@@ -130,41 +130,23 @@ double RunOnce(const Program& program, std::string& output) {
     return run.wallMs;
 }
 
-template <typename T>
-double Median(std::vector<T> v) {
-    std::sort(v.begin(), v.end());
-    const std::size_t n = v.size();
-    return n % 2 ? double(v[n / 2]) : (double(v[n / 2 - 1]) + double(v[n / 2])) / 2;
-}
-
-double Percentile(std::vector<double> v, double p) {
-    std::sort(v.begin(), v.end());
-    return v[std::min(v.size() - 1, static_cast<std::size_t>(p * static_cast<double>(v.size())))];
-}
+using harmona::bench::Median;
+using harmona::bench::Percentile;
 
 // Runs `programs` in `runs` interleaved rounds (after a warm-up) and prints the figures.
 void Measure(const std::string& title, std::vector<Program>& programs, int runs) {
     std::string output;
     for (Program& program : programs) {
         RunOnce(program, output);
-        if (output.find(program.expect) == std::string::npos) {
-            std::fprintf(stderr, "bench_playlists: %s: unexpected reply:\n%.2000s\n",
-                         program.label.c_str(), output.c_str());
-            std::exit(2);
-        }
+        harmona::bench::RequireReplyHolds("bench_playlists", program.label, output, program.expect);
     }
     for (Program& program : programs)
         program.maxRssKb.push_back(
             harmona::bench::PeakMemoryKb(program.path, Environment(program)));
-    for (int warm = 0; warm < 5; ++warm)
-        for (Program& program : programs)
-            RunOnce(program, output);
-    for (int round = 0; round < runs; ++round) {
-        for (std::size_t k = 0; k < programs.size(); ++k) {
-            Program& program = programs[(k + static_cast<std::size_t>(round)) % programs.size()];
-            program.ms.push_back(RunOnce(program, output));
-        }
-    }
+    const std::vector<std::vector<double>> times = harmona::bench::TimeInRotatedRounds(
+        programs.size(), 5, runs, [&](std::size_t k) { return RunOnce(programs[k], output); });
+    for (std::size_t k = 0; k < programs.size(); ++k)
+        programs[k].ms = times[k];
     const double trivialMedian = Median(programs[0].ms);
     std::printf("\n%s (%d runs each)\n", title.c_str(), runs);
     std::printf("  %-46s %9s %9s %9s %9s %10s\n", "program", "median", "p90", "min", "x trivial",

@@ -83,22 +83,12 @@ void Measure(const char* title, std::vector<Program>& programs, int runs) {
     std::string output;
     for (Program& program : programs) {
         RunOnce(program, output);
-        if (output.find(program.expect) == std::string::npos) {
-            std::fprintf(stderr, "bench_startup: %s: unexpected reply:\n%s\n",
-                         program.label.c_str(), output.c_str());
-            std::exit(2);
-        }
+        harmona::bench::RequireReplyHolds("bench_startup", program.label, output, program.expect);
     }
-    for (int warm = 0; warm < 20; ++warm)
-        for (Program& program : programs)
-            RunOnce(program, output);
-    for (int round = 0; round < runs; ++round) {
-        // Rotate the order so that no program always runs right after another.
-        for (std::size_t k = 0; k < programs.size(); ++k) {
-            Program& program = programs[(k + static_cast<std::size_t>(round)) % programs.size()];
-            program.ms.push_back(RunOnce(program, output));
-        }
-    }
+    const std::vector<std::vector<double>> times = harmona::bench::TimeInRotatedRounds(
+        programs.size(), 20, runs, [&](std::size_t k) { return RunOnce(programs[k], output); });
+    for (std::size_t k = 0; k < programs.size(); ++k)
+        programs[k].ms = times[k];
     const double trivialMedian = Median(programs[0].ms);
     const double trivialMean = Mean(programs[0].ms);
     std::printf("\n%s (%d runs each)\n", title, runs);

@@ -13,28 +13,27 @@
 #include <thread>
 #include <vector>
 
+#include "bench/common/BenchProcess.h"
 #include "tests/harness/CgiRunner.h"
 #include "tests/harness/Sandbox.h"
 #include "tests/vanuaudiod/DaemonKit.h"
 
 using namespace harmona::test;
+using harmona::bench::Percentile;
 using SteadyClock = std::chrono::steady_clock;
 
 namespace {
-
-double Percentile(std::vector<double> samples, double p) {
-    if (samples.empty())
-        return 0;
-    std::sort(samples.begin(), samples.end());
-    const std::size_t index =
-        std::min(samples.size() - 1, static_cast<std::size_t>(p * samples.size()));
-    return samples[index];
-}
 
 struct Phase {
     std::vector<double> ms;
     int missed = 0;  // not answered within the 0.5 s budget
     double seconds = 0;
+
+    void Record(const Exchange& exchange) {
+        if (!exchange.answered)
+            ++missed;
+        ms.push_back(exchange.ms);
+    }
 };
 
 // One client, sequential, for `seconds`.
@@ -44,10 +43,7 @@ Phase Sequential(double seconds) {
     const auto end = start + std::chrono::duration<double>(seconds);
     int page = 0;
     while (SteadyClock::now() < end) {
-        const Exchange exchange = Call(16, std::to_string((page++ % 10) * 10) + " 10");
-        if (!exchange.answered)
-            ++phase.missed;
-        phase.ms.push_back(exchange.ms);
+        phase.Record(Call(16, std::to_string((page++ % 10) * 10) + " 10"));
     }
     phase.seconds = std::chrono::duration<double>(SteadyClock::now() - start).count();
     return phase;
@@ -68,12 +64,8 @@ Phase Bursts(int clients, int bursts) {
             }));
         }
         go.set_value();
-        for (auto& result : results) {
-            const Exchange exchange = result.get();
-            if (!exchange.answered)
-                ++phase.missed;
-            phase.ms.push_back(exchange.ms);
-        }
+        for (auto& result : results)
+            phase.Record(result.get());
     }
     phase.seconds = std::chrono::duration<double>(SteadyClock::now() - start).count();
     return phase;
@@ -90,10 +82,7 @@ Phase Sustained(int clients, double seconds) {
             Phase own;
             int page = i;
             while (SteadyClock::now() < end) {
-                const Exchange exchange = Call(16, std::to_string((page++ % 10) * 10) + " 10");
-                if (!exchange.answered)
-                    ++own.missed;
-                own.ms.push_back(exchange.ms);
+                own.Record(Call(16, std::to_string((page++ % 10) * 10) + " 10"));
             }
             return own;
         }));

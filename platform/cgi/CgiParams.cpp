@@ -7,20 +7,9 @@
 #include <cerrno>
 #include <chrono>
 
+#include "common/util/HexDigit.h"
+
 namespace harmona::cgi {
-namespace {
-
-int HexValue(char c) {
-    if (c >= '0' && c <= '9')
-        return c - '0';
-    if (c >= 'a' && c <= 'f')
-        return c - 'a' + 10;
-    if (c >= 'A' && c <= 'F')
-        return c - 'A' + 10;
-    return -1;
-}
-
-}  // namespace
 
 std::string DecodeComponent(std::string_view text) {
     std::string out;
@@ -30,10 +19,9 @@ std::string DecodeComponent(std::string_view text) {
         if (c == '+') {
             c = ' ';
         } else if (c == '%' && i + 2 < text.size()) {
-            const int hi = HexValue(text[i + 1]);
-            const int lo = HexValue(text[i + 2]);
-            if (hi >= 0 && lo >= 0) {
-                c = static_cast<char>(hi * 16 + lo);
+            const int byte = util::HexByteValue(text[i + 1], text[i + 2]);
+            if (byte >= 0) {
+                c = static_cast<char>(byte);
                 i += 2;
             }
         }

@@ -11,6 +11,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <ctime>
+#include <functional>
 #include <iterator>
 #include <unordered_map>
 #include <vector>
@@ -188,21 +189,15 @@ bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFi
     return CommitWithUpdate(db);
 }
 
-// Rows whose file is unchanged but whose size was not recorded yet or whose folder's cover image
-// changed: updated without reading a tag.
-bool RefreshRows(Database& db, const std::vector<const FoundFile*>& files) {
-    Statement refresh = db.Prepare("UPDATE track SET size = ?1, art_path = ?2 WHERE path = ?3");
-    if (!refresh)
-        return false;
-    for (std::size_t start = 0; start < files.size(); start += kIndexBatchSize) {
+// Runs `writeRow(i)` for the rows 0 to `count` - 1 in write transactions of kIndexBatchSize rows,
+// each committed with the update count. A failing row rolls its transaction back and ends the run.
+bool WriteRowsInBatches(Database& db, std::size_t count,
+                        const std::function<bool(std::size_t)>& writeRow) {
+    for (std::size_t start = 0; start < count; start += kIndexBatchSize) {
         if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
             return false;
-        for (std::size_t i = start; i < files.size() && i < start + kIndexBatchSize; ++i) {
-            refresh.Reset();
-            refresh.Bind(1, files[i]->size);
-            BindOptionalText(refresh, 2, files[i]->artPath);
-            refresh.Bind(3, files[i]->path);
-            if (refresh.Step() != SQLITE_DONE) {
+        for (std::size_t i = start; i < count && i < start + kIndexBatchSize; ++i) {
+            if (!writeRow(i)) {
                 db.Execute("ROLLBACK");
                 return false;
             }
@@ -213,25 +208,30 @@ bool RefreshRows(Database& db, const std::vector<const FoundFile*>& files) {
     return true;
 }
 
+// Rows whose file is unchanged but whose size was not recorded yet or whose folder's cover image
+// changed: updated without reading a tag.
+bool RefreshRows(Database& db, const std::vector<const FoundFile*>& files) {
+    Statement refresh = db.Prepare("UPDATE track SET size = ?1, art_path = ?2 WHERE path = ?3");
+    if (!refresh)
+        return false;
+    return WriteRowsInBatches(db, files.size(), [&](std::size_t i) {
+        refresh.Reset();
+        refresh.Bind(1, files[i]->size);
+        BindOptionalText(refresh, 2, files[i]->artPath);
+        refresh.Bind(3, files[i]->path);
+        return refresh.Step() == SQLITE_DONE;
+    });
+}
+
 bool RemoveRows(Database& db, const std::vector<std::string>& gone) {
     Statement remove = db.Prepare("DELETE FROM track WHERE path = ?1");
     if (!remove)
         return false;
-    for (std::size_t start = 0; start < gone.size(); start += kIndexBatchSize) {
-        if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
-            return false;
-        for (std::size_t i = start; i < gone.size() && i < start + kIndexBatchSize; ++i) {
-            remove.Reset();
-            remove.Bind(1, gone[i]);
-            if (remove.Step() != SQLITE_DONE) {
-                db.Execute("ROLLBACK");
-                return false;
-            }
-        }
-        if (!CommitWithUpdate(db))
-            return false;
-    }
-    return true;
+    return WriteRowsInBatches(db, gone.size(), [&](std::size_t i) {
+        remove.Reset();
+        remove.Bind(1, gone[i]);
+        return remove.Step() == SQLITE_DONE;
+    });
 }
 
 IndexReport Fail(IndexReport report, const std::string& why) {

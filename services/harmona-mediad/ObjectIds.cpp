@@ -3,6 +3,7 @@
 #include <cctype>
 #include <cstdlib>
 
+#include "common/util/HexDigit.h"
 #include "common/util/Number.h"
 
 namespace harmona::mediad {
@@ -17,16 +18,6 @@ bool StartsWith(const std::string& text, const char* prefix, std::string* rest) 
         return false;
     *rest = text.substr(p.size());
     return true;
-}
-
-int HexValue(char c) {
-    if (c >= '0' && c <= '9')
-        return c - '0';
-    if (c >= 'A' && c <= 'F')
-        return c - 'A' + 10;
-    if (c >= 'a' && c <= 'f')
-        return c - 'a' + 10;
-    return -1;
 }
 
 // A relative folder path: non-empty parts, none "." or "..".
@@ -77,11 +68,10 @@ bool UnescapeIdPart(const std::string& text, std::string* out) {
         }
         if (i + 2 >= text.size())
             return false;
-        const int high = HexValue(text[i + 1]);
-        const int low = HexValue(text[i + 2]);
-        if (high < 0 || low < 0)
+        const int byte = util::HexByteValue(text[i + 1], text[i + 2]);
+        if (byte < 0)
             return false;
-        out->push_back(static_cast<char>(high * 16 + low));
+        out->push_back(static_cast<char>(byte));
         i += 2;
     }
     return true;

@@ -9,6 +9,7 @@
 
 #include <cstring>
 #include <string>
+#include <vector>
 
 #include "platform/system/VanuSystem.h"
 #include "tests/harness/Fixtures.h"
@@ -70,18 +71,16 @@ TEST(SystemConfiguration, ConfGetLastOfTwoEqualKeysCounts) {
 }
 
 TEST(SystemConfiguration, TrimSpaceRemovesWhiteSpaceAroundInPlace) {
-    char text[] = " \t 1.0 2.0 \r\n";
-    EXPECT_GE(CORXStrTrimSpace(text, 0), 0);
-    EXPECT_STREQ(text, "1.0 2.0");
-    char blank[] = " \n\t ";
-    EXPECT_GE(CORXStrTrimSpace(blank, 0), 0);
-    EXPECT_STREQ(blank, "");
-    char empty[] = "";
-    EXPECT_GE(CORXStrTrimSpace(empty, 0), 0);
-    EXPECT_STREQ(empty, "");
-    char inner[] = "a  b";
-    EXPECT_GE(CORXStrTrimSpace(inner, 0), 0);
-    EXPECT_STREQ(inner, "a  b");
+    struct Case {
+        const char* text;
+        const char* trimmed;
+    };
+    for (const Case& c : {Case{" \t 1.0 2.0 \r\n", "1.0 2.0"}, Case{" \n\t ", ""}, Case{"", ""},
+                          Case{"a  b", "a  b"}}) {
+        std::vector<char> text(c.text, c.text + std::strlen(c.text) + 1);
+        EXPECT_GE(CORXStrTrimSpace(text.data(), 0), 0) << c.text;
+        EXPECT_STREQ(text.data(), c.trimmed);
+    }
     EXPECT_LT(CORXStrTrimSpace(nullptr, 0), 0);
 }
 

@@ -89,24 +89,13 @@ TEST_F(CgiPlatform, BodyOfExactlyOneMebibyteIsRead) {
 }
 
 TEST_F(CgiPlatform, OnlyContentLengthBytesAreRead) {
-    CgiRequest request;
-    request.method = "POST";
-    request.contentType = "application/x-www-form-urlencoded";
-    request.body = "action=avoid_timeout&x=1";
-    request.hasContentLength = true;
-    request.contentLength = "13";  // "action=avoid_" only
-    EXPECT_EQ(RunCgi(request).exitStatus, 0);
+    // "action=avoid_" only.
+    EXPECT_EQ(RunCgi(FormPostWithLength("action=avoid_timeout&x=1", "13")).exitStatus, 0);
 }
 
 TEST_F(CgiPlatform, ShortBodyAndBogusLengthsDoNotHang) {
     for (const char* length : {"100", "-5", "abc", "", "99999999999999999999"}) {
-        CgiRequest request;
-        request.method = "POST";
-        request.contentType = "application/x-www-form-urlencoded";
-        request.body = "action=avoid_timeout";
-        request.hasContentLength = true;
-        request.contentLength = length;
-        const CgiResult r = RunCgi(request);
+        const CgiResult r = RunCgi(FormPostWithLength("action=avoid_timeout", length));
         ASSERT_TRUE(r.exited) << length;
         // An announced 100 bytes of which 20 arrive: what arrived is used.
         EXPECT_EQ(r.exitStatus, std::string(length) == "100" ? 1 : 0) << length;

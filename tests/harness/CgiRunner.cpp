@@ -269,14 +269,36 @@ CgiResult Get(const std::string& queryString, const std::string& user) {
     return RunCgi(request);
 }
 
-CgiResult Post(const std::string& body, const std::string& queryString, const std::string& user) {
+namespace {
+
+CgiRequest PostRequest(const std::string& body, const std::string& contentType) {
     CgiRequest request;
     request.method = "POST";
-    request.contentType = "application/x-www-form-urlencoded; charset=UTF-8";
+    request.contentType = contentType;
     request.body = body;
+    return request;
+}
+
+}  // namespace
+
+CgiResult Post(const std::string& body, const std::string& queryString, const std::string& user) {
+    CgiRequest request = PostRequest(body, "application/x-www-form-urlencoded; charset=UTF-8");
     request.queryString = queryString;
     request.remoteUser = user;
     return RunCgi(request);
+}
+
+void ExpectNoReply(const CgiResult& r) {
+    ASSERT_TRUE(r.exited) << r.errors;
+    EXPECT_EQ(r.exitStatus, 0);
+    EXPECT_EQ(r.output, "");
+}
+
+CgiRequest FormPostWithLength(const std::string& body, const std::string& contentLength) {
+    CgiRequest request = PostRequest(body, "application/x-www-form-urlencoded");
+    request.hasContentLength = true;
+    request.contentLength = contentLength;
+    return request;
 }
 
 std::string UrlEncode(const std::string& text) {

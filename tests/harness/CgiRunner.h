@@ -65,6 +65,13 @@ CgiResult Get(const std::string& queryString, const std::string& user = "admin")
 CgiResult Post(const std::string& body, const std::string& queryString = "",
                const std::string& user = "admin");
 
+// Checks that the CGI ended by itself with status 0 and wrote nothing at all, not even a header.
+void ExpectNoReply(const CgiResult& r);
+
+// A POST of the form `body` whose CONTENT_LENGTH says `contentLength`, whether or not the body has
+// that many bytes: for the requests of short, long and bogus lengths.
+CgiRequest FormPostWithLength(const std::string& body, const std::string& contentLength);
+
 // Builds a query string from name/value pairs, percent-encoding both.
 std::string Query(const std::vector<std::pair<std::string, std::string>>& params);
 std::string UrlEncode(const std::string& text);

@@ -139,26 +139,33 @@ ScriptedReply Reply(const std::string& body, int status) {
     return reply;
 }
 
+DidlObject DidlContainer(const std::string& parentId, const std::string& id,
+                         const std::string& title) {
+    DidlObject container;
+    container.container = true;
+    container.id = id;
+    container.parentId = parentId;
+    container.title = title;
+    return container;
+}
+
+DidlObject DidlItem(const std::string& parentId, const std::string& id, const std::string& title,
+                    const std::string& res) {
+    DidlObject item = DidlContainer(parentId, id, title);
+    item.container = false;
+    item.res = res;
+    return item;
+}
+
 void ContentTree::AddContainer(const std::string& parentId, const std::string& id,
                                const std::string& title) {
-    DidlObject o;
-    o.container = true;
-    o.id = id;
-    o.parentId = parentId;
-    o.title = title;
-    Add(o);
+    Add(DidlContainer(parentId, id, title));
     children_[id];  // exists, possibly empty
 }
 
 void ContentTree::AddItem(const std::string& parentId, const std::string& id,
                           const std::string& title) {
-    DidlObject o;
-    o.container = false;
-    o.id = id;
-    o.parentId = parentId;
-    o.title = title;
-    o.res = "http://127.0.0.1:50003/media/" + id + ".mp3";
-    Add(o);
+    Add(DidlItem(parentId, id, title, "http://127.0.0.1:50003/media/" + id + ".mp3"));
 }
 
 void ContentTree::Add(const DidlObject& object) {
@@ -170,12 +177,8 @@ void ContentTree::AddManyItems(const std::string& parentId, std::size_t count,
     std::vector<DidlObject>& list = children_[parentId];
     list.reserve(list.size() + count);
     for (std::size_t n = 0; n < count; ++n) {
-        DidlObject o;
-        o.container = false;
-        o.id = prefix + std::to_string(n);
-        o.parentId = parentId;
-        o.title = "Track " + std::to_string(n);
-        list.push_back(std::move(o));
+        list.push_back(
+            DidlItem(parentId, prefix + std::to_string(n), "Track " + std::to_string(n), ""));
     }
 }
 

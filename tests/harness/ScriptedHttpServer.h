@@ -85,6 +85,11 @@ struct DidlObject {
     std::string album;
     std::string res;
 };
+// A container, and an item with its `res` ("" for none), below `parentId`.
+DidlObject DidlContainer(const std::string& parentId, const std::string& id,
+                         const std::string& title);
+DidlObject DidlItem(const std::string& parentId, const std::string& id, const std::string& title,
+                    const std::string& res);
 std::string DidlLite(const std::vector<DidlObject>& objects);
 // A BrowseResponse envelope around `didl` (escaped into Result). With `withResult` false the
 // Result element is left out.

@@ -34,6 +34,12 @@ class MusicLibraryBrowseFaults : public ::testing::Test {
     ScriptedHttpServer server;
 };
 
+// A well-formed browse reply of one container of "music_all", with HTTP status `status`: the good
+// beginning of the replies that fail later, or for their status alone.
+ScriptedReply OneContainerReply(int status = 200) {
+    return Reply(BrowseResponseBody(DidlLite({{true, "1", "music_all", "One"}}), 1, 1), status);
+}
+
 // The largest resident set of any child reaped so far (the CGI), in KiB.
 long ChildrenPeakKiB() {
     rusage usage{};
@@ -71,8 +77,7 @@ TEST_F(MusicLibraryBrowseFaults, ServerThatNeverAcceptsFailsAfterTheConnectLimit
 }
 
 TEST_F(MusicLibraryBrowseFaults, Http500WithAValidBrowseBodyFails) {
-    server.Enqueue(
-        Reply(BrowseResponseBody(DidlLite({{true, "1", "music_all", "One"}}), 1, 1), 500));
+    server.Enqueue(OneContainerReply(500));
     ASSERT_TRUE(server.Start());
     ExpectFailedBrowse();
     EXPECT_EQ(server.Requests().size(), 1u);
@@ -111,8 +116,7 @@ TEST_F(MusicLibraryBrowseFaults, ConnectionClosedWithoutReplyFails) {
 TEST_F(MusicLibraryBrowseFaults, ReplyThatNeverEndsIsCutAtTheWholeReplyLimit) {
     // Headers at once, then one byte a second forever: only the 20-second whole-reply limit ends
     // it.
-    ScriptedReply reply =
-        Reply(BrowseResponseBody(DidlLite({{true, "1", "music_all", "One"}}), 1, 1));
+    ScriptedReply reply = OneContainerReply();
     reply.dribbleBytes = 1;
     reply.dribbleIntervalMs = 1000;
     reply.neverEnd = true;
@@ -126,8 +130,7 @@ TEST_F(MusicLibraryBrowseFaults, ReplyThatNeverEndsIsCutAtTheWholeReplyLimit) {
 
 TEST_F(MusicLibraryBrowseFaults, OversizedReplyIsRefusedAndTheTransferAborted) {
     // A valid beginning, then 80 MiB of padding announced by Content-Length.
-    ScriptedReply reply =
-        Reply(BrowseResponseBody(DidlLite({{true, "1", "music_all", "One"}}), 1, 1));
+    ScriptedReply reply = OneContainerReply();
     reply.paddingBytes = 80u * 1024 * 1024;
     server.Enqueue(reply);
     ASSERT_TRUE(server.Start());
@@ -143,8 +146,7 @@ TEST_F(MusicLibraryBrowseFaults, OversizedReplyIsRefusedAndTheTransferAborted) {
 
 TEST_F(MusicLibraryBrowseFaults, ReplyJustUnderTheLimitIsAccepted) {
     // 60 MiB of trailing white space after the envelope: well-formed, under 64 MiB.
-    ScriptedReply reply =
-        Reply(BrowseResponseBody(DidlLite({{true, "1", "music_all", "One"}}), 1, 1));
+    ScriptedReply reply = OneContainerReply();
     reply.paddingBytes = 60u * 1024 * 1024;
     server.Enqueue(reply);
     ASSERT_TRUE(server.Start());

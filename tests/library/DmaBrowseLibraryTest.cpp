@@ -17,6 +17,32 @@ namespace {
 
 constexpr const char* kControlUrl = "http://127.0.0.1:50003/ContentDirectory/control";
 
+// A BrowseDirectChildren of `objectId` at the scripted server, prepared (`prepareResult`), and the
+// parser that runs it.
+struct ChildrenBrowse {
+    explicit ChildrenBrowse(const char* objectId, unsigned startingIndex = 0,
+                            unsigned requestedCount = 0)
+        : browse(BrowseDirectChildren, kControlUrl) {
+        browse.objectId = objectId;
+        browse.startingIndex = startingIndex;
+        browse.requestedCount = requestedCount;
+        prepareResult = browse.Prepare();
+    }
+    int Run() { return parser.Parse(&browse); }
+
+    DMABrowse browse;
+    int prepareResult = -1;
+    DMAParser parser;
+};
+
+// Starts `server` serving a container "c" of 120 items "t0" to "t119" in pages of at most 50.
+bool ServeContainerOf120Items(ScriptedHttpServer& server) {
+    ContentTree tree;
+    tree.AddManyItems("c", 120, "t");
+    server.ServeTree(tree, 50);
+    return server.Start();
+}
+
 std::string Unescaped(const std::string& element, const std::string& envelope) {
     pugi::xml_document doc;
     EXPECT_TRUE(doc.load_string(envelope.c_str()));
@@ -193,13 +219,11 @@ TEST(DmaBrowseLibrary, ParserSendsTheExactSoapRequest) {
     ScriptedHttpServer server;
     server.Enqueue(Reply(BrowseResponseBody(DidlLite({{true, "a", "x", "A"}}), 1, 1)));
     ASSERT_TRUE(server.Start());
-    DMABrowse browse(BrowseDirectChildren, kControlUrl);
-    browse.objectId = "x";
-    ASSERT_EQ(browse.Prepare(), 0);
-    DMAParser parser;
-    ASSERT_EQ(parser.Parse(&browse), 0) << parser.Error();
-    ASSERT_NE(parser.GetResult(), nullptr);
-    ASSERT_EQ(parser.GetResult()->size(), 1u);
+    ChildrenBrowse children("x");
+    ASSERT_EQ(children.prepareResult, 0);
+    ASSERT_EQ(children.Run(), 0) << children.parser.Error();
+    ASSERT_NE(children.parser.GetResult(), nullptr);
+    ASSERT_EQ(children.parser.GetResult()->size(), 1u);
     const std::vector<RecordedRequest> requests = server.Requests();
     ASSERT_EQ(requests.size(), 1u);
     const RecordedRequest& r = requests[0];
@@ -208,7 +232,7 @@ TEST(DmaBrowseLibrary, ParserSendsTheExactSoapRequest) {
     EXPECT_EQ(r.Header("SOAPACTION"), "\"urn:schemas-upnp-org:service:ContentDirectory:1#Browse\"");
     EXPECT_EQ(r.Header("Content-Type"), "text/xml; charset=\"utf-8\"");
     EXPECT_EQ(r.Header("Expect"), "");
-    EXPECT_EQ(r.body, browse.Envelope());
+    EXPECT_EQ(r.body, children.browse.Envelope());
     EXPECT_TRUE(r.isBrowse);
     EXPECT_EQ(r.objectId, "x");
     EXPECT_EQ(r.browseFlag, "BrowseDirectChildren");
@@ -228,43 +252,30 @@ TEST(DmaBrowseLibrary, ParserRefusesAnUnpreparedBrowse) {
 }
 
 TEST(DmaBrowseLibrary, ExplicitRequestedCountAsksOnePageOnly) {
-    ContentTree tree;
-    tree.AddManyItems("c", 120, "t");
     ScriptedHttpServer server;
-    server.ServeTree(tree, 50);
-    ASSERT_TRUE(server.Start());
-    DMABrowse browse(BrowseDirectChildren, kControlUrl);
-    browse.objectId = "c";
-    browse.startingIndex = 10;
-    browse.requestedCount = 30;
-    ASSERT_EQ(browse.Prepare(), 0);
-    DMAParser parser;
-    ASSERT_EQ(parser.Parse(&browse), 0);
-    ASSERT_EQ(parser.GetResult()->size(), 30u);
-    EXPECT_EQ(parser.GetResult()->front()->id(), "t10");
+    ASSERT_TRUE(ServeContainerOf120Items(server));
+    ChildrenBrowse children("c", 10, 30);
+    ASSERT_EQ(children.prepareResult, 0);
+    ASSERT_EQ(children.Run(), 0);
+    ASSERT_EQ(children.parser.GetResult()->size(), 30u);
+    EXPECT_EQ(children.parser.GetResult()->front()->id(), "t10");
     ASSERT_EQ(server.Requests().size(), 1u);
     EXPECT_EQ(server.Requests()[0].startingIndex, 10);
     EXPECT_EQ(server.Requests()[0].requestedCount, 30);
 }
 
 TEST(DmaBrowseLibrary, PagingFromAStartingIndexStopsAtTotalMatches) {
-    ContentTree tree;
-    tree.AddManyItems("c", 120, "t");
     ScriptedHttpServer server;
-    server.ServeTree(tree, 50);
-    ASSERT_TRUE(server.Start());
-    DMABrowse browse(BrowseDirectChildren, kControlUrl);
-    browse.objectId = "c";
-    browse.startingIndex = 30;
-    ASSERT_EQ(browse.Prepare(), 0);
-    DMAParser parser;
-    ASSERT_EQ(parser.Parse(&browse), 0);
-    ASSERT_EQ(parser.GetResult()->size(), 90u);
-    EXPECT_EQ(parser.GetResult()->back()->id(), "t119");
+    ASSERT_TRUE(ServeContainerOf120Items(server));
+    ChildrenBrowse children("c", 30);
+    ASSERT_EQ(children.prepareResult, 0);
+    ASSERT_EQ(children.Run(), 0);
+    ASSERT_EQ(children.parser.GetResult()->size(), 90u);
+    EXPECT_EQ(children.parser.GetResult()->back()->id(), "t119");
     const std::vector<RecordedRequest> requests = server.Requests();
     ASSERT_EQ(requests.size(), 2u);
     EXPECT_EQ(requests[1].startingIndex, 80);
-    EXPECT_EQ(parser.TotalMatches(), 120u);
+    EXPECT_EQ(children.parser.TotalMatches(), 120u);
 }
 
 TEST(DmaBrowseLibrary, PagingStopsOnAnEmptyPageEvenIfTotalMatchesLies) {
@@ -272,12 +283,10 @@ TEST(DmaBrowseLibrary, PagingStopsOnAnEmptyPageEvenIfTotalMatchesLies) {
     server.Enqueue(Reply(BrowseResponseBody(DidlLite({{true, "a", "c", "A"}}), 1, 1000)));
     server.Enqueue(Reply(BrowseResponseBody(DidlLite({}), 0, 1000)));
     ASSERT_TRUE(server.Start());
-    DMABrowse browse(BrowseDirectChildren, kControlUrl);
-    browse.objectId = "c";
-    ASSERT_EQ(browse.Prepare(), 0);
-    DMAParser parser;
-    ASSERT_EQ(parser.Parse(&browse), 0);
-    EXPECT_EQ(parser.GetResult()->size(), 1u);
+    ChildrenBrowse children("c");
+    ASSERT_EQ(children.prepareResult, 0);
+    ASSERT_EQ(children.Run(), 0);
+    EXPECT_EQ(children.parser.GetResult()->size(), 1u);
     EXPECT_EQ(server.Requests().size(), 2u);
 }
 
@@ -288,12 +297,10 @@ TEST(DmaBrowseLibrary, NonOkStatusesFail) {
             Reply(BrowseResponseBody(DidlLite({{true, "a", "c", "A"}}), 1, 1), status);
         server.Enqueue(reply);
         ASSERT_TRUE(server.Start());
-        DMABrowse browse(BrowseDirectChildren, kControlUrl);
-        browse.objectId = "c";
-        ASSERT_EQ(browse.Prepare(), 0);
-        DMAParser parser;
-        EXPECT_NE(parser.Parse(&browse), 0) << status;
-        EXPECT_EQ(parser.GetResult(), nullptr);
+        ChildrenBrowse children("c");
+        ASSERT_EQ(children.prepareResult, 0);
+        EXPECT_NE(children.Run(), 0) << status;
+        EXPECT_EQ(children.parser.GetResult(), nullptr);
     }
 }
 

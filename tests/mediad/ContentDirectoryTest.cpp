@@ -22,6 +22,7 @@
 #include "tests/harness/PlaylistFixtures.h"
 #include "tests/harness/Sandbox.h"
 #include "tests/mediad/DidlDocument.h"
+#include "tests/mediad/DirectBrowse.h"
 #include "tests/mediad/MediadTestKit.h"
 
 namespace harmona::test::mediad {
@@ -76,17 +77,6 @@ void BumpUpdateCount() {
 
 ContentDirectory Directory() {
     return ContentDirectory(kLibraryDb, kShare, kMediaBase);
-}
-
-BrowseResult Browse(const ContentDirectory& directory, const std::string& id, bool metadata = false,
-                    uint32_t start = 0, uint32_t count = 0, const std::string& sort = "") {
-    BrowseArgs args;
-    args.objectId = id;
-    args.metadata = metadata;
-    args.startingIndex = start;
-    args.requestedCount = count;
-    args.sortCriteria = sort;
-    return directory.Browse(args);
 }
 
 std::vector<DidlObjectRecord> Objects(const BrowseResult& result) {

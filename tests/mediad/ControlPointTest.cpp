@@ -34,9 +34,7 @@ CommandRun RunCommand(const std::string& command) {
 class RealControlPoints : public ::testing::Test {
   protected:
     void SetUp() override {
-        MakeStandardShare();
-        const IndexRun run = RunIndexer();
-        ASSERT_EQ(run.exitStatus, 0) << run.output;
+        ASSERT_NO_FATAL_FAILURE(IndexStandardShare());
         // SSDP on loopback: the interface must carry multicast.
         ASSERT_EQ(std::system("ip link set lo multicast on"), 0);
         ASSERT_TRUE(server_.Start()) << "harmona-mediad did not come up";

@@ -24,12 +24,12 @@
 #include "tests/harness/PlaylistFixtures.h"
 #include "tests/harness/Sandbox.h"
 #include "tests/mediad/DidlDocument.h"
+#include "tests/mediad/DirectBrowse.h"
 #include "tests/mediad/MediadTestKit.h"
 
 namespace harmona::test::mediad {
 namespace {
 
-using harmona::mediad::BrowseArgs;
 using harmona::mediad::ContentDirectory;
 using harmona::mediad::LiveLibrary;
 using harmona::mediad::LiveLibraryOptions;
@@ -49,9 +49,7 @@ bool WaitUntil(const std::function<bool()>& condition) {
 }
 
 std::vector<std::string> AllTitles(const ContentDirectory& directory) {
-    BrowseArgs args;
-    args.objectId = "music_all";
-    const DidlDocument document = ParseDidl(directory.Browse(args).didl);
+    const DidlDocument document = ParseDidl(Browse(directory, "music_all").didl);
     std::vector<std::string> titles;
     for (const DidlObjectRecord& object : document.objects)
         titles.push_back(object.title);
@@ -183,9 +181,8 @@ TEST_F(LiveShare, ARemovedFileLeavesEveryContainer) {
     ASSERT_TRUE(WaitUntil([&] { return !HasTitle(directory_, "Third"); }));
     EXPECT_EQ(AllTitles(directory_).size(), 4u);
     EXPECT_GT(directory_.SystemUpdateId(), before);
-    BrowseArgs late;
-    late.objectId = "folder:Jazz/Blue/Late";
-    EXPECT_EQ(directory_.Browse(late).error, harmona::mediad::kErrorNoSuchObject);
+    EXPECT_EQ(Browse(directory_, "folder:Jazz/Blue/Late").error,
+              harmona::mediad::kErrorNoSuchObject);
 }
 
 TEST_F(LiveShare, APassOverAnUnchangedShareReadsNoTagAndKeepsTheUpdateId) {

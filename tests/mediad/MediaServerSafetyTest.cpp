@@ -104,9 +104,7 @@ class CallbackListener {
 class MediaServerSafety : public ::testing::Test {
   protected:
     void SetUp() override {
-        MakeStandardShare();
-        const IndexRun run = RunIndexer();
-        ASSERT_EQ(run.exitStatus, 0) << run.output;
+        ASSERT_NO_FATAL_FAILURE(IndexStandardShare());
         ASSERT_TRUE(server_.Start()) << "harmona-mediad did not come up";
     }
     bool StillServes() {

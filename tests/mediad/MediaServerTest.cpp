@@ -45,9 +45,7 @@ const DidlEntry* FindTitle(const BrowseReply& reply, const std::string& title) {
 class LocalMediaServer : public ::testing::Test {
   protected:
     void SetUp() override {
-        MakeStandardShare();
-        const IndexRun run = RunIndexer();
-        ASSERT_EQ(run.exitStatus, 0) << run.output;
+        ASSERT_NO_FATAL_FAILURE(IndexStandardShare());
         ASSERT_TRUE(server_.Start()) << "harmona-mediad did not come up";
     }
     ServerProcess server_;

@@ -2,6 +2,7 @@
 
 #include <arpa/inet.h>
 #include <curl/curl.h>
+#include <gtest/gtest.h>
 #include <netinet/in.h>
 #include <poll.h>
 #include <signal.h>
@@ -171,6 +172,12 @@ IndexRun RunIndexer() {
             run.counts[word.substr(0, equals)] = std::atol(word.c_str() + equals + 1);
     }
     return run;
+}
+
+void IndexStandardShare() {
+    MakeStandardShare();
+    const IndexRun run = RunIndexer();
+    ASSERT_EQ(run.exitStatus, 0) << run.output;
 }
 
 void SetUpNetwork() {

@@ -39,6 +39,9 @@ struct IndexRun {
     std::map<std::string, long> counts;  // files, added, updated, removed, tagreads, broken
 };
 IndexRun RunIndexer();
+// The standard share indexed by the real harmona-index: the start of the tests that talk to a
+// running server. A fatal test failure, with the indexer's output, when the indexer fails.
+void IndexStandardShare();
 
 // Two veth ends, hm0 (192.0.2.1, where the server runs) and hm1 (192.0.2.2), up, IPv6 off (its
 // duplicate address detection would only delay the test), multicast routed through hm0, and

@@ -26,6 +26,22 @@ constexpr const char* kScanIcon = "3rdparty/Harmona/images/button/btn_search_dms
 constexpr const char* kParseError = "audio:1130 Parse error";
 constexpr int kReplySize = 40960;
 
+// A leaf node as the tree writes it: the same text as label and tooltip, not dragged, dropped on
+// or expanded.
+Json::Value LeafNode(const std::string& text, const std::string& id, const std::string& icon) {
+    Json::Value node(Json::objectValue);
+    node["text"] = text;
+    node["qtip"] = text;
+    node["id"] = id;
+    node["icon"] = icon;
+    node["allowDrag"] = false;
+    node["allowDrop"] = false;
+    node["draggable"] = false;
+    node["expanded"] = false;
+    node["leaf"] = true;
+    return node;
+}
+
 std::string Compact(const Json::Value& value) {
     Json::StreamWriterBuilder builder;
     builder["indentation"] = "";
@@ -237,16 +253,7 @@ TEST_F(MediaServerList, WithTheDaemonDownTheMediaServerNodeHasOnlyTheScanButton)
     HarmonaHandler handler;
     Json::Value children(Json::arrayValue);
     EXPECT_EQ(handler.GetMediaServerNodes(children), 1);
-    Json::Value scan(Json::objectValue);
-    scan["text"] = kScanText;
-    scan["qtip"] = kScanText;
-    scan["id"] = "mediaserver_refresh";
-    scan["icon"] = kScanIcon;
-    scan["allowDrag"] = false;
-    scan["allowDrop"] = false;
-    scan["draggable"] = false;
-    scan["expanded"] = false;
-    scan["leaf"] = true;
+    const Json::Value scan = LeafNode(kScanText, "mediaserver_refresh", kScanIcon);
     ASSERT_EQ(children.size(), 1u);
     EXPECT_EQ(children[0], scan) << Compact(children);
 }
@@ -262,17 +269,9 @@ TEST_F(MediaServerList, MediaServerNodeListsTheScanButtonThenTheServers) {
     EXPECT_EQ(children[0], "kept");
     EXPECT_EQ(children[1]["id"], "mediaserver_refresh");
     EXPECT_FALSE(children[1].isMember("pid"));
-    Json::Value server(Json::objectValue);
-    server["text"] = "Server 12";
-    server["qtip"] = "Server 12";
-    server["id"] = "mediaserver_http://10.0.0.12:8200/ctl/12";
+    Json::Value server =
+        LeafNode("Server 12", "mediaserver_http://10.0.0.12:8200/ctl/12", kServerIcon);
     server["pid"] = "mediaserver_root";
-    server["icon"] = kServerIcon;
-    server["allowDrag"] = false;
-    server["allowDrop"] = false;
-    server["draggable"] = false;
-    server["expanded"] = false;
-    server["leaf"] = true;
     EXPECT_EQ(children[13], server);
 }
 

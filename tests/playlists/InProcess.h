@@ -7,6 +7,7 @@
 // the CGI entry does it, with the request's environment set as a web server would set it.
 #pragma once
 
+#include <gtest/gtest.h>
 #include <json/json.h>
 #include <stdlib.h>
 #include <syslog.h>
@@ -16,6 +17,7 @@
 
 #include "src/handler/HarmonaHandler.h"
 #include "tests/harness/CgiRunner.h"
+#include "tests/harness/Fixtures.h"
 #include "tests/harness/Sandbox.h"
 
 namespace harmona::test {
@@ -39,6 +41,15 @@ struct InProcessHandler {
     HarmonaHandler handler;
 };
 
+// The fixture of the tests of one builder: the standard fixture files, a request by "admin" with
+// every permission a playlist builder looks at, and the array the builder fills.
+class PlaylistBuilderTest : public ::testing::Test {
+  protected:
+    void SetUp() override { StandardFixture(); }
+    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
+    Json::Value children{Json::arrayValue};
+};
+
 // The messages that the test process sent to the system log since the last call.
 inline std::vector<std::string> LoggedErrors() {
     std::vector<std::string> messages;
@@ -60,6 +71,32 @@ inline std::vector<std::string> Texts(const Json::Value& nodes) {
     for (const Json::Value& node : nodes)
         texts.push_back(node["text"].asString());
     return texts;
+}
+
+// Checks a playlist node: its id, parent id, text and icon, and a leaf that is neither dragged,
+// dropped on nor expanded.
+inline void ExpectPlaylistNode(const Json::Value& node, const std::string& id,
+                               const std::string& parentId, const std::string& text,
+                               const std::string& icon) {
+    EXPECT_EQ(node["id"].asString(), id);
+    EXPECT_EQ(node["pid"].asString(), parentId);
+    EXPECT_EQ(node["text"].asString(), text);
+    EXPECT_EQ(node["icon"].asString(), icon);
+    EXPECT_TRUE(node["leaf"].asBool());
+    for (const char* flag : {"allowDrag", "allowDrop", "draggable", "expanded"})
+        EXPECT_FALSE(node[flag].asBool()) << flag;
+}
+
+// Checks the error envelope that SetError writes into a builder's children array: the system error
+// of the common section with the line `line`, and the nodes the builder had added, in `itemIds`.
+inline void ExpectSystemError(const Json::Value& children, int line,
+                              const std::vector<std::string>& itemIds) {
+    ASSERT_TRUE(children.isObject());
+    EXPECT_FALSE(children["success"].asBool());
+    EXPECT_EQ(children["errinfo"]["sec"].asString(), "common");
+    EXPECT_EQ(children["errinfo"]["key"].asString(), "error_system");
+    EXPECT_EQ(children["errinfo"]["line"].asInt(), line);
+    EXPECT_EQ(Ids(children["items"]), itemIds);
 }
 
 }  // namespace harmona::test

@@ -18,29 +18,30 @@ class PlaylistCategories : public ::testing::Test {
     void SetUp() override { StandardFixture(); }
 };
 
-void ExpectRefreshButton(const Json::Value& node, const std::string& category) {
-    EXPECT_EQ(node["id"].asString(), "musiclib_music_" + category + "_refresh");
+// A button of a playlist category: no parent id, a leaf that is neither dragged nor expanded; the
+// "new playlist" button alone takes drops.
+void ExpectButton(const Json::Value& node, const std::string& id, const std::string& text,
+                  const std::string& icon, bool allowDrop) {
+    EXPECT_EQ(node["id"].asString(), id);
     EXPECT_FALSE(node.isMember("pid"));
-    EXPECT_EQ(node["text"].asString(), "Refresh");
-    EXPECT_EQ(node["qtip"].asString(), "Refresh");
-    EXPECT_EQ(node["icon"].asString(), "3rdparty/Harmona/images/button/btn_refresh.png");
+    EXPECT_EQ(node["text"].asString(), text);
+    EXPECT_EQ(node["icon"].asString(), icon);
     EXPECT_TRUE(node["leaf"].asBool());
-    EXPECT_FALSE(node["allowDrop"].asBool());
+    EXPECT_EQ(node["allowDrop"].asBool(), allowDrop);
     EXPECT_FALSE(node["allowDrag"].asBool());
     EXPECT_FALSE(node["draggable"].asBool());
     EXPECT_FALSE(node["expanded"].asBool());
 }
 
+void ExpectRefreshButton(const Json::Value& node, const std::string& category) {
+    ExpectButton(node, "musiclib_music_" + category + "_refresh", "Refresh",
+                 "3rdparty/Harmona/images/button/btn_refresh.png", false);
+    EXPECT_EQ(node["qtip"].asString(), "Refresh");
+}
+
 void ExpectNewButton(const Json::Value& node, const std::string& category) {
-    EXPECT_EQ(node["id"].asString(), "musiclib_music_" + category + "_new");
-    EXPECT_FALSE(node.isMember("pid"));
-    EXPECT_EQ(node["text"].asString(), "New Playlist");
-    EXPECT_EQ(node["icon"].asString(), "3rdparty/Harmona/images/button/btn_new_playlist.png");
-    EXPECT_TRUE(node["leaf"].asBool());
-    EXPECT_TRUE(node["allowDrop"].asBool());
-    EXPECT_FALSE(node["allowDrag"].asBool());
-    EXPECT_FALSE(node["draggable"].asBool());
-    EXPECT_FALSE(node["expanded"].asBool());
+    ExpectButton(node, "musiclib_music_" + category + "_new", "New Playlist",
+                 "3rdparty/Harmona/images/button/btn_new_playlist.png", true);
 }
 
 TEST_F(PlaylistCategories,
@@ -125,25 +126,14 @@ TEST_F(PlaylistCategories, ButtonTextsFollowTheUserLanguage) {
     EXPECT_NE(personal[1]["text"].asString(), "New Playlist");
 }
 
-// The error envelope that SetError writes into the children array.
-void ExpectErrorWithButtons(const Json::Value& children, int line,
-                            const std::vector<std::string>& buttonIds) {
-    ASSERT_TRUE(children.isObject());
-    EXPECT_FALSE(children["success"].asBool());
-    EXPECT_EQ(children["errinfo"]["sec"].asString(), "common");
-    EXPECT_EQ(children["errinfo"]["key"].asString(), "error_system");
-    EXPECT_EQ(children["errinfo"]["line"].asInt(), line);
-    EXPECT_EQ(Ids(children["items"]), buttonIds);
-}
-
 TEST_F(PlaylistCategories, UnlistablePersonalPlaylistsGiveErrorLine364AndKeepTheButtons) {
     // The playlists path is a file, so it cannot be read as a directory.
     WriteFile(PersonalPlaylistDir("admin"), "not a folder");
     InProcessHandler request("admin", kEverything);
     Json::Value personal(Json::arrayValue);
     EXPECT_EQ(request.handler.AddPersonalPlaylistCategory(personal), 0);
-    ExpectErrorWithButtons(personal, 364,
-                           {"musiclib_music_personal_refresh", "musiclib_music_personal_new"});
+    ExpectSystemError(personal, 364,
+                      {"musiclib_music_personal_refresh", "musiclib_music_personal_new"});
     EXPECT_EQ(LoggedErrors(),
               std::vector<std::string>{"audio:642 Failed to enum user's playlist!"});
 }
@@ -153,15 +143,15 @@ TEST_F(PlaylistCategories, UnlistableSharedPlaylistsGiveErrorLine399AndKeepTheBu
     InProcessHandler request("admin", kAllButNewShared);
     Json::Value shared(Json::arrayValue);
     EXPECT_EQ(request.handler.AddSharedPlaylistCategory(shared), 0);
-    ExpectErrorWithButtons(shared, 399, {"musiclib_music_shared_refresh"});
+    ExpectSystemError(shared, 399, {"musiclib_music_shared_refresh"});
     EXPECT_EQ(LoggedErrors(),
               std::vector<std::string>{"audio:642 Failed to enum user's playlist!"});
 
     InProcessHandler withNew("admin", kEverything);
     Json::Value sharedWithNew(Json::arrayValue);
     EXPECT_EQ(withNew.handler.AddSharedPlaylistCategory(sharedWithNew), 0);
-    ExpectErrorWithButtons(sharedWithNew, 399,
-                           {"musiclib_music_shared_refresh", "musiclib_music_shared_new"});
+    ExpectSystemError(sharedWithNew, 399,
+                      {"musiclib_music_shared_refresh", "musiclib_music_shared_new"});
 }
 
 TEST_F(PlaylistCategories, ErrorEnvelopeSerializesAsTheBrowserSeesIt) {

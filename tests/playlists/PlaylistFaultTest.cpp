@@ -11,24 +11,13 @@ using namespace harmona::test;
 
 namespace {
 
-class PlaylistCategoryFaults : public ::testing::Test {
+class PlaylistCategoryFaults : public PlaylistBuilderTest {
   protected:
     void SetUp() override {
-        StandardFixture();
+        PlaylistBuilderTest::SetUp();
         Scripted() = ScriptedPlatform();
     }
-    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
-    Json::Value children{Json::arrayValue};
 };
-
-void ExpectSystemError(const Json::Value& reply, int line, const std::vector<std::string>& ids) {
-    ASSERT_TRUE(reply.isObject());
-    EXPECT_FALSE(reply["success"].asBool());
-    EXPECT_EQ(reply["errinfo"]["sec"].asString(), "common");
-    EXPECT_EQ(reply["errinfo"]["key"].asString(), "error_system");
-    EXPECT_EQ(reply["errinfo"]["line"].asInt(), line);
-    EXPECT_EQ(Ids(reply["items"]), ids);
-}
 
 TEST_F(PlaylistCategoryFaults,
        FailedPersonalSmartListingGivesErrorLine369AfterTheOrdinaryPlaylists) {

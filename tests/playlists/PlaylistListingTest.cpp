@@ -14,12 +14,7 @@ namespace {
 constexpr const char* kFailureLog = "audio:642 Failed to enum user's playlist!";
 constexpr const char* kPlaylistIcon = "3rdparty/Harmona/images/files_class/icon_playlist.png";
 
-class PlaylistListing : public ::testing::Test {
-  protected:
-    void SetUp() override { StandardFixture(); }
-    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
-    Json::Value children{Json::arrayValue};
-};
+class PlaylistListing : public PlaylistBuilderTest {};
 
 TEST_F(PlaylistListing, CategoryDifferingOnlyInLetterCaseIsUnknownLogsAndFails) {
     WritePersonalPlaylistFile("admin", "mine.m3u");
@@ -36,15 +31,9 @@ TEST_F(PlaylistListing, PersonalNodesCarryNameIdParentIconAndLeafFlagOnly) {
     WritePersonalPlaylistFile("admin", "Road Trip & <Co>.m3u");
     ASSERT_EQ(request.handler.ListPlaylists(children, "music_personal"), 1);
     ASSERT_EQ(children.size(), 1u);
-    const Json::Value& node = children[0];
-    EXPECT_EQ(node["id"].asString(), "musiclib_music_personal/playlist/Road Trip & <Co>");
-    EXPECT_EQ(node["pid"].asString(), "musiclib_music_personal");
-    EXPECT_EQ(node["text"].asString(), "Road Trip &amp; &lt;Co&gt;");
-    EXPECT_EQ(node["qtip"].asString(), "Road Trip &amp; &lt;Co&gt;");
-    EXPECT_EQ(node["icon"].asString(), kPlaylistIcon);
-    EXPECT_TRUE(node["leaf"].asBool());
-    for (const char* flag : {"allowDrag", "allowDrop", "draggable", "expanded"})
-        EXPECT_FALSE(node[flag].asBool()) << flag;
+    ExpectPlaylistNode(children[0], "musiclib_music_personal/playlist/Road Trip & <Co>",
+                       "musiclib_music_personal", "Road Trip &amp; &lt;Co&gt;", kPlaylistIcon);
+    EXPECT_EQ(children[0]["qtip"].asString(), "Road Trip &amp; &lt;Co&gt;");
     EXPECT_TRUE(LoggedErrors().empty());
 }
 

@@ -13,12 +13,8 @@ namespace {
 
 constexpr const char* kSmartIcon = "3rdparty/Harmona/images/files_class/icon_smartpls.png";
 
-class SmartPlaylists : public ::testing::Test {
+class SmartPlaylists : public PlaylistBuilderTest {
   protected:
-    void SetUp() override { StandardFixture(); }
-    InProcessHandler request{"admin", PERM_IPOD | PERM_NEW_SHARED_PLAYLIST | PERM_MEDIA_SERVER};
-    Json::Value children{Json::arrayValue};
-
     std::vector<std::string> PersonalTexts(const std::vector<std::string>& enumerated) {
         WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), enumerated);
         Json::Value nodes(Json::arrayValue);
@@ -62,14 +58,8 @@ TEST_F(SmartPlaylists, PersonalNodesCarryIdParentIconAndLeafFlagOnly) {
     WriteSmartPlaylistFile(UserSmartPlaylistFile("admin"), {"Best of <80s>"});
     ASSERT_EQ(request.handler.ListSmartPlaylists(children, "music_personal"), 1);
     ASSERT_EQ(children.size(), 1u);
-    const Json::Value& node = children[0];
-    EXPECT_EQ(node["id"].asString(), "musiclib_music_personal/smart/Best of <80s>");
-    EXPECT_EQ(node["pid"].asString(), "musiclib_music_personal");
-    EXPECT_EQ(node["text"].asString(), "Best of &lt;80s&gt;");
-    EXPECT_EQ(node["icon"].asString(), kSmartIcon);
-    EXPECT_TRUE(node["leaf"].asBool());
-    for (const char* flag : {"allowDrag", "allowDrop", "draggable", "expanded"})
-        EXPECT_FALSE(node[flag].asBool()) << flag;
+    ExpectPlaylistNode(children[0], "musiclib_music_personal/smart/Best of <80s>",
+                       "musiclib_music_personal", "Best of &lt;80s&gt;", kSmartIcon);
 }
 
 TEST_F(SmartPlaylists, SharedCategoryReadsTheSharedFileAndAddressesByName) {

@@ -79,11 +79,7 @@ TEST(RefreshAction, NoPlaylistsAtAllGivesASuccessWithNullItems) {
 
 // A failing refresh of personal playlists prints the error envelope and no "items".
 TEST(RefreshAction, FailingPersonalListingPrintsTheErrorEnvelopeWithoutItems) {
-    TreeWorld world;
-    world.personal = {};
-    world.personalSmart = {};
-    TreeFixture fixture(world);
-    WriteFile(PersonalPlaylistDir(world.user), "not a folder");
+    TreeFixture fixture(WorldWithUnlistablePersonalPlaylists());
     const CgiResult r = Refresh("personal");
     EXPECT_EQ(r.exitStatus, 1);  // refresh returns 1 whatever the builder did
     ASSERT_TRUE(r.jsonOk) << r.output;

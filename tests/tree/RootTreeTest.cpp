@@ -207,12 +207,8 @@ TEST(RootTree, TextsInTheUsersLanguage) {
 }
 
 TEST(RootTree, FailingPersonalPlaylistsEndTheTreeWithTheErrorPair) {
-    TreeWorld world;
-    world.personal = {};
-    world.personalSmart = {};
-    TreeFixture fixture(world);
     // A playlists path that cannot be read as a folder: the personal playlist listing fails.
-    WriteFile(PersonalPlaylistDir(world.user), "not a folder");
+    TreeFixture fixture(WorldWithUnlistablePersonalPlaylists());
     const CgiResult r = Get(kRootQuery);
     ASSERT_TRUE(r.jsonOk) << r.output;
     EXPECT_EQ(r.exitStatus, 0);

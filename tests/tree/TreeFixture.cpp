@@ -46,6 +46,16 @@ TreeFixture::TreeFixture(const TreeWorld& world) : world_(world) {
     if (world.daemon)
         daemon_ = std::make_unique<ScriptedDaemon>(
             ServeMediaServers(MakeMediaServers(world.mediaServers)));
+    if (!world.personalListable)
+        WriteFile(PersonalPlaylistDir(world.user), "not a folder");
+}
+
+TreeWorld WorldWithUnlistablePersonalPlaylists() {
+    TreeWorld world;
+    world.personal = {};
+    world.personalSmart = {};
+    world.personalListable = false;
+    return world;
 }
 
 std::vector<std::string> Ids(const Json::Value& nodes) {

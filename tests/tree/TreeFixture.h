@@ -21,12 +21,18 @@ struct TreeWorld {
     bool ipod = true;            // an iPod is attached (directory, mountpoint file, database)
     std::vector<std::string> personal = {"Road trip", "Morning"};        // .m3u files
     std::vector<std::string> personalSmart = {"rock", "Jazz", "blues"};  // smart.playlist sections
+    // false: a file takes the path of the user's playlists folder, so that listing the personal
+    // playlists fails (personal and personalSmart must be empty then).
+    bool personalListable = true;
     std::vector<std::string> shared = {"Party", "Chill"};  // library.db rows (ids 7, 3)
     std::vector<std::string> sharedSmart = {"Top rated"};
     std::vector<std::string> ipodPlaylists = {"Gym", "Sleep"};
     int mediaServers = 3;
     bool daemon = true;
 };
+
+// The standard world but for the personal playlists: none, and a listing of them that fails.
+TreeWorld WorldWithUnlistablePersonalPlaylists();
 
 // Writes the world into the sandbox; keeps the scripted daemon running while the object lives.
 class TreeFixture {

@@ -30,15 +30,19 @@ MediaServer Server(const std::string& name, const std::string& udn) {
     return {udn, name, "http://10.0.0.1:8200/ctl/" + udn, "10.0.0.1"};
 }
 
-// The largest element the daemon can hold: every field at its bound, every byte escaped twice
+// The largest elements the daemon can hold: every field at its bound, every byte escaped twice
 // as long (quotes in the name, the longest URL).
-MediaServer WorstCaseServer(int i) {
-    MediaServer server;
-    server.udn = "uuid:" + std::string(kMaxUdnBytes - 5 - 3, 'u') + std::to_string(100 + i);
-    server.friendlyName = std::string(kMaxFriendlyNameBytes, '"');
-    server.controlUrl = "http://10.0.0.1/" + std::string(kMaxControlUrlBytes - 16, 'c');
-    server.ip = std::string(kMaxIpBytes, 'f');
-    return server;
+// `count` of them, told apart by their udn.
+std::vector<MediaServer> WorstCaseServers(int count) {
+    std::vector<MediaServer> servers(count);
+    for (int i = 0; i < count; ++i) {
+        MediaServer& server = servers[i];
+        server.udn = "uuid:" + std::string(kMaxUdnBytes - 5 - 3, 'u') + std::to_string(100 + i);
+        server.friendlyName = std::string(kMaxFriendlyNameBytes, '"');
+        server.controlUrl = "http://10.0.0.1/" + std::string(kMaxControlUrlBytes - 16, 'c');
+        server.ip = std::string(kMaxIpBytes, 'f');
+    }
+    return servers;
 }
 
 }  // namespace
@@ -117,9 +121,7 @@ TEST(Vanuaudiod_Replies, PageHoldsTheElementsFromOffsetAndTheWholeTotal) {
 }
 
 TEST(Vanuaudiod_Replies, TenWorstCaseServersFitTheCgisReplyBuffer) {
-    std::vector<MediaServer> servers;
-    for (int i = 0; i < 10; ++i)
-        servers.push_back(WorstCaseServer(i));
+    const std::vector<MediaServer> servers = WorstCaseServers(10);
     bool search = false;
     const std::string reply = Answer({16, "0 10"}, servers, search);
     EXPECT_LT(reply.size(), 40960u);
@@ -129,9 +131,7 @@ TEST(Vanuaudiod_Replies, TenWorstCaseServersFitTheCgisReplyBuffer) {
 }
 
 TEST(Vanuaudiod_Replies, LargePageIsCutToFitAndTotalStillCountsAll) {
-    std::vector<MediaServer> servers;
-    for (int i = 0; i < 40; ++i)
-        servers.push_back(WorstCaseServer(i));
+    const std::vector<MediaServer> servers = WorstCaseServers(40);
     bool search = false;
     const std::string reply = Answer({16, "0 40"}, servers, search);
     EXPECT_LE(reply.size(), kMaxReplySize);

@@ -45,16 +45,6 @@ void ExpectNoServerPath(const CgiResult& r) {
     EXPECT_EQ(r.body.find("/tmp"), std::string::npos) << r.body;
 }
 
-DidlObject TrackObject(const std::string& parentId, const std::string& id, const std::string& res) {
-    DidlObject object;
-    object.container = false;
-    object.id = id;
-    object.parentId = parentId;
-    object.title = id;
-    object.res = res;
-    return object;
-}
-
 class LibraryApi : public ::testing::Test {
   protected:
     void SetUp() override { StandardFixture(); }
@@ -98,9 +88,9 @@ TEST_F(LibraryApi, ItemsThatAreNotTracksOfTheLibraryAreCountedNotListed) {
     ContentTree tree;
     tree.AddItem("music_all", "2", "in the library");
     // The server names itself by its network address.
-    tree.Add(TrackObject("music_all", "track:4", "http://192.0.2.1:50003/media/4.mp3"));
+    tree.Add(DidlItem("music_all", "track:4", "track:4", "http://192.0.2.1:50003/media/4.mp3"));
     tree.AddItem("music_all", "99", "not in the library");
-    tree.Add(TrackObject("music_all", "x", "http://192.0.2.1:50003/elsewhere/1.mp3"));
+    tree.Add(DidlItem("music_all", "x", "x", "http://192.0.2.1:50003/elsewhere/1.mp3"));
     server.ServeTree(tree);
     ASSERT_TRUE(server.Start());
     const CgiResult r = ListNode("musiclib_music_all");

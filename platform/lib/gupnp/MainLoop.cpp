@@ -12,27 +12,22 @@ gboolean Source::Dispatch(gpointer data) {
 
 // Attached to the thread-default main context (the global default one on the main thread), so
 // that a loop on a thread of its own runs its sources.
-guint Source::Attach(GSource* source, Callback* callback) {
-    g_source_set_callback(source, &Source::Dispatch, callback, nullptr);
-    const guint id = g_source_attach(source, g_main_context_get_thread_default());
+Source Source::Attach(GSource* source, Callback callback) {
+    Source attached;
+    attached.callback_ = std::make_unique<Callback>(std::move(callback));
+    attached.context_ = g_main_context_ref_thread_default();
+    g_source_set_callback(source, &Source::Dispatch, attached.callback_.get(), nullptr);
+    attached.id_ = g_source_attach(source, attached.context_);
     g_source_unref(source);
-    return id;
+    return attached;
 }
 
 Source Source::Timeout(unsigned milliseconds, Callback callback) {
-    Source source;
-    source.callback_ = std::make_unique<Callback>(std::move(callback));
-    source.context_ = g_main_context_ref_thread_default();
-    source.id_ = Attach(g_timeout_source_new(milliseconds), source.callback_.get());
-    return source;
+    return Attach(g_timeout_source_new(milliseconds), std::move(callback));
 }
 
 Source Source::UnixSignal(int signalNumber, Callback callback) {
-    Source source;
-    source.callback_ = std::make_unique<Callback>(std::move(callback));
-    source.context_ = g_main_context_ref_thread_default();
-    source.id_ = Attach(g_unix_signal_source_new(signalNumber), source.callback_.get());
-    return source;
+    return Attach(g_unix_signal_source_new(signalNumber), std::move(callback));
 }
 
 bool Source::active() const {

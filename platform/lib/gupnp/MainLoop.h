@@ -61,7 +61,8 @@ class Source {
 
   private:
     static gboolean Dispatch(gpointer data);
-    static guint Attach(GSource* source, Callback* callback);
+    // Takes over `source` (one reference) and attaches it with `callback`.
+    static Source Attach(GSource* source, Callback callback);
 
     guint id_ = 0;
     GMainContext* context_ = nullptr;  // where the source is attached
