@@ -29,6 +29,16 @@ constexpr MimeEntry kMimeTypes[] = {
 // (0x00400000) and streaming (0x01000000) transfer modes; 24 reserved hex digits follow.
 constexpr const char* kDlnaAudioFlags = "01700000000000000000000000000000";
 
+// The entry of an extension (without the dot, any letter case); nullptr when it is no audio type.
+const MimeEntry* FindAudioType(std::string_view extension) {
+    for (const MimeEntry& entry : kMimeTypes) {
+        if (extension.size() == std::strlen(entry.extension) &&
+            strncasecmp(extension.data(), entry.extension, extension.size()) == 0)
+            return &entry;
+    }
+    return nullptr;
+}
+
 }  // namespace
 
 std::string AudioSharePath() {
@@ -42,12 +52,7 @@ std::string AudioSharePath() {
 }
 
 bool IsAudioExtension(std::string_view extension) {
-    for (const MimeEntry& entry : kMimeTypes) {
-        if (extension.size() == std::strlen(entry.extension) &&
-            strncasecmp(extension.data(), entry.extension, extension.size()) == 0)
-            return true;
-    }
-    return false;
+    return FindAudioType(extension) != nullptr;
 }
 
 bool IsIndexableAudioFile(const std::string& path) {
@@ -66,12 +71,8 @@ std::string LowerExtension(const std::string& path) {
 }
 
 const char* MimeTypeOfPath(const std::string& path) {
-    const std::string extension = LowerExtension(path);
-    for (const MimeEntry& entry : kMimeTypes) {
-        if (extension == entry.extension)
-            return entry.mime;
-    }
-    return "application/octet-stream";
+    const MimeEntry* type = FindAudioType(LowerExtension(path));
+    return type != nullptr ? type->mime : "application/octet-stream";
 }
 
 const char* DlnaProfileOfPath(const std::string& path) {
