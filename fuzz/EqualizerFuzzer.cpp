@@ -8,7 +8,7 @@
 #include <cstring>
 #include <string>
 
-#include "src/daemon/AudioDaemon.h"
+#include "src/daemonclient/AudioDaemon.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     const std::string input(reinterpret_cast<const char*>(data), size);

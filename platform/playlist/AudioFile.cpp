@@ -30,7 +30,7 @@
 #include "common/util/Utf8.h"
 #include "platform/lib/sqlite/Database.h"
 #include "platform/paths/PlatformPaths.h"
-#include "platform/playlist/LibraryDatabase.h"
+#include "platform/medialib/LibraryDatabase.h"
 
 namespace harmona::playlist {
 namespace {
@@ -343,8 +343,8 @@ bool ReplaceFile(const char* path, const std::string& text) {
 int CreateRandomPlaylist(const char* databasePath, const char* path, int count) {
     if (path == nullptr || count < 1)
         return 0;
-    LibraryOpenResult opened = OpenLibrary(databasePath);
-    if (opened.status != LibraryStatus::ok)
+    medialib::LibraryOpenResult opened = medialib::OpenLibrary(databasePath);
+    if (opened.status != medialib::LibraryStatus::ok)
         return 0;
     std::vector<Track> tracks;
     if (!DrawTracks(opened.db, static_cast<std::size_t>(count), tracks) || tracks.empty())

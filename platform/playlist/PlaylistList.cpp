@@ -15,7 +15,7 @@
 #include "common/io/DirectoryReader.h"
 #include "platform/lib/sqlite/Database.h"
 #include "platform/paths/PlatformPaths.h"
-#include "platform/playlist/LibraryDatabase.h"
+#include "platform/medialib/LibraryDatabase.h"
 
 namespace harmona::playlist {
 namespace {
@@ -59,10 +59,10 @@ std::pair<std::size_t, std::size_t> Window(std::size_t count, int offset, int li
 
 int ListSharedPlaylists(const char* path, PLAYLIST_INFO** head, int offset, int limit) {
     *head = nullptr;
-    LibraryOpenResult opened = OpenLibrary(path);
-    if (opened.status == LibraryStatus::missing)
+    medialib::LibraryOpenResult opened = medialib::OpenLibrary(path);
+    if (opened.status == medialib::LibraryStatus::missing)
         return 0;
-    if (opened.status != LibraryStatus::ok)
+    if (opened.status != medialib::LibraryStatus::ok)
         return -1;
 
     sqlite::Statement select = opened.db.Prepare(

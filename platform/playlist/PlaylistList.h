@@ -21,9 +21,6 @@ int VANUPlaylistListAll(PLAYLIST_INFO** head, int offset, int limit, int reserve
 
 namespace harmona::playlist {
 
-// Opening of library.db as every request does it: read-only, waiting this long for a writer.
-inline constexpr int kLibraryBusyTimeoutMs = 3000;
-
 // The same listing as VANUPlaylistListAll, from the database at `path`.
 int ListSharedPlaylists(const char* path, PLAYLIST_INFO** head, int offset, int limit);
 

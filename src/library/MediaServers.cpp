@@ -8,7 +8,7 @@
 #include <cstring>
 #include <string>
 
-#include "src/daemon/AudioDaemon.h"
+#include "src/daemonclient/AudioDaemon.h"
 #include "src/handler/HarmonaHandler.h"
 
 namespace {

@@ -61,8 +61,8 @@ std::optional<std::int64_t> TrackIdOfLocalResource(const std::string& url) {
 }
 
 bool TrackCatalog::Open(const char* path) {
-    library_ = playlist::OpenLibrary(path);
-    if (library_.status != playlist::LibraryStatus::ok)
+    library_ = medialib::OpenLibrary(path);
+    if (library_.status != medialib::LibraryStatus::ok)
         return false;
     // One read transaction for all the lookups of the request: a consistent view while the indexer
     // writes, and no lock taken and dropped per track (thousands for a large container).

@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/playlist/LibraryDatabase.h"
+#include "platform/medialib/LibraryDatabase.h"
 
 namespace harmona::webapi {
 
@@ -59,7 +59,7 @@ class TrackCatalog {
   private:
     std::optional<Track> StepOne(sqlite::Statement& statement);
 
-    playlist::LibraryOpenResult library_;
+    medialib::LibraryOpenResult library_;
     sqlite::Statement byId_;
     sqlite::Statement byPath_;
 };

@@ -20,7 +20,7 @@ AnnouncerFacts From(const std::string& source) {
 
 }  // namespace
 
-TEST(Vanuaudiod_Announcement, AliveNotifyGivesUdnLocationAndMaxAge) {
+TEST(ServerAnnouncement, AliveNotifyGivesUdnLocationAndMaxAge) {
     const std::string usn = std::string("uuid:abc::") + kType;
     const Announcement a = ReadAnnouncement(
         kType, "ssdp:alive", usn.c_str(), "http://10.0.0.2:8200/d.xml", "no-cache, max-age = 130");
@@ -30,7 +30,7 @@ TEST(Vanuaudiod_Announcement, AliveNotifyGivesUdnLocationAndMaxAge) {
     EXPECT_EQ(a.maxAgeSeconds, 130);
 }
 
-TEST(Vanuaudiod_Announcement, SearchAnswersAndByebyesAndOtherTypes) {
+TEST(ServerAnnouncement, SearchAnswersAndByebyesAndOtherTypes) {
     EXPECT_EQ(ReadAnnouncement("urn:schemas-upnp-org:device:MediaServer:4", nullptr, "uuid:x",
                                "http://10.0.0.2/", "max-age=60")
                   .kind,
@@ -50,12 +50,12 @@ TEST(Vanuaudiod_Announcement, SearchAnswersAndByebyesAndOtherTypes) {
               AnnouncementKind::other);
 }
 
-TEST(Vanuaudiod_Announcement, ALocationOnTheSendersOwnAddressIsAccepted) {
+TEST(ServerAnnouncement, ALocationOnTheSendersOwnAddressIsAccepted) {
     EXPECT_EQ(RefuseLocation("http://10.77.0.2:8200/rootDesc.xml", From("10.77.0.2")), "");
     EXPECT_EQ(RefuseLocation("http://[2001:db8::5]:80/d.xml", From("2001:db8::5")), "");
 }
 
-TEST(Vanuaudiod_Announcement, ALocationOnAnotherHostIsRefused) {
+TEST(ServerAnnouncement, ALocationOnAnotherHostIsRefused) {
     EXPECT_NE(RefuseLocation("http://10.77.0.3/d.xml", From("10.77.0.2")), "");
     EXPECT_NE(RefuseLocation("http://127.0.0.1:631/", From("10.77.0.2")), "");
     EXPECT_NE(RefuseLocation("http://[::1]:8080/", From("10.77.0.2")), "");
@@ -64,7 +64,7 @@ TEST(Vanuaudiod_Announcement, ALocationOnAnotherHostIsRefused) {
     EXPECT_NE(RefuseLocation("http://user@10.77.0.2/", From("10.77.0.2")), "");
 }
 
-TEST(Vanuaudiod_Announcement,
+TEST(ServerAnnouncement,
      LoopbackMulticastBroadcastAndUnspecifiedAreRefusedEvenFromThemselves) {
     for (const char* address : {"127.0.0.1", "224.0.0.1", "239.255.255.250", "255.255.255.255",
                                 "10.77.0.255", "0.0.0.0"}) {
@@ -75,7 +75,7 @@ TEST(Vanuaudiod_Announcement,
     EXPECT_NE(RefuseLocation("http://[ff02::c]/d.xml", From("ff02::c")), "");
 }
 
-TEST(Vanuaudiod_Announcement, LinkLocalIsAcceptedOnlyOnALinkLocalOnlyInterface) {
+TEST(ServerAnnouncement, LinkLocalIsAcceptedOnlyOnALinkLocalOnlyInterface) {
     AnnouncerFacts facts = From("169.254.10.20");
     EXPECT_NE(RefuseLocation("http://169.254.10.20/d.xml", facts), "");
     facts.linkLocalAllowed = true;

@@ -86,7 +86,7 @@ bool HasServer(const Json::Value& list, const std::string& name) {
     return false;
 }
 
-class Vanuaudiod : public ::testing::Test {
+class AudioDaemon : public ::testing::Test {
   protected:
     void SetUp() override { ASSERT_TRUE(peer_); }
     // The daemon of the test ends the way a service manager ends it: SIGTERM, then a clean exit
@@ -106,7 +106,7 @@ class Vanuaudiod : public ::testing::Test {
 
 }  // namespace
 
-TEST_F(Vanuaudiod, SocketIsOpenToTheCgiUserAndAStaleOneIsReplaced) {
+TEST_F(AudioDaemon, SocketIsOpenToTheCgiUserAndAStaleOneIsReplaced) {
     ASSERT_TRUE(LeaveStaleSocket());
     daemon_ = StartDaemon();
     struct stat info {};
@@ -120,7 +120,7 @@ TEST_F(Vanuaudiod, SocketIsOpenToTheCgiUserAndAStaleOneIsReplaced) {
     EXPECT_TRUE(Call(16, "0 10").answered);
 }
 
-TEST_F(Vanuaudiod, ASecondDaemonDoesNotTakeOverALiveSocket) {
+TEST_F(AudioDaemon, ASecondDaemonDoesNotTakeOverALiveSocket) {
     daemon_ = StartDaemon();
     Process second = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/second.log");
     int status = 0;
@@ -130,7 +130,7 @@ TEST_F(Vanuaudiod, ASecondDaemonDoesNotTakeOverALiveSocket) {
     EXPECT_TRUE(Call(16, "0 10").answered);
 }
 
-TEST_F(Vanuaudiod, AFileThatIsNotASocketIsLeftAlone) {
+TEST_F(AudioDaemon, AFileThatIsNotASocketIsLeftAlone) {
     WriteFile(kSocket, "precious");
     Process daemon = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/d.log");
     int status = 0;
@@ -139,7 +139,7 @@ TEST_F(Vanuaudiod, AFileThatIsNotASocketIsLeftAlone) {
     EXPECT_EQ(ReadFile(kSocket), "precious");
 }
 
-TEST_F(Vanuaudiod, SigtermAndSigintStopItCleanlyAndRemoveTheSocket) {
+TEST_F(AudioDaemon, SigtermAndSigintStopItCleanlyAndRemoveTheSocket) {
     for (int signal : {SIGTERM, SIGINT}) {
         daemon_ = StartDaemon();
         const int status = daemon_.Stop(signal, 5000);
@@ -149,7 +149,7 @@ TEST_F(Vanuaudiod, SigtermAndSigintStopItCleanlyAndRemoveTheSocket) {
     }
 }
 
-TEST_F(Vanuaudiod, CommandFourteenIsAnsweredAtOnceAndTheListStaysAnswerableDuringTheSearch) {
+TEST_F(AudioDaemon, CommandFourteenIsAnsweredAtOnceAndTheListStaysAnswerableDuringTheSearch) {
     daemon_ = StartDaemon();
     const Exchange prepare = Call(14);
     EXPECT_EQ(prepare.reply, "{\"success\": true}");
@@ -162,7 +162,7 @@ TEST_F(Vanuaudiod, CommandFourteenIsAnsweredAtOnceAndTheListStaysAnswerableDurin
     }
 }
 
-TEST_F(Vanuaudiod, OtherCommandCodesAreUnsupported) {
+TEST_F(AudioDaemon, OtherCommandCodesAreUnsupported) {
     daemon_ = StartDaemon();
     for (int32_t code : {1, 15, 17, 19, 27, 35, 38, 99, -7}) {
         const Json::Value reply = Reply(Call(code, "1 2"));
@@ -171,7 +171,7 @@ TEST_F(Vanuaudiod, OtherCommandCodesAreUnsupported) {
     }
 }
 
-TEST_F(Vanuaudiod, GarbageAndHalfRecordsDoNotUpsetLaterClients) {
+TEST_F(AudioDaemon, GarbageAndHalfRecordsDoNotUpsetLaterClients) {
     daemon_ = StartDaemon();
     // Garbage, then the client stops sending: a short request.
     Json::Value reply;
@@ -201,7 +201,7 @@ TEST_F(Vanuaudiod, GarbageAndHalfRecordsDoNotUpsetLaterClients) {
     EXPECT_EQ(waitpid(daemon_.pid(), nullptr, WNOHANG), 0);
 }
 
-TEST_F(Vanuaudiod, FiftyClientsAtOnceAreAllAnsweredWithinHalfASecond) {
+TEST_F(AudioDaemon, FiftyClientsAtOnceAreAllAnsweredWithinHalfASecond) {
     daemon_ = StartDaemon();
     FakeMediaServers fake;
     for (int i = 0; i < 12; ++i) {
@@ -229,7 +229,7 @@ TEST_F(Vanuaudiod, FiftyClientsAtOnceAreAllAnsweredWithinHalfASecond) {
     }
 }
 
-TEST_F(Vanuaudiod, FindsARealMiniDlnaWithItsContentDirectory) {
+TEST_F(AudioDaemon, FindsARealMiniDlnaWithItsContentDirectory) {
     daemon_ = StartDaemon();
     Process minidlna = StartMiniDlna(peer_, "Shelf MiniDLNA", 8200);
     EXPECT_TRUE(Call(14).answered);
@@ -245,7 +245,7 @@ TEST_F(Vanuaudiod, FindsARealMiniDlnaWithItsContentDirectory) {
     EXPECT_EQ(reply["total"], 1);
 }
 
-TEST_F(Vanuaudiod, AStoppedServerDisappearsAfterItsByebye) {
+TEST_F(AudioDaemon, AStoppedServerDisappearsAfterItsByebye) {
     daemon_ = StartDaemon();
     Process minidlna = StartMiniDlna(peer_, "Leaving MiniDLNA", 8201);
     Call(14);
@@ -265,7 +265,7 @@ TEST_F(Vanuaudiod, AStoppedServerDisappearsAfterItsByebye) {
     EXPECT_EQ(reply["total"], 0);
 }
 
-TEST_F(Vanuaudiod, AServerThatStopsAnnouncingExpiresAfterItsMaxAge) {
+TEST_F(AudioDaemon, AServerThatStopsAnnouncingExpiresAfterItsMaxAge) {
     daemon_ = StartDaemon();
     FakeMediaServers fake;
     fake.Add("uuid:short", FakeMediaServers::DescriptionXml("uuid:short", "Short Lived", "/cd"));
@@ -282,7 +282,7 @@ TEST_F(Vanuaudiod, AServerThatStopsAnnouncingExpiresAfterItsMaxAge) {
     EXPECT_EQ(reply["list"][0]["friendly_name"], "Long Lived");
 }
 
-TEST_F(Vanuaudiod, ServersAreListedInAStableOrderAndPaged) {
+TEST_F(AudioDaemon, ServersAreListedInAStableOrderAndPaged) {
     daemon_ = StartDaemon();
     FakeMediaServers fake;
     // Announced in a scrambled order; two share a name.
@@ -306,7 +306,7 @@ TEST_F(Vanuaudiod, ServersAreListedInAStableOrderAndPaged) {
               "http://10.77.0.1:" + std::to_string(fake.Port()) + "/cd/uuid:a1");
 }
 
-TEST_F(Vanuaudiod, ByebyeOfOneServerLeavesTheOthers) {
+TEST_F(AudioDaemon, ByebyeOfOneServerLeavesTheOthers) {
     daemon_ = StartDaemon();
     FakeMediaServers fake;
     for (const char* udn : {"uuid:stay", "uuid:go"}) {
@@ -322,7 +322,7 @@ TEST_F(Vanuaudiod, ByebyeOfOneServerLeavesTheOthers) {
     EXPECT_EQ(reply["list"][0]["udn"], "uuid:stay");
 }
 
-TEST_F(Vanuaudiod, DevicesWithoutAUsableDescriptionAreNotListed) {
+TEST_F(AudioDaemon, DevicesWithoutAUsableDescriptionAreNotListed) {
     daemon_ = StartDaemon();
     FakeMediaServers fake;
     fake.Add("uuid:broken", "<root><device><deviceType>nonsense");
@@ -342,7 +342,7 @@ TEST_F(Vanuaudiod, DevicesWithoutAUsableDescriptionAreNotListed) {
     EXPECT_EQ(reply["list"][0]["udn"], "uuid:good");
 }
 
-TEST_F(Vanuaudiod, HostileNamesAreCleanedAndRepliesStayInsideTheClientsBuffer) {
+TEST_F(AudioDaemon, HostileNamesAreCleanedAndRepliesStayInsideTheClientsBuffer) {
     daemon_ = StartDaemon();
     FakeMediaServers fake;
     // Long names of quotes (twice as long once escaped) and invalid UTF-8.
@@ -379,7 +379,7 @@ CgiResult RefreshMediaServers() {
 
 }  // namespace
 
-TEST_F(Vanuaudiod, ServersOnTheNetworkAppearAsMediaServerNodesThroughTheCgi) {
+TEST_F(AudioDaemon, ServersOnTheNetworkAppearAsMediaServerNodesThroughTheCgi) {
     StandardFixture();
     daemon_ = StartDaemon();
     Process minidlna = StartMiniDlna(peer_, "Kitchen MiniDLNA", 8200);
@@ -421,7 +421,7 @@ TEST_F(Vanuaudiod, ServersOnTheNetworkAppearAsMediaServerNodesThroughTheCgi) {
     EXPECT_NE(FindNode(children, namelessId), nullptr);
 }
 
-TEST_F(Vanuaudiod, AStoppedServerLeavesTheCgisListAfterItsByebye) {
+TEST_F(AudioDaemon, AStoppedServerLeavesTheCgisListAfterItsByebye) {
     StandardFixture();
     daemon_ = StartDaemon();
     Process minidlna = StartMiniDlna(peer_, "Garage MiniDLNA", 8202);
@@ -437,7 +437,7 @@ TEST_F(Vanuaudiod, AStoppedServerLeavesTheCgisListAfterItsByebye) {
     EXPECT_EQ(after.json["items"].size(), 0u) << after.body;
 }
 
-TEST_F(Vanuaudiod, TwentyFiveServersArePagedIntoTwentyFiveNodesByTheCgi) {
+TEST_F(AudioDaemon, TwentyFiveServersArePagedIntoTwentyFiveNodesByTheCgi) {
     StandardFixture();
     daemon_ = StartDaemon();
     FakeMediaServers fake;
@@ -456,7 +456,7 @@ TEST_F(Vanuaudiod, TwentyFiveServersArePagedIntoTwentyFiveNodesByTheCgi) {
         EXPECT_EQ(items[i]["text"], "Server " + std::to_string(100 + i));
 }
 
-TEST_F(Vanuaudiod, AServerAlreadyRunningIsFoundByTheSearchAtStart) {
+TEST_F(AudioDaemon, AServerAlreadyRunningIsFoundByTheSearchAtStart) {
     // MiniDLNA starts first; its start-up announcements go out before the daemon listens, and its
     // next ones are a minute away: only the daemon's own M-SEARCH can find it.
     Process minidlna = StartMiniDlna(peer_, "Early MiniDLNA", 8203);
@@ -475,7 +475,7 @@ TEST_F(Vanuaudiod, AServerAlreadyRunningIsFoundByTheSearchAtStart) {
     EXPECT_EQ(reply["list"][0]["friendly_name"], "Early MiniDLNA");
 }
 
-TEST_F(Vanuaudiod, CommandFourteenSendsANewSearch) {
+TEST_F(AudioDaemon, CommandFourteenSendsANewSearch) {
     FakeMediaServers fake;
     fake.Add("uuid:quiet", FakeMediaServers::DescriptionXml("uuid:quiet", "Quiet", "/cd"));
     daemon_ = StartDaemon();
@@ -536,7 +536,7 @@ constexpr const char* kMediadNodeId = "mediaserver_http://10.77.0.2:50003/Conten
 
 }  // namespace
 
-TEST_F(Vanuaudiod, HarmonaMediadAndMiniDlnaBothAppearAsMediaServerNodesThroughTheCgi) {
+TEST_F(AudioDaemon, HarmonaMediadAndMiniDlnaBothAppearAsMediaServerNodesThroughTheCgi) {
     StandardFixture();
     daemon_ = StartDaemon();
     Process mediad = StartMediad(peer_);
@@ -578,7 +578,7 @@ TEST_F(Vanuaudiod, HarmonaMediadAndMiniDlnaBothAppearAsMediaServerNodesThroughTh
     EXPECT_EQ((*parser.GetResult())[0]->getValueByKey("id"), "music_all");
 }
 
-TEST_F(Vanuaudiod, AStoppedHarmonaMediadLeavesTheListAfterItsByebye) {
+TEST_F(AudioDaemon, AStoppedHarmonaMediadLeavesTheListAfterItsByebye) {
     StandardFixture();
     daemon_ = StartDaemon();
     Process mediad = StartMediad(peer_);
@@ -618,7 +618,7 @@ bool WaitForLog(const std::string& part, int timeoutMs) {
 
 }  // namespace
 
-TEST_F(Vanuaudiod, ANotifyPointingAtLoopbackOrAnotherHostMakesNoRequestAndListsNothing) {
+TEST_F(AudioDaemon, ANotifyPointingAtLoopbackOrAnotherHostMakesNoRequestAndListsNothing) {
     daemon_ = StartDaemon();
     ConnectionCounter loopback("127.0.0.1");
     ConnectionCounter elsewhere("10.77.0.12");
@@ -651,7 +651,7 @@ TEST_F(Vanuaudiod, ANotifyPointingAtLoopbackOrAnotherHostMakesNoRequestAndListsN
         << log;
 }
 
-TEST_F(Vanuaudiod, AThousandForgedAnnouncementsDoNotKeepARealServerOut) {
+TEST_F(AudioDaemon, AThousandForgedAnnouncementsDoNotKeepARealServerOut) {
     daemon_ = StartDaemon();
     // Forged devices on the forger's own address, whose descriptions never come.
     ConnectionCounter tarpit(kHostAddress);
@@ -675,7 +675,7 @@ TEST_F(Vanuaudiod, AThousandForgedAnnouncementsDoNotKeepARealServerOut) {
     EXPECT_TRUE(WaitForLog("announces 16 devices already", 2000));
 }
 
-TEST_F(Vanuaudiod, ASocketPlantedByAnotherUserKeepsItFromStartingAndItSaysWhy) {
+TEST_F(AudioDaemon, ASocketPlantedByAnotherUserKeepsItFromStartingAndItSaysWhy) {
     ASSERT_TRUE(LeaveStaleSocket());
     ASSERT_EQ(lchown(kSocket, 12345, 12345), 0);
     Process daemon = Spawn({DaemonProgram(), "--interface", kHostInterface}, "/tmp/d.log");
@@ -692,7 +692,7 @@ TEST_F(Vanuaudiod, ASocketPlantedByAnotherUserKeepsItFromStartingAndItSaysWhy) {
     EXPECT_EQ(info.st_uid, 12345u);
 }
 
-TEST_F(Vanuaudiod, SixHundredIdleConnectionsOfOneUserDoNotKeepTheListFromTheCgi) {
+TEST_F(AudioDaemon, SixHundredIdleConnectionsOfOneUserDoNotKeepTheListFromTheCgi) {
     StandardFixture();
     daemon_ = StartDaemon();
     FakeMediaServers fake;
@@ -736,7 +736,7 @@ TEST_F(Vanuaudiod, SixHundredIdleConnectionsOfOneUserDoNotKeepTheListFromTheCgi)
     EXPECT_EQ(refresh.json["items"][0]["text"], "The One");
 }
 
-TEST_F(Vanuaudiod, StartedBeforeItsInterfaceHasAnAddressItAnswersAtOnceAndFindsServersLater) {
+TEST_F(AudioDaemon, StartedBeforeItsInterfaceHasAnAddressItAnswersAtOnceAndFindsServersLater) {
     ASSERT_TRUE(RunCommand("ip addr flush dev va"));
     daemon_ = StartDaemon(kHostInterface, false);
     const Json::Value empty = Reply(Call(16, "0 10"));
@@ -758,7 +758,7 @@ TEST_F(Vanuaudiod, StartedBeforeItsInterfaceHasAnAddressItAnswersAtOnceAndFindsS
 
 // The host lacks a route for multicast: one line says so, and the searches, bound to the
 // interface, still find the servers.
-TEST_F(Vanuaudiod, WithoutAMulticastRouteOneLogLineSaysSoAndSearchesStillFindServers) {
+TEST_F(AudioDaemon, WithoutAMulticastRouteOneLogLineSaysSoAndSearchesStillFindServers) {
     ASSERT_TRUE(RunCommand("ip route del 224.0.0.0/4 dev va"));
     FakeMediaServers fake;
     fake.Add("uuid:quiet", FakeMediaServers::DescriptionXml("uuid:quiet", "Quiet", "/cd"));
@@ -821,7 +821,7 @@ void ExpectListedUnderItsNameAndGoneAfterItsByebye(Process& server, const std::s
 
 }  // namespace
 
-TEST_F(Vanuaudiod, GerberaIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByebye) {
+TEST_F(AudioDaemon, GerberaIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByebye) {
     StandardFixture();
     // Gerbera first: the start that writes its configuration announces it under its default
     // name, which is no part of this test.
@@ -831,7 +831,7 @@ TEST_F(Vanuaudiod, GerberaIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByeb
                                                   "/tmp/gerbera-49494/out.log");
 }
 
-TEST_F(Vanuaudiod, RygelIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByebye) {
+TEST_F(AudioDaemon, RygelIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByebye) {
     StandardFixture();
     daemon_ = StartDaemon();
     Process rygel = StartRygel(peer_, "Porch Rygel", 49600);

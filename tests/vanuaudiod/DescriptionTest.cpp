@@ -78,7 +78,7 @@ class OneShotServer {
 
 }  // namespace
 
-TEST(Vanuaudiod_Description, RelativeControlUrlIsResolvedAgainstTheLocation) {
+TEST(ServerDescription, RelativeControlUrlIsResolvedAgainstTheLocation) {
     MediaServer server;
     ASSERT_TRUE(ParseDeviceDescription(Description("", "/ctl/ContentDir"),
                                        "http://192.168.1.20:8200/rootDesc.xml", "uuid:abc",
@@ -88,7 +88,7 @@ TEST(Vanuaudiod_Description, RelativeControlUrlIsResolvedAgainstTheLocation) {
     EXPECT_EQ(server.ip, "192.168.1.20");
 }
 
-TEST(Vanuaudiod_Description, PathRelativeControlUrlUsesTheLocationsFolder) {
+TEST(ServerDescription, PathRelativeControlUrlUsesTheLocationsFolder) {
     MediaServer server;
     ASSERT_TRUE(ParseDeviceDescription(Description("", "cd/control"),
                                        "http://10.1.2.3:49152/desc/device.xml", "uuid:abc",
@@ -96,7 +96,7 @@ TEST(Vanuaudiod_Description, PathRelativeControlUrlUsesTheLocationsFolder) {
     EXPECT_EQ(server.controlUrl, "http://10.1.2.3:49152/desc/cd/control");
 }
 
-TEST(Vanuaudiod_Description, UrlBaseWinsOverTheLocation) {
+TEST(ServerDescription, UrlBaseWinsOverTheLocation) {
     MediaServer server;
     ASSERT_TRUE(ParseDeviceDescription(Description("http://10.9.9.9:5000/", "ContentDirectory/ctl"),
                                        "http://10.1.2.3:49152/desc.xml", "uuid:abc", server));
@@ -104,14 +104,14 @@ TEST(Vanuaudiod_Description, UrlBaseWinsOverTheLocation) {
     EXPECT_EQ(server.ip, "10.1.2.3");  // the ip is the location's host
 }
 
-TEST(Vanuaudiod_Description, AbsoluteControlUrlIsKept) {
+TEST(ServerDescription, AbsoluteControlUrlIsKept) {
     MediaServer server;
     ASSERT_TRUE(ParseDeviceDescription(Description("", "http://10.5.5.5:80/x"),
                                        "http://10.1.2.3:1/d.xml", "uuid:abc", server));
     EXPECT_EQ(server.controlUrl, "http://10.5.5.5:80/x");
 }
 
-TEST(Vanuaudiod_Description, EmbeddedMediaServerIsFound) {
+TEST(ServerDescription, EmbeddedMediaServerIsFound) {
     const std::string xml =
         "<root><device><deviceType>urn:schemas-upnp-org:device:Basic:1</deviceType>"
         "<friendlyName>NAS</friendlyName><UDN>uuid:root</UDN><deviceList><device>"
@@ -126,7 +126,7 @@ TEST(Vanuaudiod_Description, EmbeddedMediaServerIsFound) {
     EXPECT_EQ(server.controlUrl, "http://10.0.0.7:9000/ms/cd");
 }
 
-TEST(Vanuaudiod_Description, DocumentsWithoutAUsableContentDirectoryAreRefused) {
+TEST(ServerDescription, DocumentsWithoutAUsableContentDirectoryAreRefused) {
     MediaServer server;
     EXPECT_FALSE(ParseDeviceDescription("<root><device>", "http://10.0.0.1/d.xml", "", server));
     EXPECT_FALSE(ParseDeviceDescription(
@@ -139,14 +139,14 @@ TEST(Vanuaudiod_Description, DocumentsWithoutAUsableContentDirectoryAreRefused) 
                                         server));
 }
 
-TEST(Vanuaudiod_Description, NamesAreTrimmedCleanedAndBounded) {
+TEST(ServerDescription, NamesAreTrimmedCleanedAndBounded) {
     MediaServer server;
     ASSERT_TRUE(ParseDeviceDescription(Description("", "/cd", "\n  " + std::string(600, 'n') + " "),
                                        "http://10.0.0.1/d.xml", "", server));
     EXPECT_EQ(server.friendlyName.size(), 512u);
 }
 
-TEST(Vanuaudiod_Description, HostOfUrlHandlesPortsAndIpv6) {
+TEST(ServerDescription, HostOfUrlHandlesPortsAndIpv6) {
     EXPECT_EQ(HostOfUrl("http://10.0.0.1:8200/x"), "10.0.0.1");
     EXPECT_EQ(HostOfUrl("http://[fe80::1]:8200/x"), "fe80::1");
     EXPECT_EQ(HostOfUrl("http://host/x"), "host");
@@ -163,14 +163,14 @@ harmona::gupnp::FetchResult Fetch(const std::string& url, unsigned timeoutMs, st
 
 }  // namespace
 
-TEST(Vanuaudiod_DescriptionFetch, FetchesAWholeBody) {
+TEST(ServerDescriptionFetch, FetchesAWholeBody) {
     OneShotServer server("HTTP/1.1 200 OK\r\nContent-Length: 5\r\n\r\nhello");
     const auto r = Fetch(server.Url("/d.xml"), 2000, 1024);
     ASSERT_TRUE(r.ok) << r.error;
     EXPECT_EQ(r.body, "hello");
 }
 
-TEST(Vanuaudiod_DescriptionFetch, DecodesChunkedBodies) {
+TEST(ServerDescriptionFetch, DecodesChunkedBodies) {
     OneShotServer server(
         "HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n3\r\nabc\r\n2\r\nde\r\n0\r\n\r\n");
     const auto r = Fetch(server.Url("/"), 2000, 1024);
@@ -178,14 +178,14 @@ TEST(Vanuaudiod_DescriptionFetch, DecodesChunkedBodies) {
     EXPECT_EQ(r.body, "abcde");
 }
 
-TEST(Vanuaudiod_DescriptionFetch, RefusesBodiesOverTheBound) {
+TEST(ServerDescriptionFetch, RefusesBodiesOverTheBound) {
     OneShotServer server("HTTP/1.0 200 OK\r\n\r\n" + std::string(5000, 'x'));
     const auto r = Fetch(server.Url("/"), 2000, 1000);
     EXPECT_FALSE(r.ok);
     EXPECT_NE(r.error.find("longer than 1000"), std::string::npos) << r.error;
 }
 
-TEST(Vanuaudiod_DescriptionFetch, RefusesOtherStatusesRedirectsAndTruncatedBodies) {
+TEST(ServerDescriptionFetch, RefusesOtherStatusesRedirectsAndTruncatedBodies) {
     {
         OneShotServer server("HTTP/1.1 404 Not Found\r\nContent-Length: 0\r\n\r\n");
         EXPECT_FALSE(Fetch(server.Url("/"), 2000, 1000).ok);
@@ -204,7 +204,7 @@ TEST(Vanuaudiod_DescriptionFetch, RefusesOtherStatusesRedirectsAndTruncatedBodie
     }
 }
 
-TEST(Vanuaudiod_DescriptionFetch, GivesUpAtItsTimeLimit) {
+TEST(ServerDescriptionFetch, GivesUpAtItsTimeLimit) {
     OneShotServer server("", 0, true);
     const auto start = std::chrono::steady_clock::now();
     const auto r = Fetch(server.Url("/"), 300, 1000);
@@ -213,7 +213,7 @@ TEST(Vanuaudiod_DescriptionFetch, GivesUpAtItsTimeLimit) {
     EXPECT_LT(took, std::chrono::milliseconds(1200));
 }
 
-TEST(Vanuaudiod_DescriptionFetch, RefusedConnectionsAndOtherSchemesFail) {
+TEST(ServerDescriptionFetch, RefusedConnectionsAndOtherSchemesFail) {
     EXPECT_FALSE(Fetch("ftp://127.0.0.1:1/", 300, 10).ok);
     EXPECT_FALSE(Fetch("http://127.0.0.1:1/", 300, 10).ok);  // refused connection
 }

@@ -47,7 +47,7 @@ std::vector<MediaServer> WorstCaseServers(int count) {
 
 }  // namespace
 
-TEST(Vanuaudiod_RequestRecord, RecordIsReadWithNativeCommandAndTextUpToItsTerminator) {
+TEST(DaemonRequestRecord, RecordIsReadWithNativeCommandAndTextUpToItsTerminator) {
     const auto record = Record(16, "0 10");
     Request request;
     ASSERT_TRUE(ParseRequest(record.data(), record.size(), request));
@@ -55,7 +55,7 @@ TEST(Vanuaudiod_RequestRecord, RecordIsReadWithNativeCommandAndTextUpToItsTermin
     EXPECT_EQ(request.arguments, "0 10");
 }
 
-TEST(Vanuaudiod_RequestRecord, RecordWithoutTerminatorOrOfWrongSizeIsRefused) {
+TEST(DaemonRequestRecord, RecordWithoutTerminatorOrOfWrongSizeIsRefused) {
     std::vector<unsigned char> record(kRequestSize, 'x');
     Request request;
     EXPECT_FALSE(ParseRequest(record.data(), record.size(), request));
@@ -64,7 +64,7 @@ TEST(Vanuaudiod_RequestRecord, RecordWithoutTerminatorOrOfWrongSizeIsRefused) {
     EXPECT_FALSE(ParseRequest(nullptr, kRequestSize, request));
 }
 
-TEST(Vanuaudiod_Replies, PageArgumentsAreParsedStrictly) {
+TEST(DaemonReplies, PageArgumentsAreParsedStrictly) {
     int offset = -1;
     int count = -1;
     ASSERT_TRUE(ParsePageArguments("20 10", offset, count));
@@ -77,14 +77,14 @@ TEST(Vanuaudiod_Replies, PageArgumentsAreParsedStrictly) {
         EXPECT_FALSE(ParsePageArguments(bad, offset, count)) << '"' << bad << '"';
 }
 
-TEST(Vanuaudiod_Replies, CommandFourteenAnswersSuccessAndAsksForASearch) {
+TEST(DaemonReplies, CommandFourteenAnswersSuccessAndAsksForASearch) {
     bool search = false;
     const std::string reply = Answer({14, ""}, {}, search);
     EXPECT_TRUE(search);
     EXPECT_EQ(Parse(reply), Parse("{\"success\": true}"));
 }
 
-TEST(Vanuaudiod_Replies, OtherCommandsAreUnsupported) {
+TEST(DaemonReplies, OtherCommandsAreUnsupported) {
     for (int32_t code : {0, 1, 13, 15, 17, 19, 27, 38, -1, 1 << 30}) {
         bool search = true;
         const Json::Value reply = Parse(Answer({code, "1 2"}, {}, search));
@@ -94,14 +94,14 @@ TEST(Vanuaudiod_Replies, OtherCommandsAreUnsupported) {
     }
 }
 
-TEST(Vanuaudiod_Replies, BadPageArgumentsGetAnErrorReply) {
+TEST(DaemonReplies, BadPageArgumentsGetAnErrorReply) {
     bool search = true;
     const Json::Value reply = Parse(Answer({16, "ten"}, {Server("a", "uuid:a")}, search));
     EXPECT_EQ(reply["success"], false);
     EXPECT_FALSE(search);
 }
 
-TEST(Vanuaudiod_Replies, PageHoldsTheElementsFromOffsetAndTheWholeTotal) {
+TEST(DaemonReplies, PageHoldsTheElementsFromOffsetAndTheWholeTotal) {
     std::vector<MediaServer> servers;
     for (int i = 0; i < 25; ++i)
         servers.push_back(Server("S" + std::to_string(100 + i), "uuid:" + std::to_string(i)));
@@ -120,7 +120,7 @@ TEST(Vanuaudiod_Replies, PageHoldsTheElementsFromOffsetAndTheWholeTotal) {
     EXPECT_EQ(past["total"], 25);
 }
 
-TEST(Vanuaudiod_Replies, TenWorstCaseServersFitTheCgisReplyBuffer) {
+TEST(DaemonReplies, TenWorstCaseServersFitTheCgisReplyBuffer) {
     const std::vector<MediaServer> servers = WorstCaseServers(10);
     bool search = false;
     const std::string reply = Answer({16, "0 10"}, servers, search);
@@ -130,7 +130,7 @@ TEST(Vanuaudiod_Replies, TenWorstCaseServersFitTheCgisReplyBuffer) {
     EXPECT_EQ(page["list"][3]["friendly_name"].asString(), servers[3].friendlyName);
 }
 
-TEST(Vanuaudiod_Replies, LargePageIsCutToFitAndTotalStillCountsAll) {
+TEST(DaemonReplies, LargePageIsCutToFitAndTotalStillCountsAll) {
     const std::vector<MediaServer> servers = WorstCaseServers(40);
     bool search = false;
     const std::string reply = Answer({16, "0 40"}, servers, search);
@@ -143,7 +143,7 @@ TEST(Vanuaudiod_Replies, LargePageIsCutToFitAndTotalStillCountsAll) {
     EXPECT_EQ(page["list"][0]["udn"].asString(), servers[0].udn);
 }
 
-TEST(Vanuaudiod_Replies, JsonStringEscapesQuotesBackslashesAndControls) {
+TEST(DaemonReplies, JsonStringEscapesQuotesBackslashesAndControls) {
     EXPECT_EQ(JsonString("a\"b\\c\x01\n"), "\"a\\\"b\\\\c\\u0001\\u000a\"");
     EXPECT_EQ(JsonString("K\xC3\xBC"
                          "che"),
@@ -151,7 +151,7 @@ TEST(Vanuaudiod_Replies, JsonStringEscapesQuotesBackslashesAndControls) {
               "che\"");
 }
 
-TEST(Vanuaudiod_Replies, LongNamesAreCutOnAUtf8Boundary) {
+TEST(DaemonReplies, LongNamesAreCutOnAUtf8Boundary) {
     // "ü" is two bytes: a cut at 5 bytes must not split the third one.
     const std::string name = "\xC3\xBC\xC3\xBC\xC3\xBC";
     EXPECT_EQ(CleanText(name, 5), "\xC3\xBC\xC3\xBC");
@@ -160,7 +160,7 @@ TEST(Vanuaudiod_Replies, LongNamesAreCutOnAUtf8Boundary) {
     EXPECT_EQ(CleanText("a\xF0\x9F\x8E\xB5", 4), "a");
 }
 
-TEST(Vanuaudiod_Replies, InvalidUtf8AndControlCharactersBecomeSpaces) {
+TEST(DaemonReplies, InvalidUtf8AndControlCharactersBecomeSpaces) {
     EXPECT_EQ(CleanText("a\xFF"
                         "b\x01"
                         "c\xC3",

@@ -40,7 +40,7 @@ std::vector<std::string> Names(const ServerList& list) {
 
 }  // namespace
 
-TEST(Vanuaudiod_ServerList, ListedByFriendlyNameThenUdn) {
+TEST(DaemonServerList, ListedByFriendlyNameThenUdn) {
     ServerList list;
     const auto now = Clock::now();
     Add(list, "uuid:3", "Bravo", 100, now);
@@ -50,7 +50,7 @@ TEST(Vanuaudiod_ServerList, ListedByFriendlyNameThenUdn) {
               (std::vector<std::string>{"Alpha/uuid:2", "Bravo/uuid:1", "Bravo/uuid:3"}));
 }
 
-TEST(Vanuaudiod_ServerList, OnlyDescribedDevicesAreListed) {
+TEST(DaemonServerList, OnlyDescribedDevicesAreListed) {
     ServerList list;
     const auto now = Clock::now();
     EXPECT_TRUE(Seen(list, "uuid:a", "http://10.0.0.1/a", 100, now));
@@ -61,7 +61,7 @@ TEST(Vanuaudiod_ServerList, OnlyDescribedDevicesAreListed) {
     EXPECT_FALSE(Seen(list, "uuid:a", "http://10.0.0.1/a", 100, now));
 }
 
-TEST(Vanuaudiod_ServerList, ByebyeRemovesTheDevice) {
+TEST(DaemonServerList, ByebyeRemovesTheDevice) {
     ServerList list;
     const auto now = Clock::now();
     Add(list, "uuid:a", "A", 100, now);
@@ -70,7 +70,7 @@ TEST(Vanuaudiod_ServerList, ByebyeRemovesTheDevice) {
     EXPECT_EQ(Names(list), (std::vector<std::string>{"B/uuid:b"}));
 }
 
-TEST(Vanuaudiod_ServerList, DevicesExpireAfterTheirMaxAgeUnlessRenewed) {
+TEST(DaemonServerList, DevicesExpireAfterTheirMaxAgeUnlessRenewed) {
     ServerList list;
     const auto now = Clock::now();
     Add(list, "uuid:a", "A", 10, now);
@@ -83,7 +83,7 @@ TEST(Vanuaudiod_ServerList, DevicesExpireAfterTheirMaxAgeUnlessRenewed) {
     EXPECT_TRUE(list.Snapshot()->empty());
 }
 
-TEST(Vanuaudiod_ServerList, MovedDeviceIsUnlistedUntilDescribedAgain) {
+TEST(DaemonServerList, MovedDeviceIsUnlistedUntilDescribedAgain) {
     ServerList list;
     const auto now = Clock::now();
     Add(list, "uuid:a", "A", 100, now);
@@ -96,7 +96,7 @@ TEST(Vanuaudiod_ServerList, MovedDeviceIsUnlistedUntilDescribedAgain) {
     EXPECT_EQ(Names(list), (std::vector<std::string>{"New/uuid:a"}));
 }
 
-TEST(Vanuaudiod_ServerList, FailedDescriptionIsRetriedOnlyAfterAPause) {
+TEST(DaemonServerList, FailedDescriptionIsRetriedOnlyAfterAPause) {
     ServerList list;
     const auto now = Clock::now();
     ASSERT_TRUE(Seen(list, "uuid:a", "http://10.0.0.1/a", 100, now));
@@ -105,7 +105,7 @@ TEST(Vanuaudiod_ServerList, FailedDescriptionIsRetriedOnlyAfterAPause) {
     EXPECT_TRUE(Seen(list, "uuid:a", "http://10.0.0.1/a", 100, now + std::chrono::seconds(11)));
 }
 
-TEST(Vanuaudiod_ServerList, SnapshotTakenBeforeAChangeStaysAsItWas) {
+TEST(DaemonServerList, SnapshotTakenBeforeAChangeStaysAsItWas) {
     ServerList list;
     const auto now = Clock::now();
     Add(list, "uuid:a", "A", 100, now);
@@ -115,7 +115,7 @@ TEST(Vanuaudiod_ServerList, SnapshotTakenBeforeAChangeStaysAsItWas) {
     EXPECT_TRUE(list.Snapshot()->empty());
 }
 
-TEST(Vanuaudiod_ServerList, OneAddressHoldsAtMostSixteenDevices) {
+TEST(DaemonServerList, OneAddressHoldsAtMostSixteenDevices) {
     ServerList list;
     const auto now = Clock::now();
     for (std::size_t i = 0; i < kMaxDevicesPerAnnouncer; ++i) {
@@ -130,7 +130,7 @@ TEST(Vanuaudiod_ServerList, OneAddressHoldsAtMostSixteenDevices) {
     EXPECT_EQ(list.KnownCount(), kMaxDevicesPerAnnouncer + 1);
 }
 
-TEST(Vanuaudiod_ServerList, DevicesWithoutADescriptionGiveTheirSlotsUpSoon) {
+TEST(DaemonServerList, DevicesWithoutADescriptionGiveTheirSlotsUpSoon) {
     ServerList list;
     const auto now = Clock::now();
     ASSERT_TRUE(Seen(list, "uuid:fake", "http://10.0.0.1/fake", 86400, now));
@@ -145,7 +145,7 @@ TEST(Vanuaudiod_ServerList, DevicesWithoutADescriptionGiveTheirSlotsUpSoon) {
     EXPECT_TRUE(list.Knows("uuid:real"));
 }
 
-TEST(Vanuaudiod_ServerList, AFullTableMakesRoomForANewcomerByDroppingAnUndescribedDevice) {
+TEST(DaemonServerList, AFullTableMakesRoomForANewcomerByDroppingAnUndescribedDevice) {
     ServerList list;
     const auto now = Clock::now();
     for (std::size_t i = 0; i < kMaxKnownDevices; ++i) {
@@ -161,7 +161,7 @@ TEST(Vanuaudiod_ServerList, AFullTableMakesRoomForANewcomerByDroppingAnUndescrib
     EXPECT_EQ(Names(list), (std::vector<std::string>{"Real/uuid:real"}));
 }
 
-TEST(Vanuaudiod_ServerList, AByebyeFromAnotherAddressIsIgnored) {
+TEST(DaemonServerList, AByebyeFromAnotherAddressIsIgnored) {
     ServerList list;
     const auto now = Clock::now();
     Add(list, "uuid:a", "A", 100, now);

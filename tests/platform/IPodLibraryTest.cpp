@@ -46,7 +46,7 @@ std::string MountpointOf(const std::string& content) {
     return mountpoint;
 }
 
-TEST(Platform_IPod, ListsPlaylistsInDatabaseOrderWithoutTheMaster) {
+TEST(IPodLibrary, ListsPlaylistsInDatabaseOrderWithoutTheMaster) {
     const auto ids = AttachIPod({"Road trip", "Abendmusik & <Jazz>", "Workout"});
     std::vector<Entry> entries;
     ASSERT_EQ(GetAll(entries), 0);
@@ -60,7 +60,7 @@ TEST(Platform_IPod, ListsPlaylistsInDatabaseOrderWithoutTheMaster) {
     }
 }
 
-TEST(Platform_IPod, NoPlaylistGivesZeroAndANullHead) {
+TEST(IPodLibrary, NoPlaylistGivesZeroAndANullHead) {
     AttachIPod({});
     std::vector<Entry> entries;
     bool headWasNull = false;
@@ -68,7 +68,7 @@ TEST(Platform_IPod, NoPlaylistGivesZeroAndANullHead) {
     EXPECT_TRUE(headWasNull);
 }
 
-TEST(Platform_IPod, ADatabaseWithoutAMasterPlaylistListsEveryPlaylist) {
+TEST(IPodLibrary, ADatabaseWithoutAMasterPlaylistListsEveryPlaylist) {
     const auto ids = WriteIPodDatabaseWithIds(kDefaultIPodMountpoint, {{"One", 1}, {"Two", 2}},
                                               /*withMaster=*/false);
     WriteIPodMountpointFile(std::string(kDefaultIPodMountpoint) + "\n");
@@ -78,7 +78,7 @@ TEST(Platform_IPod, ADatabaseWithoutAMasterPlaylistListsEveryPlaylist) {
     EXPECT_EQ(entries, expected);
 }
 
-TEST(Platform_IPod, FailuresGiveMinusOneAndANullHead) {
+TEST(IPodLibrary, FailuresGiveMinusOneAndANullHead) {
     std::vector<Entry> entries;
     bool headWasNull = false;
     // No mountpoint file at all (no iPod attached).
@@ -97,7 +97,7 @@ TEST(Platform_IPod, FailuresGiveMinusOneAndANullHead) {
     EXPECT_TRUE(headWasNull);
 }
 
-TEST(Platform_IPod, TheMountpointIsTheFirstLineAndMustBeAbsolute) {
+TEST(IPodLibrary, TheMountpointIsTheFirstLineAndMustBeAbsolute) {
     EXPECT_EQ(MountpointOf("/media/ipod\n/other\n"), "/media/ipod");
     EXPECT_EQ(MountpointOf("/media/ipod"), "/media/ipod");
     EXPECT_EQ(MountpointOf("/media/ipod\r\n"), "/media/ipod");
@@ -111,7 +111,7 @@ TEST(Platform_IPod, TheMountpointIsTheFirstLineAndMustBeAbsolute) {
     EXPECT_EQ(MountpointOf(std::string("/media/ip\0od\n", 13)), "<refused>");
 }
 
-TEST(Platform_IPod, TheMountpointLineIsReadWithinItsBound) {
+TEST(IPodLibrary, TheMountpointLineIsReadWithinItsBound) {
     const std::string longest = "/" + std::string(harmona::ipod::kMaxMountpointBytes - 1, 'd');
     EXPECT_EQ(MountpointOf(longest + "\n"), longest);
     EXPECT_EQ(MountpointOf(longest), longest);
@@ -123,7 +123,7 @@ TEST(Platform_IPod, TheMountpointLineIsReadWithinItsBound) {
     EXPECT_EQ(MountpointOf(longest + std::string(100000, 'd')), "<refused>");
 }
 
-TEST(Platform_IPod, OnlyARegularMountpointFileIsRead) {
+TEST(IPodLibrary, OnlyARegularMountpointFileIsRead) {
     std::string mountpoint;
     EXPECT_FALSE(harmona::ipod::ReadMountpoint(kIPodMountpointFile, mountpoint));  // missing
     MakeDirs(kIPodMountpointFile);
@@ -136,7 +136,7 @@ TEST(Platform_IPod, OnlyARegularMountpointFileIsRead) {
     EXPECT_EQ(GetAll(entries), -1);
 }
 
-TEST(Platform_IPod, AMountpointFileThroughASymbolicLinkIsFollowed) {
+TEST(IPodLibrary, AMountpointFileThroughASymbolicLinkIsFollowed) {
     const auto ids = AttachIPod({"Linked"});
     WriteFile("/usr/vanu/elsewhere", std::string(kDefaultIPodMountpoint) + "\n");
     ASSERT_EQ(unlink(kIPodMountpointFile), 0);
@@ -146,7 +146,7 @@ TEST(Platform_IPod, AMountpointFileThroughASymbolicLinkIsFollowed) {
     EXPECT_EQ(entries, (std::vector<Entry>{{"Linked", IPodKey(ids[0])}}));
 }
 
-TEST(Platform_IPod, NamesAreCutTo254BytesOnACharacterBoundary) {
+TEST(IPodLibrary, NamesAreCutTo254BytesOnACharacterBoundary) {
     std::string twoByte;
     for (int i = 0; i < 150; ++i)
         twoByte += "é";  // 300 bytes; 254 is a boundary
@@ -165,7 +165,7 @@ TEST(Platform_IPod, NamesAreCutTo254BytesOnACharacterBoundary) {
     EXPECT_EQ(entries[2].name, threeByte.substr(0, 253));
 }
 
-TEST(Platform_IPod, ThePluginLoadsAndListsDirectly) {
+TEST(IPodLibrary, ThePluginLoadsAndListsDirectly) {
     const auto ids = AttachIPod({"Direct", "Call"});
     const harmona::plugin::Plugin plugin =
         harmona::plugin::Plugin::OpenBesideProgram(HARMONA_IPOD_PLUGIN_FILE);
@@ -213,7 +213,7 @@ class PluginHidden {
     bool mounted_ = false;
 };
 
-TEST(Platform_IPod, AMissingPluginIsAFailure) {
+TEST(IPodLibrary, AMissingPluginIsAFailure) {
     AttachIPod({"Unreadable without its reader"});
     {
         PluginHidden hidden;

@@ -7,8 +7,8 @@
 #include <string>
 #include <vector>
 
-#include "src/daemon/AudioDaemon.h"
-#include "tests/daemon/DaemonTestSupport.h"
+#include "src/daemonclient/AudioDaemon.h"
+#include "tests/daemonclient/DaemonTestSupport.h"
 #include "tests/harness/Fixtures.h"
 
 using namespace harmona::test;

@@ -1,12 +1,10 @@
-#include "platform/playlist/LibraryDatabase.h"
+#include "platform/medialib/LibraryDatabase.h"
 
 #include <sys/stat.h>
 
 #include <cerrno>
 
-#include "platform/playlist/PlaylistList.h"
-
-namespace harmona::playlist {
+namespace harmona::medialib {
 
 LibraryOpenResult OpenLibrary(const char* path) {
     LibraryOpenResult result;
@@ -24,4 +22,4 @@ LibraryOpenResult OpenLibrary(const char* path) {
     return result;
 }
 
-}  // namespace harmona::playlist
+}  // namespace harmona::medialib

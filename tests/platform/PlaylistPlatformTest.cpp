@@ -53,7 +53,7 @@ Listed Shared(int offset = 0, int limit = 0) {
 
 using Records = std::vector<std::pair<std::uint32_t, std::string>>;
 
-TEST(Platform_PersonalPlaylists, PlaylistFilesInByteOrderWithIdsFromOne) {
+TEST(PersonalPlaylistList, PlaylistFilesInByteOrderWithIdsFromOne) {
     for (const char* name : {"b.m3u", "B.M3U8", "a.m3u8", "\xC3\xA4lter.m3u", "Zed.M3u",
                              "x.m3u.bak", "notes.txt", "m3u", "dotless_m3u", "smart.playlist"})
         WritePersonalPlaylistFile("alice", name);
@@ -63,7 +63,7 @@ TEST(Platform_PersonalPlaylists, PlaylistFilesInByteOrderWithIdsFromOne) {
               (Records{{1, "B"}, {2, "Zed"}, {3, "a"}, {4, "b"}, {5, "\xC3\xA4lter"}}));
 }
 
-TEST(Platform_PersonalPlaylists, OnlyRegularFilesCount) {
+TEST(PersonalPlaylistList, OnlyRegularFilesCount) {
     WritePersonalPlaylistFile("alice", "real.m3u");
     MakeDirs(PersonalPlaylistDir("alice") + "/folder.m3u");
     ASSERT_EQ(symlink("real.m3u", (PersonalPlaylistDir("alice") + "/linked.m3u").c_str()), 0);
@@ -72,7 +72,7 @@ TEST(Platform_PersonalPlaylists, OnlyRegularFilesCount) {
     EXPECT_EQ(Personal("alice").records, (Records{{1, "linked"}, {2, "real"}}));
 }
 
-TEST(Platform_PersonalPlaylists, MissingFoldersGiveAnEmptyListAndUnreadableOnesMinusOne) {
+TEST(PersonalPlaylistList, MissingFoldersGiveAnEmptyListAndUnreadableOnesMinusOne) {
     Listed listed = Personal("nobody");  // no preference folder at all
     EXPECT_EQ(listed.result, 0);
     EXPECT_TRUE(listed.records.empty());
@@ -89,7 +89,7 @@ TEST(Platform_PersonalPlaylists, MissingFoldersGiveAnEmptyListAndUnreadableOnesM
     EXPECT_EQ(VANUPersonalPlaylistListAll("/usr/vanu", nullptr, 0, 0), -1);
 }
 
-TEST(Platform_PersonalPlaylists, OffsetAndLimitSelectAWindowKeepingIds) {
+TEST(PersonalPlaylistList, OffsetAndLimitSelectAWindowKeepingIds) {
     for (const char* name : {"a.m3u", "b.m3u", "c.m3u", "d.m3u"})
         WritePersonalPlaylistFile("alice", name);
     EXPECT_EQ(Personal("alice", 1, 2).records, (Records{{2, "b"}, {3, "c"}}));
@@ -97,7 +97,7 @@ TEST(Platform_PersonalPlaylists, OffsetAndLimitSelectAWindowKeepingIds) {
     EXPECT_TRUE(Personal("alice", 9, 0).records.empty());
 }
 
-TEST(Platform_SharedPlaylists, RowsOrderedByNameIgnoringAsciiCaseThenId) {
+TEST(SharedPlaylistList, RowsOrderedByNameIgnoringAsciiCaseThenId) {
     MakeLibraryDb({},
                   {{5, "b"}, {2, "B"}, {9, "a"}, {1, "\xC3\x89t\xC3\xA9"}, {3, "_x"}, {4, "A"}});
     const Listed listed = Shared();
@@ -108,7 +108,7 @@ TEST(Platform_SharedPlaylists, RowsOrderedByNameIgnoringAsciiCaseThenId) {
     EXPECT_EQ(Shared(2, 2).records, (Records{{9, "a"}, {2, "B"}}));
 }
 
-TEST(Platform_SharedPlaylists, MissingDatabaseIsEmptyAndAnythingElseUnusableIsMinusOne) {
+TEST(SharedPlaylistList, MissingDatabaseIsEmptyAndAnythingElseUnusableIsMinusOne) {
     Listed listed = Shared();
     EXPECT_EQ(listed.result, 0);
     EXPECT_TRUE(listed.records.empty());
@@ -127,7 +127,7 @@ TEST(Platform_SharedPlaylists, MissingDatabaseIsEmptyAndAnythingElseUnusableIsMi
     EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(1));
 }
 
-TEST(Platform_SharedPlaylists, RowsThatBreakTheSchemaAreLeftOut) {
+TEST(SharedPlaylistList, RowsThatBreakTheSchemaAreLeftOut) {
     MakeDirs("/var/packages/Harmona/var");
     harmona::sqlite::Database db = harmona::sqlite::Database::Open(
         kLibraryDb, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, 1000);
@@ -139,7 +139,7 @@ TEST(Platform_SharedPlaylists, RowsThatBreakTheSchemaAreLeftOut) {
     EXPECT_EQ(Shared().records, (Records{{8, ""}, {9, "fine"}}));
 }
 
-TEST(Platform_SharedPlaylists, WriterHoldingTheDatabaseForASecondDelaysButDoesNotFail) {
+TEST(SharedPlaylistList, WriterHoldingTheDatabaseForASecondDelaysButDoesNotFail) {
     MakeLibraryDb({}, {{1, "one"}});
     DatabaseWriterLock writer(kLibraryDb, 1000);
     ASSERT_TRUE(writer.Locked());
@@ -150,7 +150,7 @@ TEST(Platform_SharedPlaylists, WriterHoldingTheDatabaseForASecondDelaysButDoesNo
     EXPECT_EQ(listed.records, (Records{{1, "one"}}));
 }
 
-TEST(Platform_SmartPLSEnum, EveryNonEmptySectionNameInFileOrderWithDuplicates) {
+TEST(SmartPlaylistEnumeration, EveryNonEmptySectionNameInFileOrderWithDuplicates) {
     WriteFile("/tmp/smart",
               "\xEF\xBB\xBF[zeta]\r\nrule=1\r\n\r\n[]\n# [comment]\n[Alpha]\n[zeta]\n"
               "key=[not a section]\n  [ spaced ]  \n[last]");
@@ -163,7 +163,7 @@ TEST(Platform_SmartPLSEnum, EveryNonEmptySectionNameInFileOrderWithDuplicates) {
     EXPECT_EQ(total, 5);
 }
 
-TEST(Platform_SmartPLSEnum, NullPathReadsTheSharedFileMissingOrUnreadableGiveNothing) {
+TEST(SmartPlaylistEnumeration, NullPathReadsTheSharedFileMissingOrUnreadableGiveNothing) {
     WriteSmartPlaylistFile(kSharedSmartPlaylistFile, {"shared one", "shared two"});
     int total = 0;
     EXPECT_EQ(VanuAudioUtils::SmartPLSEnum(0, 0, total, nullptr),
@@ -190,7 +190,7 @@ std::set<std::string> DistinctPaths(const M3uFile& file) {
     return paths;
 }
 
-TEST(Platform_RandomPlaylist, DenseLargeLibraryIsSampledByRowid) {
+TEST(RandomPlaylistFile, DenseLargeLibraryIsSampledByRowid) {
     MakeGeneratedLibrary(20000);  // an id range too wide to read whole
     const M3uFile file = Draw(100);
     ASSERT_TRUE(file.valid);
@@ -198,7 +198,7 @@ TEST(Platform_RandomPlaylist, DenseLargeLibraryIsSampledByRowid) {
     EXPECT_EQ(DistinctPaths(file).size(), 100u);
 }
 
-TEST(Platform_RandomPlaylist, VerySparseIdsFallBackToAScan) {
+TEST(RandomPlaylistFile, VerySparseIdsFallBackToAScan) {
     MakeGeneratedLibrary(500, {}, 1, 1000003);  // ids 1, 1000004, ...: one in a million hits
     const M3uFile file = Draw(100);
     ASSERT_TRUE(file.valid);
@@ -209,7 +209,7 @@ TEST(Platform_RandomPlaylist, VerySparseIdsFallBackToAScan) {
     EXPECT_EQ(DistinctPaths(all).size(), 40u);
 }
 
-TEST(Platform_RandomPlaylist, WidestRowidRangeDoesNotOverflow) {
+TEST(RandomPlaylistFile, WidestRowidRangeDoesNotOverflow) {
     MakeLibraryDb(
         {{INT64_MIN, "/m/low.mp3", "t", "a", 1000}, {INT64_MAX, "/m/high.mp3", "t", "a", 1000}});
     EXPECT_EQ(DistinctPaths(Draw(100)), (std::set<std::string>{"/m/low.mp3", "/m/high.mp3"}));
@@ -233,15 +233,15 @@ void ExpectEvenDraws(std::int64_t tracks, std::int64_t step, int count, int roun
     EXPECT_NEAR(static_cast<double>(lowHalf), drawn / 2.0, 5 * sigma);
 }
 
-TEST(Platform_RandomPlaylist, RowidSamplingIsEvenOverTheTable) {
+TEST(RandomPlaylistFile, RowidSamplingIsEvenOverTheTable) {
     ExpectEvenDraws(5000, 2, 20, 150);  // span 10000: the rowid sampler
 }
 
-TEST(Platform_RandomPlaylist, ScanSamplingIsEvenOverTheTable) {
+TEST(RandomPlaylistFile, ScanSamplingIsEvenOverTheTable) {
     ExpectEvenDraws(1000, 1, 20, 150);  // small span: the whole range is read
 }
 
-TEST(Platform_RandomPlaylist, TextsCannotBreakTheFileAndUnwritablePathsAreLeftOut) {
+TEST(RandomPlaylistFile, TextsCannotBreakTheFileAndUnwritablePathsAreLeftOut) {
     MakeLibraryDb({{1, "/m/one.mp3", "line\nbreak", "tab\there\r", 61499},
                    {2, "/m/two\n#EXTINF:0,injected\n/etc/passwd", "t", "a", 1000},
                    {3, "/m/three.mp3", "", "", -1}});
@@ -255,7 +255,7 @@ TEST(Platform_RandomPlaylist, TextsCannotBreakTheFileAndUnwritablePathsAreLeftOu
                                                   {"/m/three.mp3", "-1, - "}}));
 }
 
-TEST(Platform_RandomPlaylist, FailsWithoutTracksOrWithoutAFolderToWriteTo) {
+TEST(RandomPlaylistFile, FailsWithoutTracksOrWithoutAFolderToWriteTo) {
     EXPECT_EQ(harmona::playlist::CreateRandomPlaylist(kLibraryDb, "/tmp/r", 100), 0);  // missing
     MakeLibraryDb({});
     EXPECT_EQ(harmona::playlist::CreateRandomPlaylist(kLibraryDb, "/tmp/r", 100), 0);  // empty
@@ -269,7 +269,7 @@ TEST(Platform_RandomPlaylist, FailsWithoutTracksOrWithoutAFolderToWriteTo) {
     EXPECT_EQ(ReadFile("/tmp/r"), "#EXTM3U\n#EXTINF:1,a - t\n/m/a.mp3\n");
 }
 
-TEST(Platform_RandomPlaylist, WritesOnlyInTheFolderOfThePath) {
+TEST(RandomPlaylistFile, WritesOnlyInTheFolderOfThePath) {
     MakeLibraryDb({{1, "/m/a.mp3", "t", "a", 1000}});
     MakeDirs("/tmp/sub");
     MakeDirs("/run/other");

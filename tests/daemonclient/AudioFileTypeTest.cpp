@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "src/daemon/AudioDaemon.h"
+#include "src/daemonclient/AudioDaemon.h"
 
 namespace {
 

@@ -5,7 +5,7 @@
 #include <cstdio>
 #include <cstring>
 
-#include "src/daemon/AudioDaemon.h"
+#include "src/daemonclient/AudioDaemon.h"
 
 namespace {
 

@@ -5,7 +5,10 @@
 
 #include "platform/lib/sqlite/Database.h"
 
-namespace harmona::playlist {
+namespace harmona::medialib {
+
+// Opening of library.db as every request does it: read-only, waiting this long for a writer.
+inline constexpr int kLibraryBusyTimeoutMs = 3000;
 
 enum class LibraryStatus { ok, missing, unusable };
 
@@ -18,4 +21,4 @@ struct LibraryOpenResult {
 // or SQLite refused it. (A file that is not a database opens; the first query fails.)
 LibraryOpenResult OpenLibrary(const char* path);
 
-}  // namespace harmona::playlist
+}  // namespace harmona::medialib

@@ -6,7 +6,7 @@
 #include <iterator>
 
 #include "platform/medialib/MediaFiles.h"
-#include "src/daemon/AudioDaemon.h"
+#include "src/daemonclient/AudioDaemon.h"
 
 namespace {
 

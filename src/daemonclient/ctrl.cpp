@@ -16,7 +16,7 @@
 #include "platform/paths/DaemonAccount.h"
 #include "platform/paths/PlatformPaths.h"
 #include "platform/system/VanuSystem.h"
-#include "src/daemon/AudioDaemon.h"
+#include "src/daemonclient/AudioDaemon.h"
 
 namespace {
 

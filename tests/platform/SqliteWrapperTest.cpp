@@ -11,7 +11,7 @@ using harmona::sqlite::Statement;
 
 namespace {
 
-TEST(Platform_Sqlite, OpensRunsAndReadsBackBoundValues) {
+TEST(SqliteWrapper, OpensRunsAndReadsBackBoundValues) {
     harmona::test::MakeDirs("/tmp/db");
     Database db = Database::Open("/tmp/db/x.db", SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, 100);
     ASSERT_TRUE(db) << db.Error();
@@ -36,7 +36,7 @@ TEST(Platform_Sqlite, OpensRunsAndReadsBackBoundValues) {
     EXPECT_EQ(select.Step(), SQLITE_DONE);
 }
 
-TEST(Platform_Sqlite, FailuresGiveEmptyObjectsWithAReason) {
+TEST(SqliteWrapper, FailuresGiveEmptyObjectsWithAReason) {
     Database missing = Database::OpenReadOnly("/tmp/no/such.db", 100);
     EXPECT_FALSE(missing);
     EXPECT_EQ(missing.Code(), SQLITE_CANTOPEN);
@@ -50,7 +50,7 @@ TEST(Platform_Sqlite, FailuresGiveEmptyObjectsWithAReason) {
     EXPECT_NE(db.Error().find("syntax"), std::string::npos) << db.Error();
 }
 
-TEST(Platform_Sqlite, MovingHandsOverOwnership) {
+TEST(SqliteWrapper, MovingHandsOverOwnership) {
     Database db = Database::Open(":memory:", SQLITE_OPEN_READWRITE, 100);
     sqlite3* raw = db.Get();
     Database moved(std::move(db));
@@ -67,7 +67,7 @@ TEST(Platform_Sqlite, MovingHandsOverOwnership) {
     EXPECT_EQ(assigned.Get(), raw);
 }
 
-TEST(Platform_Sqlite, ReadOnlyConnectionCannotWrite) {
+TEST(SqliteWrapper, ReadOnlyConnectionCannotWrite) {
     harmona::test::MakeDirs("/tmp/db");
     {
         Database db =

@@ -16,8 +16,8 @@
 #include <thread>
 #include <vector>
 
-#include "src/daemon/AudioDaemon.h"
-#include "tests/daemon/DaemonTestSupport.h"
+#include "src/daemonclient/AudioDaemon.h"
+#include "tests/daemonclient/DaemonTestSupport.h"
 #include "tests/harness/ScriptedDaemon.h"
 
 using namespace harmona::test;
