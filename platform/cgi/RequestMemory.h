@@ -4,7 +4,7 @@
 // once: one request gets at most kRequestMemoryBytes. The readers of everything a request lists
 // refuse inputs that would take more (PlaylistRecord.h, VanuAudioUtils.h, DMAParser.h,
 // LocalizedStringParser.h), each with a log line and its builder's usual failure; the address-space
-// limit set at start-up catches whatever slips through. README.md ("Memory") gives the measurements
+// limit set at start-up catches whatever slips through. docs/memory.md gives the measurements
 // behind the figures.
 #pragma once
 
