@@ -4,6 +4,7 @@
 
 #include <cctype>
 #include <cstring>
+#include <iterator>
 
 #include "platform/paths/PlatformPaths.h"
 #include "platform/system/VanuSystem.h"
@@ -11,27 +12,13 @@
 namespace harmona::medialib {
 namespace {
 
-struct MimeEntry {
-    const char* extension;
-    const char* mime;
-};
-// The audio file types, each with the MIME type it is served as.
-constexpr MimeEntry kMimeTypes[] = {
-    {"mp3", "audio/mpeg"},  {"mp1", "audio/mpeg"},          {"mp2", "audio/mpeg"},
-    {"mpa", "audio/mpeg"},  {"m4a", "audio/mp4"},           {"m4b", "audio/mp4"},
-    {"m4p", "audio/mp4"},   {"aac", "audio/aac"},           {"ogg", "audio/ogg"},
-    {"flac", "audio/flac"}, {"wav", "audio/wav"},           {"aif", "audio/aiff"},
-    {"aiff", "audio/aiff"}, {"wma", "audio/x-ms-wma"},      {"ac3", "audio/ac3"},
-    {"ape", "audio/x-ape"}, {"ra", "audio/x-pn-realaudio"}, {"ram", "audio/x-pn-realaudio"},
-};
-
 // DLNA.ORG_FLAGS: DLNA 1.5 (0x00100000), connection stalling (0x00200000), background
 // (0x00400000) and streaming (0x01000000) transfer modes; 24 reserved hex digits follow.
 constexpr const char* kDlnaAudioFlags = "01700000000000000000000000000000";
 
 // The entry of an extension (without the dot, any letter case); nullptr when it is no audio type.
-const MimeEntry* FindAudioType(std::string_view extension) {
-    for (const MimeEntry& entry : kMimeTypes) {
+const AudioType* FindAudioType(std::string_view extension) {
+    for (const AudioType& entry : kAudioTypes) {
         if (extension.size() == std::strlen(entry.extension) &&
             strncasecmp(extension.data(), entry.extension, extension.size()) == 0)
             return &entry;
@@ -59,6 +46,22 @@ bool IsIndexableAudioFile(const std::string& path) {
     return IsAudioExtension(LowerExtension(path));
 }
 
+std::string SourceProtocolInfo() {
+    std::string list;
+    for (std::size_t i = 0; i < std::size(kAudioTypes); ++i) {
+        const std::string_view mime = kAudioTypes[i].mime;
+        bool listed = false;
+        for (std::size_t j = 0; j < i && !listed; ++j)
+            listed = mime == kAudioTypes[j].mime;
+        if (listed)
+            continue;
+        if (!list.empty())
+            list += ",";
+        list += "http-get:*:" + std::string(mime) + ":*";
+    }
+    return list;
+}
+
 std::string LowerExtension(const std::string& path) {
     const std::size_t slash = path.rfind('/');
     const std::size_t dot = path.rfind('.');
@@ -71,7 +74,7 @@ std::string LowerExtension(const std::string& path) {
 }
 
 const char* MimeTypeOfPath(const std::string& path) {
-    const MimeEntry* type = FindAudioType(LowerExtension(path));
+    const AudioType* type = FindAudioType(LowerExtension(path));
     return type != nullptr ? type->mime : "application/octet-stream";
 }
 

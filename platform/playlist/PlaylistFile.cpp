@@ -40,9 +40,13 @@ std::string_view WithoutTrailingCr(std::string_view line) {
 }  // namespace
 
 PlaylistFileEntries ReadPlaylistFile(const std::string& path, const std::string& baseDir) {
+    return ReadPlaylistFileAt(AT_FDCWD, path.c_str(), baseDir);
+}
+
+PlaylistFileEntries ReadPlaylistFileAt(int folderFd, const char* name, const std::string& baseDir) {
     PlaylistFileEntries result;
     // O_NONBLOCK: opening a FIFO planted in the file's place must not wait for a writer.
-    io::FileDescriptor fd(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+    io::FileDescriptor fd(openat(folderFd, name, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
     if (!fd) {
         if (errno == ENOENT || errno == ENOTDIR)
             result.status = PlaylistFileStatus::missing;

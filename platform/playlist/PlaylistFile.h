@@ -30,4 +30,8 @@ struct PlaylistFileEntries {
 // `tooLarge`: more than kMaxPlaylistFileBytes or more than kMaxPlaylistEntries entries.
 PlaylistFileEntries ReadPlaylistFile(const std::string& path, const std::string& baseDir);
 
+// The same for the file `name` relative to the open folder `folderFd` (openat; AT_FDCWD for a
+// path).
+PlaylistFileEntries ReadPlaylistFileAt(int folderFd, const char* name, const std::string& baseDir);
+
 }  // namespace harmona::playlist

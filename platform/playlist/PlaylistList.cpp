@@ -14,8 +14,8 @@
 
 #include "common/io/DirectoryReader.h"
 #include "platform/lib/sqlite/Database.h"
-#include "platform/paths/PlatformPaths.h"
 #include "platform/medialib/LibraryDatabase.h"
+#include "platform/paths/PlatformPaths.h"
 
 namespace harmona::playlist {
 namespace {
@@ -91,6 +91,29 @@ int ListSharedPlaylists(const char* path, PLAYLIST_INFO** head, int offset, int 
     return 0;
 }
 
+PlaylistFileEntries ReadPersonalPlaylist(const char* prefDir, std::string_view name,
+                                         const std::string& baseDir) {
+    PlaylistFileEntries result;
+    result.status = PlaylistFileStatus::missing;
+    if (prefDir == nullptr || name.empty())
+        return result;
+    const std::string folder = std::string(prefDir) + paths::kPlaylistsFolder;
+    io::DirectoryReader dir(
+        io::FileDescriptor(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC)));
+    if (!dir)
+        return result;
+    std::string fileName;
+    std::string entryName;
+    while (const dirent* entry = dir.Next()) {
+        if (PlaylistNameOf(entry->d_name, entryName) && entryName == name &&
+            (fileName.empty() || std::string_view(entry->d_name) < fileName))
+            fileName = entry->d_name;
+    }
+    if (fileName.empty())
+        return result;
+    return ReadPlaylistFileAt(dir.Fd(), fileName.c_str(), baseDir);
+}
+
 }  // namespace harmona::playlist
 
 using namespace harmona::playlist;
@@ -104,7 +127,7 @@ int VANUPersonalPlaylistListAll(const char* prefDir, PLAYLIST_INFO** head, int o
 
     // Only a real folder is listed: a symbolic link in its place could show another user's
     // playlist names (O_NOFOLLOW refuses it with ELOOP, like any folder that cannot be read).
-    const std::string folder = std::string(prefDir) + "/playlists";
+    const std::string folder = std::string(prefDir) + harmona::paths::kPlaylistsFolder;
     harmona::io::FileDescriptor folderFd(
         open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
     if (!folderFd)

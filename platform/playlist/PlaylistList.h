@@ -2,6 +2,10 @@
 // (platform/README.md, "Playlists and smart playlists").
 #pragma once
 
+#include <string>
+#include <string_view>
+
+#include "platform/playlist/PlaylistFile.h"
 #include "platform/playlist/PlaylistRecord.h"
 
 // The personal playlists of the user whose preference directory is `prefDir`: the regular files of
@@ -23,5 +27,16 @@ namespace harmona::playlist {
 
 // The same listing as VANUPlaylistListAll, from the database at `path`.
 int ListSharedPlaylists(const char* path, PLAYLIST_INFO** head, int offset, int limit);
+
+// The entries of the personal playlist named `name` (as VANUPersonalPlaylistListAll names it) of
+// the user whose preference directory is `prefDir`, read as ReadPlaylistFile reads a file. The
+// playlists folder is opened once, never through a symbolic link; the file is found by name among
+// its entries (a name from a request never becomes a path: "../x" or "a/b" name no entry) and
+// opened relative to the folder. When two files give the same name, the first in byte order of
+// the file names is read. `missing`: no such playlist (also when the folder is missing, is a link
+// or cannot be read); `unusable`: the entry of that name is not a regular file (a link, a FIFO, a
+// folder) or cannot be read; `tooLarge` as for ReadPlaylistFile.
+PlaylistFileEntries ReadPersonalPlaylist(const char* prefDir, std::string_view name,
+                                         const std::string& baseDir);
 
 }  // namespace harmona::playlist

@@ -3,6 +3,7 @@
 #include <string>
 
 #include "platform/lib/gupnp/ServiceAction.h"
+#include "platform/medialib/MediaFiles.h"
 
 namespace harmona::mediad {
 namespace {
@@ -10,11 +11,9 @@ namespace {
 constexpr int kErrorInvalidAction = 401;
 constexpr int kErrorInvalidConnection = 706;
 
-constexpr const char* kSourceProtocols =
-    "http-get:*:audio/mpeg:*,http-get:*:audio/mp4:*,http-get:*:audio/aac:*,"
-    "http-get:*:audio/ogg:*,http-get:*:audio/flac:*,http-get:*:audio/wav:*,"
-    "http-get:*:audio/aiff:*,http-get:*:audio/x-ms-wma:*,http-get:*:audio/ac3:*,"
-    "http-get:*:audio/x-ape:*,http-get:*:audio/x-pn-realaudio:*";
+// Every MIME type of the library's audio file types (platform/medialib/MediaFiles.h).
+const std::string kSourceProtocolList = medialib::SourceProtocolInfo();
+const char* const kSourceProtocols = kSourceProtocolList.c_str();
 
 void CurrentConnectionInfo(gupnp::ServiceAction& action) {
     if (action.Argument("ConnectionID").value_or("") != "0") {

@@ -13,6 +13,7 @@
 #include "platform/lib/sqlite/Database.h"
 #include "platform/medialib/LibrarySchema.h"
 #include "platform/medialib/MediaFiles.h"
+#include "platform/medialib/StreamName.h"
 #include "services/harmona-mediad/DidlWriter.h"
 #include "services/harmona-mediad/ObjectIds.h"
 
@@ -91,13 +92,9 @@ std::string ArtUrlPath(int64_t trackId, const std::string& artPath) {
            (medialib::LowerExtension(artPath) == "png" ? "png" : "jpg");
 }
 
+// The track's stream name; "" (no res) for a track that no name can carry.
 std::string ResUrlPath(int64_t trackId, const std::string& path) {
-    std::string url = std::to_string(trackId);
-    const std::string extension = medialib::LowerExtension(path);
-    if (!extension.empty() && extension.size() <= 5 &&
-        extension.find_first_not_of("abcdefghijklmnopqrstuvwxyz0123456789") == std::string::npos)
-        url += "." + extension;
-    return url;
+    return medialib::StreamNameOf(trackId, path).value_or("");
 }
 
 std::string DateOfYear(int64_t year) {

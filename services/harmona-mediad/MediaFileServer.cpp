@@ -6,10 +6,12 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <optional>
 #include <utility>
 
 #include "common/util/Number.h"
 #include "platform/medialib/MediaFiles.h"
+#include "platform/medialib/StreamName.h"
 #include "services/harmona-mediad/ShareFile.h"
 
 namespace harmona::mediad {
@@ -80,14 +82,15 @@ void SetImageHeaders(SoupMessageHeaders* headers, const ServedFile& file) {
     soup_message_headers_replace(headers, "transferMode.dlna.org", "Interactive");
 }
 
-// "<digits>[.<extension>]" -> the id and the extension; false for anything else.
+// A stream name (platform/medialib/StreamName.h) -> the id and the extension; false for anything
+// else.
 bool ParseIdName(std::string name, int64_t* id, std::string* extension) {
-    const std::size_t dot = name.find('.');
-    if (dot != std::string::npos) {
-        *extension = name.substr(dot + 1);
-        name.erase(dot);
-    }
-    return util::ParseDecimalDigits(name, *id);
+    std::optional<medialib::StreamName> parsed = medialib::ParseStreamName(name);
+    if (!parsed)
+        return false;
+    *id = parsed->trackId;
+    *extension = std::move(parsed->extension);
+    return true;
 }
 
 }  // namespace
@@ -168,7 +171,7 @@ io::FileDescriptor MediaFileServer::Open(const std::string& urlPath, ServedFile*
         TrackFile track;
         if (!ParseIdName(urlPath.substr(prefix.size()), &id, &extension) ||
             !directory_.LookUpTrack(id, &track) ||
-            extension != medialib::LowerExtension(track.path))
+            extension != medialib::StreamExtensionOf(track.path))
             return {};
         served->path = std::move(track.path);
         served->mimeType = std::move(track.mimeType);

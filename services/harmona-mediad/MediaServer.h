@@ -15,6 +15,7 @@
 #include "platform/lib/gupnp/MainLoop.h"
 #include "platform/lib/gupnp/Object.h"
 #include "platform/lib/gupnp/Signal.h"
+#include "platform/paths/PlatformPaths.h"
 #include "services/harmona-mediad/ConnectionManagerService.h"
 #include "services/harmona-mediad/ContentDirectory.h"
 #include "services/harmona-mediad/ContentDirectoryService.h"
@@ -25,7 +26,7 @@ namespace harmona::mediad {
 
 // The fixed port the CGI connects to on 127.0.0.1 (platform/README.md, "Fixed paths"); the LAN
 // interfaces use it too.
-inline constexpr unsigned short kMediaServerPort = 50003;
+inline constexpr unsigned short kMediaServerPort = paths::kLocalMediaServerPort;
 
 struct MediaServerOptions {
     const char* interfaceName = nullptr;  // nullptr: every interface the context manager finds

@@ -36,7 +36,7 @@
 
 namespace {
 
-constexpr int kServiceNumber = 3;
+constexpr int kServiceNumber = harmona::paths::kLocalMediaServerService;
 constexpr const char* kUnprivilegedUser = "nobody";
 constexpr uid_t kFallbackUid = 65534;
 constexpr gid_t kFallbackGid = 65534;

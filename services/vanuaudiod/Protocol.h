@@ -7,23 +7,27 @@
 #include <cstdint>
 #include <string>
 
+#include "platform/paths/DaemonProtocol.h"
 #include "services/vanuaudiod/ServerList.h"
 
 namespace harmona::vanuaudiod {
 
-// The request record: a native-order int32 command and 8192 bytes of NUL-terminated argument text.
-inline constexpr std::size_t kCommandSize = 4;
-inline constexpr std::size_t kArgumentSize = 8192;
-inline constexpr std::size_t kRequestSize = kCommandSize + kArgumentSize;  // 8196
+// The request record: a native-order int32 command and the NUL-terminated argument text, as the
+// CGI's daemon client writes it (platform/paths/DaemonProtocol.h).
+inline constexpr std::size_t kCommandSize = paths::kDaemonCommandSize;
+inline constexpr std::size_t kArgumentSize = paths::kDaemonArgumentSize;
+inline constexpr std::size_t kRequestSize = paths::kDaemonRequestSize;
 
-// The CGI reads the reply of command 16 once into 40960 bytes that must end with a NUL.
-inline constexpr std::size_t kMaxReplySize = 40960 - 1;
+// The CGI reads the reply of command 16 once into a buffer that must end with a NUL.
+inline constexpr std::size_t kMaxReplySize = paths::kDaemonMaxReplySize;
 
-inline constexpr int32_t kCommandPrepareMediaServerList = 14;
-inline constexpr int32_t kCommandGetMediaServerList = 16;
+inline constexpr int32_t kCommandPrepareMediaServerList =
+    paths::kDaemonCommandPrepareMediaServerList;
+inline constexpr int32_t kCommandGetMediaServerList = paths::kDaemonCommandGetMediaServerList;
 
-// Bounds on what one list element may carry, so that a page of the CGI's ten servers always fits
-// in kMaxReplySize (each field's JSON form is at most twice its byte length, see JsonString).
+// Bounds on what one list element may carry, so that a page of the CGI's paths::kDaemonListPageSize
+// servers always fits in kMaxReplySize (each field's JSON form is at most twice its byte length,
+// see JsonString).
 inline constexpr std::size_t kMaxFriendlyNameBytes = 512;
 inline constexpr std::size_t kMaxControlUrlBytes = 1024;
 inline constexpr std::size_t kMaxUdnBytes = 256;

@@ -5,13 +5,16 @@
 
 #include <cstdint>
 
+#include "platform/paths/DaemonProtocol.h"
+
 // The request record, written to the socket as it lies in memory: the command code in the host's
-// native byte order, then 8192 bytes of NUL-terminated argument text.
+// native byte order, then the NUL-terminated argument text (platform/paths/DaemonProtocol.h).
 struct AudioDaemonRequest {
     std::int32_t command;
-    char arguments[8192];
+    char arguments[harmona::paths::kDaemonArgumentSize];
 };
-static_assert(sizeof(AudioDaemonRequest) == 8196, "the daemon reads exactly 8196 bytes a request");
+static_assert(sizeof(AudioDaemonRequest) == harmona::paths::kDaemonRequestSize,
+              "the daemon reads exactly one record a request");
 
 // ---- unit ctrl: connection and exchange ----
 

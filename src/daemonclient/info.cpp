@@ -120,13 +120,14 @@ int AudioDaemonCommand13() {
     return CommandWithoutArguments(13);
 }
 int AudioDaemonPrepareMediaServerList() {
-    return CommandWithoutArguments(14);
+    return CommandWithoutArguments(harmona::paths::kDaemonCommandPrepareMediaServerList);
 }
 int AudioDaemonCommand15() {
     return CommandWithoutArguments(15);
 }
 int AudioDaemonGetMediaServerList(int offset, int count, char* reply, int replySize) {
-    return CommandWithTwoIntsAndReply(16, offset, count, reply, replySize, kLineBadParameters16);
+    return CommandWithTwoIntsAndReply(harmona::paths::kDaemonCommandGetMediaServerList, offset,
+                                      count, reply, replySize, kLineBadParameters16);
 }
 int AudioDaemonCommand17(int first, int second, char* reply, int replySize) {
     return CommandWithTwoIntsAndReply(17, first, second, reply, replySize, kLineBadParameters17);

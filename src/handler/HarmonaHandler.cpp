@@ -3,19 +3,17 @@
 
 #include <cstring>
 
-#include "platform/users/AudioUsers.h"
+#include "platform/cgi/ApplicationRequest.h"
 
 HarmonaHandler::HarmonaHandler() : userPermission(0) {}
 
 HarmonaHandler::~HarmonaHandler() = default;
 
 int HarmonaHandler::Process() {
-    if (!webMan.IsAuthorized(nullptr, kApplicationAccessLevel, CGI_POSITION_APPLICATION))
-        return 0;
-    webMan.LoadIn();
-    userPermission = AudioUsers::GetUserPermission(webMan.GetLoginUserName());
-    if (userPermission == 0)
-        return 0;
+    const harmona::cgi::AdmittedRequest admitted = harmona::cgi::AdmitApplicationRequest(webMan);
+    userPermission = admitted.permission;
+    if (admitted.admission != harmona::cgi::Admission::admitted)
+        return 0;  // a refused caller has had its reply; one without permission gets none
 
     const char* action = webMan.In("action", nullptr);
     if (action == nullptr)

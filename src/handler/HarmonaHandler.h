@@ -8,6 +8,7 @@
 #include <string>
 
 #include "platform/cgi/ActionHandler.h"
+#include "platform/cgi/ApplicationRequest.h"
 
 // Node flags of the tree node record: each sets the boolean attribute of the same name.
 enum : unsigned int {
@@ -20,9 +21,9 @@ enum : unsigned int {
 
 // The user's audio permission bits (platform/README.md, "Requests, users and permissions").
 enum : int {
-    PERM_IPOD = 1,
-    PERM_NEW_SHARED_PLAYLIST = 4,
-    PERM_MEDIA_SERVER = 8,
+    PERM_IPOD = harmona::cgi::kPermissionIPod,
+    PERM_NEW_SHARED_PLAYLIST = harmona::cgi::kPermissionNewSharedPlaylist,
+    PERM_MEDIA_SERVER = harmona::cgi::kPermissionMediaServer,
 };
 
 // The content type of every reply.

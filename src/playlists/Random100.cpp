@@ -2,6 +2,7 @@
 // error reply.
 #include <cstdio>
 
+#include "platform/paths/PlatformPaths.h"
 #include "platform/playlist/AudioFile.h"
 #include "src/handler/HarmonaHandler.h"
 
@@ -19,7 +20,7 @@ void HarmonaHandler::CreateRandom100Playlist() {
     Json::Value reply;
     char path[kPathSize] = {};
     // The user name goes in as it is; the platform's login check already forbids "/" in it.
-    std::snprintf(path, sizeof path, "/tmp/==DynaRandom100==.%s",
+    std::snprintf(path, sizeof path, "%s%s", harmona::paths::kRandom100Prefix,
                   webMan.GetLoginUserName().c_str());
 
     if (AudioFile::PlaylistRandomCreate(path, kRandomSongCount))

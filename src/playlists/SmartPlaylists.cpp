@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include "platform/paths/PlatformPaths.h"
 #include "platform/playlist/VanuAudioUtils.h"
 #include "platform/system/VanuSystem.h"
 #include "src/handler/HarmonaHandler.h"
@@ -15,7 +16,6 @@
 namespace {
 
 constexpr const char* kSmartIcon = "3rdparty/Harmona/images/files_class/icon_smartpls.png";
-constexpr const char* kUserSmartFile = "/playlists/smart.playlist";
 constexpr std::size_t kNodeIdSize = 4096;
 
 }  // namespace
@@ -28,7 +28,8 @@ int HarmonaHandler::ListSmartPlaylists(Json::Value& children, const char* catego
     const char* pid = nullptr;
 
     if (std::strcmp(category, "music_personal") == 0) {
-        const std::string path = webMan.GetPreferenceDir() + kUserSmartFile;
+        const std::string path = webMan.GetPreferenceDir() + harmona::paths::kPlaylistsFolder +
+                                 harmona::paths::kSmartPlaylistFile;
         if (!CORXFileExist(path.c_str()))
             return 1;
         names = VanuAudioUtils::SmartPLSEnum(0, 0, total, path.c_str());

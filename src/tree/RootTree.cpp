@@ -11,7 +11,7 @@
 namespace harmona::tree {
 
 // The platform's number of the service the library categories depend on (the local media server).
-constexpr int kLibraryService = 3;
+constexpr int kLibraryService = paths::kLocalMediaServerService;
 
 namespace {
 

@@ -1,22 +1,20 @@
 #include "src/webapi/LibraryApi.h"
 
-#include <dirent.h>
-#include <sys/stat.h>
-
 #include <cmath>
 #include <cstdlib>
 #include <cstring>
-#include <memory>
 #include <string_view>
 
+#include "platform/cgi/ApplicationRequest.h"
 #include "platform/dma/DMABrowse.h"
 #include "platform/dma/DMAParser.h"
 #include "platform/medialib/MediaFiles.h"
+#include "platform/medialib/StreamName.h"
 #include "platform/paths/PlatformPaths.h"
 #include "platform/playlist/PlaylistFile.h"
+#include "platform/playlist/PlaylistList.h"
 #include "platform/texts/LocalizedStringParser.h"
-#include "platform/users/AudioUsers.h"
-#include "src/handler/HarmonaHandler.h"
+#include "src/daemonclient/MediaServerList.h"
 
 namespace harmona::webapi {
 
@@ -58,7 +56,6 @@ inline constexpr std::string_view kMediaServerPrefix = "mediaserver_";
 inline constexpr const char* kMediaServerRootObject = "0";
 inline constexpr std::string_view kRandomNode = "musiclib_random";
 inline constexpr std::string_view kLibraryRootNode = "musiclib_root";
-inline constexpr const char* kRandomPlaylistPrefix = "/tmp/==DynaRandom100==.";
 
 bool StartsWith(std::string_view text, std::string_view prefix) {
     return text.compare(0, prefix.size(), prefix) == 0;
@@ -86,43 +83,14 @@ Json::Value EmptyListReply(const std::string& node) {
     return reply;
 }
 
-// The name a playlist file is listed under: its name without ".m3u" or ".m3u8" (any case).
-std::string PlaylistNameOf(const std::string& fileName) {
-    for (const char* ending : {".m3u", ".m3u8"}) {
-        const std::size_t length = std::strlen(ending);
-        if (fileName.size() > length &&
-            strcasecmp(fileName.c_str() + fileName.size() - length, ending) == 0)
-            return fileName.substr(0, fileName.size() - length);
-    }
-    return {};
-}
-
-// The file of personal playlist `name` in `folder`, found among the folder's entries (so that a
-// name from the request never becomes a path by itself); empty when there is none.
-std::string FindPersonalPlaylistFile(const std::string& folder, const std::string& name) {
-    struct stat st {};
-    // Only a real folder is read, as the playlist listing does: a link could lead elsewhere.
-    if (lstat(folder.c_str(), &st) != 0 || !S_ISDIR(st.st_mode))
-        return {};
-    const std::unique_ptr<DIR, int (*)(DIR*)> dir(opendir(folder.c_str()), closedir);
-    if (!dir)
-        return {};
-    while (const dirent* entry = readdir(dir.get())) {
-        const std::string fileName = entry->d_name;
-        if (!name.empty() && PlaylistNameOf(fileName) == name)
-            return folder + "/" + fileName;
-    }
-    return {};
-}
-
 }  // namespace
 
 int LibraryApi::Process() {
-    if (!webMan.IsAuthorized(nullptr, kApplicationAccessLevel, CGI_POSITION_APPLICATION))
-        return 0;
-    webMan.LoadIn();
-    permission_ = AudioUsers::GetUserPermission(webMan.GetLoginUserName());
-    if (permission_ == 0)
+    const cgi::AdmittedRequest admitted = cgi::AdmitApplicationRequest(webMan);
+    if (admitted.admission == cgi::Admission::refused)
+        return 0;  // the 401 reply is out
+    permission_ = admitted.permission;
+    if (admitted.admission == cgi::Admission::noPermission)
         return Fail(kForbidden, kSystemSection, kSystemKey, kNoPermissionLine);
     const char* action = webMan.In("action", "");
     if (std::strcmp(action, "list") == 0)
@@ -195,7 +163,7 @@ int LibraryApi::ListBrowsedContainer(const std::string& objectId, Json::Value& r
             containers.append(std::move(row));
             continue;
         }
-        const std::optional<std::int64_t> id = TrackIdOfLocalResource(item->res());
+        const std::optional<std::int64_t> id = medialib::TrackIdOfLocalResource(item->res());
         const std::optional<Track> track = id ? catalog_.ById(*id) : std::nullopt;
         if (track)
             tracks.append(TrackRow(*track));
@@ -207,20 +175,19 @@ int LibraryApi::ListBrowsedContainer(const std::string& objectId, Json::Value& r
 
 int LibraryApi::ListMediaServer(const std::string& node, const std::string& objectId,
                                 Json::Value& reply) {
-    if ((permission_ & PERM_MEDIA_SERVER) == 0)
+    if ((permission_ & cgi::kPermissionMediaServer) == 0)
         return Fail(kForbidden, kSystemSection, kSystemKey, kNoPermissionLine);
     // Only a server that the audio daemon lists right now is browsed, by the control URL it gave:
     // a request never makes this program connect to an address of its own choosing.
-    HarmonaHandler tree;
-    Json::Value servers(Json::arrayValue);
-    tree.AppendMediaServers(servers);
+    const std::string controlUrl = node.substr(kMediaServerPrefix.size());
     bool listed = false;
-    for (const Json::Value& server : servers)
-        listed = listed || (server.isObject() && server["id"].asString() == node);
+    daemonclient::ReadMediaServerList([&](const daemonclient::ListedMediaServer& server) {
+        listed = listed || server.controlUrl == controlUrl;
+    });
     if (!listed)
         return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
     DMAParser parser;
-    if (BrowseChildren(node.substr(kMediaServerPrefix.size()), objectId, parser) == 0)
+    if (BrowseChildren(controlUrl, objectId, parser) == 0)
         return 0;
     const DMAParser::ItemList* items = parser.GetResult();
     if (items == nullptr)
@@ -243,11 +210,11 @@ int LibraryApi::ListMediaServer(const std::string& node, const std::string& obje
 }
 
 int LibraryApi::ListPersonalPlaylist(const std::string& name, Json::Value& reply) {
-    const std::string file =
-        FindPersonalPlaylistFile(webMan.GetPreferenceDir() + "/playlists", name);
-    if (file.empty())
+    const playlist::PlaylistFileEntries entries = playlist::ReadPersonalPlaylist(
+        webMan.GetPreferenceDir().c_str(), name, medialib::AudioSharePath());
+    if (entries.status == playlist::PlaylistFileStatus::missing)
         return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
-    return ListPlaylistFile(file, reply);
+    return ListPlaylistEntries(entries, reply);
 }
 
 int LibraryApi::ListSharedPlaylist(const std::string& id, Json::Value& reply) {
@@ -267,12 +234,16 @@ int LibraryApi::ListSharedPlaylist(const std::string& id, Json::Value& reply) {
 
 int LibraryApi::ListRandomPlaylist(Json::Value& reply) {
     // The file that "New Random 100" drew for this user; none yet is an empty list.
-    return ListPlaylistFile(kRandomPlaylistPrefix + webMan.GetLoginUserName(), reply, true);
+    return ListPlaylistFile(paths::kRandom100Prefix + webMan.GetLoginUserName(), reply, true);
 }
 
 int LibraryApi::ListPlaylistFile(const std::string& file, Json::Value& reply, bool missingIsEmpty) {
-    const playlist::PlaylistFileEntries entries =
-        playlist::ReadPlaylistFile(file, medialib::AudioSharePath());
+    return ListPlaylistEntries(playlist::ReadPlaylistFile(file, medialib::AudioSharePath()), reply,
+                               missingIsEmpty);
+}
+
+int LibraryApi::ListPlaylistEntries(const playlist::PlaylistFileEntries& entries,
+                                    Json::Value& reply, bool missingIsEmpty) {
     if (entries.status == playlist::PlaylistFileStatus::missing && missingIsEmpty)
         return 1;
     if (entries.status == playlist::PlaylistFileStatus::tooLarge)

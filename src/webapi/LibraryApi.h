@@ -14,6 +14,7 @@
 
 #include "platform/cgi/ActionHandler.h"
 #include "platform/dma/DMAParser.h"
+#include "platform/playlist/PlaylistFile.h"
 #include "src/webapi/TrackCatalog.h"
 
 namespace harmona::webapi {
@@ -37,6 +38,8 @@ class LibraryApi : public ActionHandler {
     // The tracks of a playlist file (relative entries from the audio share); a missing file is an
     // empty list when `missingIsEmpty`, else not found.
     int ListPlaylistFile(const std::string& file, Json::Value& reply, bool missingIsEmpty = false);
+    int ListPlaylistEntries(const playlist::PlaylistFileEntries& entries, Json::Value& reply,
+                            bool missingIsEmpty = false);
     // The tracks of a playlist's paths, in order; paths the library does not hold are counted in
     // "missing" (their paths are never shown).
     void AppendPlaylistTracks(const std::vector<std::string>& paths, Json::Value& reply);

@@ -1,64 +1,16 @@
 #include "src/webapi/TrackCatalog.h"
 
-#include <cstdlib>
 #include <string_view>
-
-#include "platform/medialib/MediaFiles.h"
+#include <utility>
 
 namespace harmona::webapi {
 
 namespace {
 
-constexpr std::size_t kMaxTrackIdDigits = 18;
-constexpr std::size_t kMaxExtensionLength = 8;
-constexpr std::string_view kHttpScheme = "http://";
-constexpr std::string_view kMediaPath = "/media/";
 constexpr const char* kTrackColumns =
     "SELECT id, path, title, artist, album, duration_ms FROM track";
 
-bool AllDigits(std::string_view text) {
-    return !text.empty() && text.find_first_not_of("0123456789") == std::string_view::npos;
-}
-
-bool IsExtension(std::string_view text) {
-    return !text.empty() && text.size() <= kMaxExtensionLength &&
-           text.find_first_not_of("abcdefghijklmnopqrstuvwxyz0123456789") == std::string_view::npos;
-}
-
 }  // namespace
-
-std::optional<StreamName> ParseStreamId(const std::string& stream) {
-    const std::size_t dot = stream.find('.');
-    const std::string_view digits = std::string_view(stream).substr(0, dot);
-    if (!AllDigits(digits) || digits.size() > kMaxTrackIdDigits)
-        return std::nullopt;
-    StreamName name;
-    if (dot != std::string::npos) {
-        name.extension = stream.substr(dot + 1);
-        if (!IsExtension(name.extension))
-            return std::nullopt;
-    }
-    name.trackId = std::strtoll(std::string(digits).c_str(), nullptr, 10);
-    return name;
-}
-
-std::string StreamIdOf(std::int64_t trackId, const std::string& path) {
-    const std::string extension = medialib::LowerExtension(path);
-    return extension.empty() ? std::to_string(trackId) : std::to_string(trackId) + "." + extension;
-}
-
-std::optional<std::int64_t> TrackIdOfLocalResource(const std::string& url) {
-    // The server names itself by the address it announces on the network, so only the path counts.
-    if (url.compare(0, kHttpScheme.size(), kHttpScheme) != 0)
-        return std::nullopt;
-    const std::size_t path = url.find('/', kHttpScheme.size());
-    if (path == std::string::npos || url.compare(path, kMediaPath.size(), kMediaPath) != 0)
-        return std::nullopt;
-    const std::optional<StreamName> name = ParseStreamId(url.substr(path + kMediaPath.size()));
-    if (!name)
-        return std::nullopt;
-    return name->trackId;
-}
 
 bool TrackCatalog::Open(const char* path) {
     library_ = medialib::OpenLibrary(path);
@@ -75,14 +27,19 @@ bool TrackCatalog::Open(const char* path) {
 std::optional<Track> TrackCatalog::StepOne(sqlite::Statement& statement) {
     std::optional<Track> track;
     if (statement.Step() == SQLITE_ROW && statement.ColumnType(0) == SQLITE_INTEGER) {
-        track.emplace();
-        track->id = statement.ColumnInt64(0);
-        track->stream = StreamIdOf(track->id, std::string(statement.ColumnText(1)));
-        track->title = statement.ColumnText(2);
-        track->artist = statement.ColumnText(3);
-        track->album = statement.ColumnText(4);
-        if (statement.ColumnType(5) == SQLITE_INTEGER && statement.ColumnInt64(5) >= 0)
-            track->durationMs = statement.ColumnInt64(5);
+        const std::int64_t id = statement.ColumnInt64(0);
+        // A track that no stream name can carry cannot be played: it is not offered.
+        if (std::optional<std::string> stream =
+                medialib::StreamNameOf(id, std::string(statement.ColumnText(1)))) {
+            track.emplace();
+            track->id = id;
+            track->stream = std::move(*stream);
+            track->title = statement.ColumnText(2);
+            track->artist = statement.ColumnText(3);
+            track->album = statement.ColumnText(4);
+            if (statement.ColumnType(5) == SQLITE_INTEGER && statement.ColumnInt64(5) >= 0)
+                track->durationMs = statement.ColumnInt64(5);
+        }
     }
     statement.Reset();
     return track;
@@ -103,7 +60,7 @@ std::optional<Track> TrackCatalog::ByPath(const std::string& path) {
 }
 
 std::optional<Track> TrackCatalog::ByStreamId(const std::string& stream) {
-    const std::optional<StreamName> name = ParseStreamId(stream);
+    const std::optional<medialib::StreamName> name = medialib::ParseStreamName(stream);
     if (!name)
         return std::nullopt;
     std::optional<Track> track = ById(name->trackId);
