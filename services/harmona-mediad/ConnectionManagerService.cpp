@@ -8,7 +8,6 @@
 namespace harmona::mediad {
 namespace {
 
-constexpr int kErrorInvalidAction = 401;
 constexpr int kErrorInvalidConnection = 706;
 
 // Every MIME type of the library's audio file types (platform/medialib/MediaFiles.h).
@@ -34,29 +33,38 @@ void CurrentConnectionInfo(gupnp::ServiceAction& action) {
 
 ConnectionManagerService::ConnectionManagerService(GUPnPService* service)
     : service_(gupnp::ObjectRef<GUPnPService>::Share(service)) {
-    // GUPnP answers 401 itself unless a handler is connected for the action's own detail.
-    for (const char* action :
-         {"action-invoked::GetProtocolInfo", "action-invoked::GetCurrentConnectionIDs",
-          "action-invoked::GetCurrentConnectionInfo"})
-        connections_.emplace_back(service, action, G_CALLBACK(&OnAction), this);
+    const struct {
+        const char* signal;
+        GCallback handler;
+    } actions[] = {
+        {"action-invoked::GetProtocolInfo", G_CALLBACK(&OnGetProtocolInfo)},
+        {"action-invoked::GetCurrentConnectionIDs", G_CALLBACK(&OnGetCurrentConnectionIds)},
+        {"action-invoked::GetCurrentConnectionInfo", G_CALLBACK(&OnGetCurrentConnectionInfo)},
+    };
+    for (const auto& action : actions)
+        connections_.emplace_back(service, action.signal, action.handler, this);
     connections_.emplace_back(service, "query-variable", G_CALLBACK(&OnQueryVariable), this);
 }
 
-void ConnectionManagerService::OnAction(GUPnPService*, GUPnPServiceAction* invoked, gpointer) {
+void ConnectionManagerService::OnGetProtocolInfo(GUPnPService*, GUPnPServiceAction* invoked,
+                                                 gpointer) {
     gupnp::ServiceAction action(invoked);
-    const std::string name = action.name() != nullptr ? action.name() : "";
-    if (name == "GetProtocolInfo") {
-        action.SetString("Source", kSourceProtocols);
-        action.SetString("Sink", "");
-        action.ReturnSuccess();
-    } else if (name == "GetCurrentConnectionIDs") {
-        action.SetString("ConnectionIDs", "0");
-        action.ReturnSuccess();
-    } else if (name == "GetCurrentConnectionInfo") {
-        CurrentConnectionInfo(action);
-    } else {
-        action.ReturnError(kErrorInvalidAction, "Invalid Action");
-    }
+    action.SetString("Source", kSourceProtocols);
+    action.SetString("Sink", "");
+    action.ReturnSuccess();
+}
+
+void ConnectionManagerService::OnGetCurrentConnectionIds(GUPnPService*, GUPnPServiceAction* invoked,
+                                                         gpointer) {
+    gupnp::ServiceAction action(invoked);
+    action.SetString("ConnectionIDs", "0");
+    action.ReturnSuccess();
+}
+
+void ConnectionManagerService::OnGetCurrentConnectionInfo(GUPnPService*,
+                                                          GUPnPServiceAction* invoked, gpointer) {
+    gupnp::ServiceAction action(invoked);
+    CurrentConnectionInfo(action);
 }
 
 void ConnectionManagerService::OnQueryVariable(GUPnPService*, const char* variable, GValue* value,

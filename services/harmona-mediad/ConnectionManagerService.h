@@ -18,7 +18,13 @@ class ConnectionManagerService {
     ConnectionManagerService& operator=(const ConnectionManagerService&) = delete;
 
   private:
-    static void OnAction(GUPnPService* service, GUPnPServiceAction* action, gpointer self);
+    // One handler per action, each connected once for its own name; GUPnP answers 401 Invalid
+    // Action for any other.
+    static void OnGetProtocolInfo(GUPnPService* service, GUPnPServiceAction* action, gpointer self);
+    static void OnGetCurrentConnectionIds(GUPnPService* service, GUPnPServiceAction* action,
+                                          gpointer self);
+    static void OnGetCurrentConnectionInfo(GUPnPService* service, GUPnPServiceAction* action,
+                                           gpointer self);
     static void OnQueryVariable(GUPnPService* service, const char* variable, GValue* value,
                                 gpointer self);
 

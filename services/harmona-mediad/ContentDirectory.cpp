@@ -394,14 +394,6 @@ bool ContentDirectory::LookUpTrack(int64_t id, TrackFile* file) const {
     return true;
 }
 
-bool ContentDirectory::LookUpTrackFile(int64_t id, std::string* path) const {
-    TrackFile file;
-    if (!LookUpTrack(id, &file))
-        return false;
-    *path = file.path;
-    return true;
-}
-
 bool ContentDirectory::LookUpArtFile(int64_t id, std::string* path) const {
     sqlite::Database db = sqlite::Database::OpenReadOnly(dbPath_.c_str(), kLookUpBusyTimeoutMs);
     // An index of an older indexer has no art_path column: then no track has art.

@@ -97,7 +97,6 @@ class ContentDirectory {
     std::string LoadedContainerUpdateIds() const;
 
     // The file of track `id` as the index has it; false when there is no such track.
-    bool LookUpTrackFile(int64_t id, std::string* path) const;
     bool LookUpTrack(int64_t id, TrackFile* file) const;
     // The album art image of track `id` (its folder's cover file); false when it has none.
     bool LookUpArtFile(int64_t id, std::string* path) const;

@@ -12,8 +12,6 @@
 namespace harmona::mediad {
 namespace {
 
-constexpr int kErrorInvalidAction = 401;
-
 bool ParseUnsigned(const std::string& text, uint32_t* value) {
     std::string digits = text;
     digits.erase(0, digits.find_first_not_of(" \t\r\n"));
@@ -89,31 +87,43 @@ ContentDirectoryService::ContentDirectoryService(GUPnPService* service,
       directory_(std::move(directory)),
       mediaBaseUrl_(std::move(mediaBaseUrl)),
       announcedUpdateId_(directory_->LoadedSystemUpdateId()) {
-    // GUPnP answers 401 itself unless a handler is connected for the action's own detail.
-    for (const char* action :
-         {"action-invoked::Browse", "action-invoked::GetSearchCapabilities",
-          "action-invoked::GetSortCapabilities", "action-invoked::GetSystemUpdateID"})
-        connections_.emplace_back(service, action, G_CALLBACK(&OnAction), this);
+    const struct {
+        const char* signal;
+        GCallback handler;
+    } actions[] = {
+        {"action-invoked::Browse", G_CALLBACK(&OnBrowse)},
+        {"action-invoked::GetSearchCapabilities", G_CALLBACK(&OnGetSearchCapabilities)},
+        {"action-invoked::GetSortCapabilities", G_CALLBACK(&OnGetSortCapabilities)},
+        {"action-invoked::GetSystemUpdateID", G_CALLBACK(&OnGetSystemUpdateId)},
+    };
+    for (const auto& action : actions)
+        connections_.emplace_back(service, action.signal, action.handler, this);
     connections_.emplace_back(service, "query-variable", G_CALLBACK(&OnQueryVariable), this);
 }
 
-void ContentDirectoryService::OnAction(GUPnPService*, GUPnPServiceAction* invoked, gpointer self) {
+void ContentDirectoryService::OnBrowse(GUPnPService*, GUPnPServiceAction* invoked, gpointer self) {
     auto* me = static_cast<ContentDirectoryService*>(self);
+    Browse(me->directory_, me->mediaBaseUrl_, gupnp::ServiceAction(invoked));
+}
+
+void ContentDirectoryService::OnGetSearchCapabilities(GUPnPService*, GUPnPServiceAction* invoked,
+                                                      gpointer) {
     gupnp::ServiceAction action(invoked);
-    const std::string name = action.name() != nullptr ? action.name() : "";
-    if (name == "Browse") {
-        Browse(me->directory_, me->mediaBaseUrl_, std::move(action));
-    } else if (name == "GetSearchCapabilities") {
-        action.SetString("SearchCaps", kSearchCapabilities);
-        action.ReturnSuccess();
-    } else if (name == "GetSortCapabilities") {
-        action.SetString("SortCaps", kSortCapabilities);
-        action.ReturnSuccess();
-    } else if (name == "GetSystemUpdateID") {
-        GetSystemUpdateId(me->directory_, std::move(action));
-    } else {
-        action.ReturnError(kErrorInvalidAction, "Invalid Action");
-    }
+    action.SetString("SearchCaps", kSearchCapabilities);
+    action.ReturnSuccess();
+}
+
+void ContentDirectoryService::OnGetSortCapabilities(GUPnPService*, GUPnPServiceAction* invoked,
+                                                    gpointer) {
+    gupnp::ServiceAction action(invoked);
+    action.SetString("SortCaps", kSortCapabilities);
+    action.ReturnSuccess();
+}
+
+void ContentDirectoryService::OnGetSystemUpdateId(GUPnPService*, GUPnPServiceAction* invoked,
+                                                  gpointer self) {
+    auto* me = static_cast<ContentDirectoryService*>(self);
+    GetSystemUpdateId(me->directory_, gupnp::ServiceAction(invoked));
 }
 
 void ContentDirectoryService::OnQueryVariable(GUPnPService*, const char* variable, GValue* value,

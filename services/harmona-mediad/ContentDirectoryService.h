@@ -33,7 +33,15 @@ class ContentDirectoryService {
     void NotifyIfChanged();
 
   private:
-    static void OnAction(GUPnPService* service, GUPnPServiceAction* action, gpointer self);
+    // One handler per action, each connected once for its own name; GUPnP answers 401 Invalid
+    // Action for any other.
+    static void OnBrowse(GUPnPService* service, GUPnPServiceAction* action, gpointer self);
+    static void OnGetSearchCapabilities(GUPnPService* service, GUPnPServiceAction* action,
+                                        gpointer self);
+    static void OnGetSortCapabilities(GUPnPService* service, GUPnPServiceAction* action,
+                                      gpointer self);
+    static void OnGetSystemUpdateId(GUPnPService* service, GUPnPServiceAction* action,
+                                    gpointer self);
     static void OnQueryVariable(GUPnPService* service, const char* variable, GValue* value,
                                 gpointer self);
 

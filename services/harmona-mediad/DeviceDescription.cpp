@@ -4,12 +4,15 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <pugixml.hpp>
+
 #include <cctype>
 #include <cerrno>
 #include <cstring>
 
 #include "common/io/FileDescriptor.h"
 #include "common/util/XmlEscape.h"
+#include "platform/plugin/Plugin.h"
 
 namespace harmona::mediad {
 namespace {
@@ -17,106 +20,58 @@ namespace {
 // The same escaping as the browse library's requests (platform/dma).
 using harmona::util::XmlText;
 
-constexpr const char* kContentDirectoryId = "urn:upnp-org:serviceId:ContentDirectory";
-constexpr const char* kConnectionManagerId = "urn:upnp-org:serviceId:ConnectionManager";
-constexpr const char* kContentDirectoryScpdFile = "ContentDirectory.xml";
-constexpr const char* kConnectionManagerScpdFile = "ConnectionManager.xml";
+// No description file is near this; a larger one is not ours.
+constexpr std::size_t kMaxDataFileBytes = 256 * 1024;
 
-inline constexpr const char* kContentDirectoryScpdPath = "/upnp/ContentDirectory.xml";
-inline constexpr const char* kConnectionManagerScpdPath = "/upnp/ConnectionManager.xml";
-inline constexpr const char* kSourceProtocols =
-    "http-get:*:audio/mpeg:*,http-get:*:audio/mp4:*,http-get:*:audio/aac:*,"
-    "http-get:*:audio/ogg:*,http-get:*:audio/flac:*,http-get:*:audio/wav:*,"
-    "http-get:*:audio/aiff:*,http-get:*:audio/x-ms-wma:*,http-get:*:audio/ac3:*,"
-    "http-get:*:audio/x-ape:*,http-get:*:audio/x-pn-realaudio:*";
+bool IsDirectory(const std::string& path) {
+    struct stat st {};
+    return stat(path.c_str(), &st) == 0 && S_ISDIR(st.st_mode);
+}
 
-inline constexpr const char* kContentDirectoryScpd = R"XML(<?xml version="1.0"?>
-<scpd xmlns="urn:schemas-upnp-org:service-1-0">
-<specVersion><major>1</major><minor>0</minor></specVersion>
-<actionList>
-<action><name>GetSearchCapabilities</name><argumentList>
-<argument><name>SearchCaps</name><direction>out</direction><relatedStateVariable>SearchCapabilities</relatedStateVariable></argument>
-</argumentList></action>
-<action><name>GetSortCapabilities</name><argumentList>
-<argument><name>SortCaps</name><direction>out</direction><relatedStateVariable>SortCapabilities</relatedStateVariable></argument>
-</argumentList></action>
-<action><name>GetSystemUpdateID</name><argumentList>
-<argument><name>Id</name><direction>out</direction><relatedStateVariable>SystemUpdateID</relatedStateVariable></argument>
-</argumentList></action>
-<action><name>Browse</name><argumentList>
-<argument><name>ObjectID</name><direction>in</direction><relatedStateVariable>A_ARG_TYPE_ObjectID</relatedStateVariable></argument>
-<argument><name>BrowseFlag</name><direction>in</direction><relatedStateVariable>A_ARG_TYPE_BrowseFlag</relatedStateVariable></argument>
-<argument><name>Filter</name><direction>in</direction><relatedStateVariable>A_ARG_TYPE_Filter</relatedStateVariable></argument>
-<argument><name>StartingIndex</name><direction>in</direction><relatedStateVariable>A_ARG_TYPE_Index</relatedStateVariable></argument>
-<argument><name>RequestedCount</name><direction>in</direction><relatedStateVariable>A_ARG_TYPE_Count</relatedStateVariable></argument>
-<argument><name>SortCriteria</name><direction>in</direction><relatedStateVariable>A_ARG_TYPE_SortCriteria</relatedStateVariable></argument>
-<argument><name>Result</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_Result</relatedStateVariable></argument>
-<argument><name>NumberReturned</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_Count</relatedStateVariable></argument>
-<argument><name>TotalMatches</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_Count</relatedStateVariable></argument>
-<argument><name>UpdateID</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_UpdateID</relatedStateVariable></argument>
-</argumentList></action>
-</actionList>
-<serviceStateTable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_ObjectID</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_Result</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_BrowseFlag</name><dataType>string</dataType>
-<allowedValueList><allowedValue>BrowseMetadata</allowedValue><allowedValue>BrowseDirectChildren</allowedValue></allowedValueList></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_Filter</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_SortCriteria</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_Index</name><dataType>ui4</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_Count</name><dataType>ui4</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_UpdateID</name><dataType>ui4</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>SearchCapabilities</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>SortCapabilities</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="yes"><name>SystemUpdateID</name><dataType>ui4</dataType></stateVariable>
-<stateVariable sendEvents="yes"><name>ContainerUpdateIDs</name><dataType>string</dataType></stateVariable>
-</serviceStateTable>
-</scpd>
-)XML";
+// The whole of a data file, which must be well-formed XML. False with `error` naming the file.
+bool ReadDataFile(const std::string& path, std::string& text, std::string& error) {
+    const io::FileDescriptor fd(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    struct stat st {};
+    if (!fd || fstat(fd.Get(), &st) != 0) {
+        error = "cannot read " + path + ": " + std::strerror(errno);
+        return false;
+    }
+    if (!S_ISREG(st.st_mode) || static_cast<std::size_t>(st.st_size) > kMaxDataFileBytes) {
+        error = "cannot read " + path + ": not a description file";
+        return false;
+    }
+    text.assign(static_cast<std::size_t>(st.st_size), '\0');
+    std::size_t done = 0;
+    while (done < text.size()) {
+        const ssize_t got = read(fd.Get(), &text[done], text.size() - done);
+        if (got < 0 && errno == EINTR)
+            continue;
+        if (got <= 0) {
+            error = "cannot read " + path + ": " + (got < 0 ? std::strerror(errno) : "cut short");
+            return false;
+        }
+        done += static_cast<std::size_t>(got);
+    }
+    return true;
+}
 
-inline constexpr const char* kConnectionManagerScpd = R"XML(<?xml version="1.0"?>
-<scpd xmlns="urn:schemas-upnp-org:service-1-0">
-<specVersion><major>1</major><minor>0</minor></specVersion>
-<actionList>
-<action><name>GetProtocolInfo</name><argumentList>
-<argument><name>Source</name><direction>out</direction><relatedStateVariable>SourceProtocolInfo</relatedStateVariable></argument>
-<argument><name>Sink</name><direction>out</direction><relatedStateVariable>SinkProtocolInfo</relatedStateVariable></argument>
-</argumentList></action>
-<action><name>GetCurrentConnectionIDs</name><argumentList>
-<argument><name>ConnectionIDs</name><direction>out</direction><relatedStateVariable>CurrentConnectionIDs</relatedStateVariable></argument>
-</argumentList></action>
-<action><name>GetCurrentConnectionInfo</name><argumentList>
-<argument><name>ConnectionID</name><direction>in</direction><relatedStateVariable>A_ARG_TYPE_ConnectionID</relatedStateVariable></argument>
-<argument><name>RcsID</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_RcsID</relatedStateVariable></argument>
-<argument><name>AVTransportID</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_AVTransportID</relatedStateVariable></argument>
-<argument><name>ProtocolInfo</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_ProtocolInfo</relatedStateVariable></argument>
-<argument><name>PeerConnectionManager</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_ConnectionManager</relatedStateVariable></argument>
-<argument><name>PeerConnectionID</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_ConnectionID</relatedStateVariable></argument>
-<argument><name>Direction</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_Direction</relatedStateVariable></argument>
-<argument><name>Status</name><direction>out</direction><relatedStateVariable>A_ARG_TYPE_ConnectionStatus</relatedStateVariable></argument>
-</argumentList></action>
-</actionList>
-<serviceStateTable>
-<stateVariable sendEvents="yes"><name>SourceProtocolInfo</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="yes"><name>SinkProtocolInfo</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="yes"><name>CurrentConnectionIDs</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_ConnectionStatus</name><dataType>string</dataType>
-<allowedValueList><allowedValue>OK</allowedValue><allowedValue>ContentFormatMismatch</allowedValue><allowedValue>InsufficientBandwidth</allowedValue><allowedValue>UnreliableChannel</allowedValue><allowedValue>Unknown</allowedValue></allowedValueList></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_ConnectionManager</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_Direction</name><dataType>string</dataType>
-<allowedValueList><allowedValue>Input</allowedValue><allowedValue>Output</allowedValue></allowedValueList></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_ProtocolInfo</name><dataType>string</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_ConnectionID</name><dataType>i4</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_AVTransportID</name><dataType>i4</dataType></stateVariable>
-<stateVariable sendEvents="no"><name>A_ARG_TYPE_RcsID</name><dataType>i4</dataType></stateVariable>
-</serviceStateTable>
-</scpd>
-)XML";
+bool IsWellFormed(const std::string& text, const std::string& path, std::string& error) {
+    pugi::xml_document document;
+    const pugi::xml_parse_result parsed = document.load_buffer(text.data(), text.size());
+    if (!parsed)
+        error = path + " is not well-formed XML (" + parsed.description() + " at byte " +
+                std::to_string(parsed.offset) + ")";
+    return static_cast<bool>(parsed);
+}
 
-std::string ServiceElement(const char* type, const char* id, const char* scpd, const char* name) {
-    return std::string("<service><serviceType>") + type + "</serviceType><serviceId>" + id +
-           "</serviceId><SCPDURL>/" + scpd + "</SCPDURL><controlURL>/" + name +
-           "/control</controlURL><eventSubURL>/" + name + "/event</eventSubURL></service>";
+// Replaces the one `mark` in `text` by `value`; false when there is not exactly one.
+bool ReplaceMark(std::string& text, const char* mark, const std::string& value) {
+    const std::size_t at = text.find(mark);
+    const std::size_t length = std::strlen(mark);
+    if (at == std::string::npos || text.find(mark, at + length) != std::string::npos)
+        return false;
+    text.replace(at, length, value);
+    return true;
 }
 
 bool WriteWholeFile(const std::string& path, const std::string& text) {
@@ -127,11 +82,18 @@ bool WriteWholeFile(const std::string& path, const std::string& text) {
         return false;
     const bool written =
         write(fd.Get(), text.data(), text.size()) == static_cast<ssize_t>(text.size());
-    fchmod(fd.Get(), 0644);  // whatever the umask: the unprivileged server reads these
+    fchmod(fd.Get(), 0644);  // whatever the umask: the unprivileged server reads it
     return fd.Close() && written;
 }
 
 }  // namespace
+
+std::string DescriptionDataFolder() {
+    const std::string directory = plugin::ProgramDirectory();
+    if (!directory.empty() && IsDirectory(directory + kDataFolderBesideProgram))
+        return directory + kDataFolderBesideProgram;
+    return HARMONA_MEDIAD_DATA_DIR;
+}
 
 std::string MakeUdn() {
     std::string hex;
@@ -158,44 +120,55 @@ std::string DefaultFriendlyName() {
     return std::string("Harmona Music Library (") + name + ")";
 }
 
-std::string DeviceDescription(const std::string& udn, const std::string& friendlyName) {
-    return "<?xml version=\"1.0\"?>\n"
-           "<root xmlns=\"urn:schemas-upnp-org:device-1-0\">"
-           "<specVersion><major>1</major><minor>0</minor></specVersion>"
-           "<device><deviceType>" +
-           std::string(kMediaServerType) + "</deviceType><friendlyName>" + XmlText(friendlyName) +
-           "</friendlyName><manufacturer>Harmona</manufacturer>"
-           "<modelDescription>Harmona music library</modelDescription>"
-           "<modelName>harmona-mediad</modelName><modelNumber>1</modelNumber><UDN>" +
-           udn + "</UDN><serviceList>" +
-           ServiceElement(kContentDirectoryType, kContentDirectoryId, kContentDirectoryScpdFile,
-                          "ContentDirectory") +
-           ServiceElement(kConnectionManagerType, kConnectionManagerId, kConnectionManagerScpdFile,
-                          "ConnectionManager") +
-           "</serviceList></device></root>\n";
+bool FillDescription(const std::string& templateText, const std::string& udn,
+                     const std::string& friendlyName, std::string& description,
+                     std::string& error) {
+    description = templateText;
+    for (const auto& [mark, value] : {std::make_pair(kUdnMark, XmlText(udn)),
+                                      std::make_pair(kFriendlyNameMark, XmlText(friendlyName))}) {
+        if (!ReplaceMark(description, mark, value)) {
+            error =
+                std::string("the device description template must hold ") + mark + " exactly once";
+            return false;
+        }
+    }
+    return true;
 }
 
-bool WriteDescriptionFolder(const std::string& folder, const std::string& udn, std::string& error) {
-    if (mkdir(folder.c_str(), 0755) != 0 && errno != EEXIST) {
-        error = "cannot create " + folder + ": " + std::strerror(errno);
+bool PrepareDescriptions(const std::string& dataFolder, const std::string& runFolder,
+                         const std::string& udn, DescriptionFiles& files, std::string& error) {
+    const std::string templatePath = dataFolder + "/" + kDescriptionTemplateFile;
+    const std::string servicesFolder = dataFolder + "/" + kServicesFolder;
+    std::string templateText, description, scpd;
+    if (!ReadDataFile(templatePath, templateText, error) ||
+        !IsWellFormed(templateText, templatePath, error))
+        return false;
+    if (!FillDescription(templateText, udn, DefaultFriendlyName(), description, error)) {
+        error = templatePath + ": " + error;
         return false;
     }
-    chmod(folder.c_str(), 0755);
-    const std::string base = folder + "/";
-    if (!WriteWholeFile(base + kDescriptionFile, DeviceDescription(udn, DefaultFriendlyName())) ||
-        !WriteWholeFile(base + kContentDirectoryScpdFile, kContentDirectoryScpd) ||
-        !WriteWholeFile(base + kConnectionManagerScpdFile, kConnectionManagerScpd)) {
-        error = "cannot write the device description into " + folder;
+    for (const char* file : {kContentDirectoryScpdFile, kConnectionManagerScpdFile}) {
+        const std::string path = servicesFolder + "/" + file;
+        if (!ReadDataFile(path, scpd, error) || !IsWellFormed(scpd, path, error))
+            return false;
+    }
+    if (mkdir(runFolder.c_str(), 0755) != 0 && errno != EEXIST) {
+        error = "cannot create " + runFolder + ": " + std::strerror(errno);
+        return false;
+    }
+    chmod(runFolder.c_str(), 0755);
+    files.descriptionPath = runFolder + "/" + kDescriptionTemplateFile;
+    files.servicesFolder = servicesFolder;
+    if (!WriteWholeFile(files.descriptionPath, description)) {
+        error = "cannot write the device description into " + runFolder;
         return false;
     }
     return true;
 }
 
-void RemoveDescriptionFolder(const std::string& folder) {
-    for (const char* file :
-         {kDescriptionFile, kContentDirectoryScpdFile, kConnectionManagerScpdFile})
-        unlink((folder + "/" + file).c_str());
-    rmdir(folder.c_str());
+void RemoveDescriptionFolder(const std::string& runFolder) {
+    unlink((runFolder + "/" + kDescriptionTemplateFile).c_str());
+    rmdir(runFolder.c_str());
 }
 
 }  // namespace harmona::mediad

@@ -167,14 +167,6 @@ void AppendItem(std::string& out, std::string_view id, std::string_view parentId
     out += "</item>";
 }
 
-std::string WriteDidl(const std::vector<DidlObject>& objects, std::string_view mediaBase) {
-    std::string out(kDidlBegin);
-    for (const DidlObject& object : objects)
-        AppendExpanded(out, DidlElement(object), DidlPieces{mediaBase, nullptr});
-    out += kDidlEnd;
-    return out;
-}
-
 std::string FormatDuration(int64_t milliseconds) {
     char text[48];
     const int64_t seconds = milliseconds / 1000;

@@ -69,9 +69,6 @@ void AppendItem(std::string& out, std::string_view id, std::string_view parentId
 // Appends `piece` with every mark replaced by what it stands for.
 void AppendExpanded(std::string& out, std::string_view piece, const DidlPieces& pieces);
 
-// The whole DIDL-Lite document of `objects`.
-std::string WriteDidl(const std::vector<DidlObject>& objects, std::string_view mediaBase);
-
 // "H:MM:SS.mmm" as res@duration wants it.
 std::string FormatDuration(int64_t milliseconds);
 

@@ -89,8 +89,11 @@ std::unique_ptr<ServedContext> ServedContext::Create(
                              std::to_string(gupnp_context_get_port(context)) + kMediaPath + "/";
     served->directory_ = std::move(directory);
     gupnp::Error gerror;
-    served->device_ = gupnp::ObjectRef<GUPnPRootDevice>::Adopt(gupnp_root_device_new(
-        context, kDescriptionFile, options.descriptionFolder.c_str(), gerror.out()));
+    // The filled description by its own (absolute) path; the service descriptions from their
+    // data folder, which GUPnP serves at the root.
+    served->device_ = gupnp::ObjectRef<GUPnPRootDevice>::Adopt(
+        gupnp_root_device_new(context, options.descriptions.descriptionPath.c_str(),
+                              options.descriptions.servicesFolder.c_str(), gerror.out()));
     if (!served->device_) {
         error = std::string("no root device on ") + served->address_ + ": " + gerror.message();
         return nullptr;

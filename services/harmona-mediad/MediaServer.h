@@ -19,6 +19,7 @@
 #include "services/harmona-mediad/ConnectionManagerService.h"
 #include "services/harmona-mediad/ContentDirectory.h"
 #include "services/harmona-mediad/ContentDirectoryService.h"
+#include "services/harmona-mediad/DeviceDescription.h"
 #include "services/harmona-mediad/MediaFileServer.h"
 #include "services/harmona-mediad/SubscriptionGuard.h"
 
@@ -33,7 +34,7 @@ struct MediaServerOptions {
     unsigned short port = kMediaServerPort;
     std::string dbPath;
     std::string sharePath;
-    std::string descriptionFolder;  // written by WriteDescriptionFolder
+    DescriptionFiles descriptions;  // made by PrepareDescriptions
 };
 
 // Everything served on one context (one interface address): the root device with its two

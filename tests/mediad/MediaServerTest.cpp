@@ -11,9 +11,12 @@
 #include <algorithm>
 #include <cctype>
 #include <chrono>
+#include <cstring>
+#include <pugixml.hpp>
 #include <set>
 #include <string>
 #include <thread>
+#include <vector>
 
 #include "platform/dma/DMABrowse.h"
 #include "platform/dma/DMAParser.h"
@@ -328,6 +331,102 @@ TEST_F(LocalMediaServer, TheDeviceAnswersAnSsdpSearchOnTheNetwork) {
         answer = SearchForMediaServer(1000);
     EXPECT_NE(answer.find("location: http://192.0.2.1:50003/"), std::string::npos) << answer;
     EXPECT_NE(answer.find("urn:schemas-upnp-org:device:mediaserver:1"), std::string::npos);
+}
+
+// The device description at the location the SSDP answer gives: this machine's UDN and friendly
+// name filled in, both services with the URLs they are served at, and each service description
+// served as the data file the build installs beside the program.
+TEST_F(LocalMediaServer, TheDescriptionOnTheWireNamesThisDeviceAndServesBothServiceDescriptions) {
+    SetUpNetwork();
+    std::string answer;
+    for (int attempt = 0; attempt < 10 && answer.empty(); ++attempt)
+        answer = SearchForMediaServer(1000);
+    const std::size_t at = answer.find("location: ");
+    ASSERT_NE(at, std::string::npos) << answer;
+    const std::string location =
+        answer.substr(at + 10, answer.find("\r\n", at) - (at + 10));  // lower-cased, as sent
+    const HttpReply reply = HttpGet(location);
+    ASSERT_EQ(reply.status, 200) << location;
+    pugi::xml_document description;
+    ASSERT_TRUE(description.load_string(reply.body.c_str())) << reply.body;
+    const pugi::xml_node device = description.child("root").child("device");
+    EXPECT_STREQ(device.child_value("deviceType"), "urn:schemas-upnp-org:device:MediaServer:1");
+    char host[256] = {};
+    gethostname(host, sizeof(host) - 1);
+    EXPECT_EQ(std::string(device.child_value("friendlyName")),
+              std::string("Harmona Music Library (") + host + ")");
+    const std::string udn = device.child_value("UDN");
+    EXPECT_EQ(udn.rfind("uuid:4861726d-", 0), 0u) << udn;
+    std::string lowerUdn = udn;
+    std::transform(lowerUdn.begin(), lowerUdn.end(), lowerUdn.begin(),
+                   [](unsigned char c) { return std::tolower(c); });
+    EXPECT_NE(answer.find("usn: " + lowerUdn + "::"), std::string::npos) << answer;
+    const std::string data = std::string(HARMONA_MEDIAD_DATA_BESIDE) + "/services/";
+    std::vector<std::string> types;
+    for (pugi::xml_node service : device.child("serviceList").children("service")) {
+        const std::string name = std::string(service.child_value("serviceId"))
+                                     .substr(std::strlen("urn:upnp-org:serviceId:"));
+        types.push_back(service.child_value("serviceType"));
+        EXPECT_EQ(std::string(service.child_value("SCPDURL")), "/" + name + ".xml");
+        EXPECT_EQ(std::string(service.child_value("controlURL")), "/" + name + "/control");
+        EXPECT_EQ(std::string(service.child_value("eventSubURL")), "/" + name + "/event");
+        const HttpReply scpd = HttpGet("http://127.0.0.1:50003/" + name + ".xml");
+        EXPECT_EQ(scpd.status, 200) << name;
+        EXPECT_EQ(scpd.body, ReadFile(data + name + ".xml")) << name;
+    }
+    EXPECT_EQ(types,
+              (std::vector<std::string>{"urn:schemas-upnp-org:service:ContentDirectory:1",
+                                        "urn:schemas-upnp-org:service:ConnectionManager:1"}));
+}
+
+// A SOAP action posted to one of the two services over a connection of its own; the raw response.
+std::string PostAction(const std::string& service, const std::string& action,
+                       const std::string& arguments = "") {
+    const std::string type = "urn:schemas-upnp-org:service:" + service + ":1";
+    const std::string body =
+        "<?xml version=\"1.0\" encoding=\"utf-8\"?>\n"
+        "<s:Envelope xmlns:s=\"http://schemas.xmlsoap.org/soap/envelope/\" "
+        "s:encodingStyle=\"http://schemas.xmlsoap.org/soap/encoding/\"><s:Body><u:" +
+        action + " xmlns:u=\"" + type + "\">" + arguments + "</u:" + action +
+        "></s:Body></s:Envelope>";
+    return RawHttpExchange("127.0.0.1", 50003,
+                           "POST /" + service +
+                               "/control HTTP/1.1\r\nHost: 127.0.0.1:50003\r\n"
+                               "Content-Type: text/xml; charset=\"utf-8\"\r\nSOAPAction: \"" +
+                               type + "#" + action +
+                               "\"\r\nContent-Length: " + std::to_string(body.size()) +
+                               "\r\nConnection: close\r\n\r\n" + body);
+}
+
+TEST_F(LocalMediaServer, AnActionNeitherServiceHasGets401InvalidAction) {
+    for (const auto& [service, action] :
+         {std::make_pair("ContentDirectory", "Search"),
+          std::make_pair("ContentDirectory", "GetProtocolInfo"),
+          std::make_pair("ConnectionManager", "PrepareForConnection"),
+          std::make_pair("ConnectionManager", "Browse")}) {
+        const std::string response = PostAction(service, action);
+        EXPECT_EQ(response.rfind("HTTP/1.1 500", 0), 0u) << service << " " << action << response;
+        EXPECT_NE(response.find("<errorCode>401</errorCode>"), std::string::npos) << response;
+        EXPECT_NE(response.find("<errorDescription>Invalid Action</errorDescription>"),
+                  std::string::npos)
+            << response;
+    }
+}
+
+TEST_F(LocalMediaServer, TheConnectionManagerAnswersItsThreeActions) {
+    const std::string protocols = PostAction("ConnectionManager", "GetProtocolInfo");
+    EXPECT_EQ(protocols.rfind("HTTP/1.1 200", 0), 0u) << protocols;
+    EXPECT_NE(protocols.find("<Source>http-get:*:audio/"), std::string::npos) << protocols;
+    EXPECT_NE(protocols.find("<Sink></Sink>"), std::string::npos) << protocols;
+    const std::string ids = PostAction("ConnectionManager", "GetCurrentConnectionIDs");
+    EXPECT_NE(ids.find("<ConnectionIDs>0</ConnectionIDs>"), std::string::npos) << ids;
+    const std::string info = PostAction("ConnectionManager", "GetCurrentConnectionInfo",
+                                        "<ConnectionID>0</ConnectionID>");
+    EXPECT_NE(info.find("<Direction>Output</Direction>"), std::string::npos) << info;
+    EXPECT_NE(info.find("<Status>OK</Status>"), std::string::npos) << info;
+    const std::string unknown = PostAction("ConnectionManager", "GetCurrentConnectionInfo",
+                                           "<ConnectionID>7</ConnectionID>");
+    EXPECT_NE(unknown.find("<errorCode>706</errorCode>"), std::string::npos) << unknown;
 }
 
 TEST_F(LocalMediaServer, TheRealCgiListsTheAlbumsOfTheShare) {

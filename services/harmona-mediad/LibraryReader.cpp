@@ -1,0 +1,76 @@
+#include "services/harmona-mediad/LibraryReader.h"
+
+#include <sys/stat.h>
+
+#include "common/util/Utf8.h"
+#include "platform/lib/sqlite/Database.h"
+#include "platform/medialib/LibrarySchema.h"
+
+namespace harmona::mediad {
+
+using sqlite::Database;
+using sqlite::Statement;
+
+namespace {
+
+constexpr int kBusyTimeoutMs = 5000;
+// Values written before tags were cut when indexed are cut here too: no reply carries more.
+constexpr std::size_t kMaxValueBytes = 1024;
+
+std::string Cut(std::string_view text) {
+    return std::string(util::CutUtf8(text, kMaxValueBytes));
+}
+
+bool HasColumn(Database& db, const char* column) {
+    Statement stmt = db.Prepare("PRAGMA table_info(track)");
+    while (stmt && stmt.Step() == SQLITE_ROW) {
+        if (stmt.ColumnText(1) == column)
+            return true;
+    }
+    return false;
+}
+
+}  // namespace
+
+bool ReadLibraryRows(const std::string& dbPath, LibraryRows& out) {
+    struct stat st {};
+    if (stat(dbPath.c_str(), &st) != 0)
+        return true;  // not indexed yet: an empty library
+    Database db = Database::OpenReadOnly(dbPath.c_str(), kBusyTimeoutMs);
+    if (!db || db.Execute("BEGIN") != SQLITE_OK)
+        return false;
+    const int64_t count = medialib::LibraryUpdateCount(db);
+    // Without the indexer's count (an index written by hand), the file's time stands in.
+    out.updateId = count >= 0 ? static_cast<uint32_t>(count & 0x7fffffff)
+                              : static_cast<uint32_t>(st.st_mtime) & 0x7fffffffU;
+    const std::string extra = std::string(HasColumn(db, "size") ? "size" : "NULL") + ", " +
+                              (HasColumn(db, "art_path") ? "art_path" : "NULL");
+    Statement stmt = db.Prepare(
+        "SELECT id, path, title, artist, album, album_artist, genre, year, track_no, disc_no, "
+        "duration_ms, added, " +
+        extra + " FROM track ORDER BY id");
+    if (!stmt)
+        return false;
+    int step;
+    while ((step = stmt.Step()) == SQLITE_ROW) {
+        LibraryRow row;
+        row.id = stmt.ColumnInt64(0);
+        row.path = std::string(stmt.ColumnText(1));
+        row.title = Cut(stmt.ColumnText(2));
+        row.artist = Cut(stmt.ColumnText(3));
+        row.album = Cut(stmt.ColumnText(4));
+        row.albumArtist = Cut(stmt.ColumnText(5));
+        row.genre = Cut(stmt.ColumnText(6));
+        row.year = stmt.ColumnInt64(7);
+        row.trackNo = stmt.ColumnInt64(8);
+        row.discNo = stmt.ColumnInt64(9);
+        row.durationMs = stmt.ColumnInt64(10);
+        row.added = stmt.ColumnInt64(11);
+        row.size = stmt.ColumnType(12) == SQLITE_NULL ? -1 : stmt.ColumnInt64(12);
+        row.artPath = std::string(stmt.ColumnText(13));
+        out.rows.push_back(std::move(row));
+    }
+    return step == SQLITE_DONE && db.Execute("COMMIT") == SQLITE_OK;
+}
+
+}  // namespace harmona::mediad

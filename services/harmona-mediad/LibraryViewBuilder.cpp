@@ -1,0 +1,303 @@
+#include "services/harmona-mediad/LibraryViewBuilder.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <map>
+#include <numeric>
+#include <tuple>
+
+#include "services/harmona-mediad/ObjectIds.h"
+
+namespace harmona::mediad {
+namespace {
+
+constexpr std::size_t kRandomCount = 100;
+constexpr std::size_t kLatestAlbumCount = 50;
+
+struct Category {
+    const char* id;
+    const char* title;
+};
+constexpr Category kCategories[] = {
+    {kAllMusicId, "All Music"},         {kFoldersId, "Folders"}, {kAlbumsId, "Albums"},
+    {kAlbumArtistsId, "Album Artists"}, {kGenresId, "Genres"},   {kRandomId, "Random 100"},
+    {kLatestAlbumsId, "Latest Albums"},
+};
+
+uint64_t SplitMix(uint64_t& state) {
+    uint64_t z = (state += 0x9e3779b97f4a7c15ULL);
+    z = (z ^ (z >> 30)) * 0xbf58476d1ce4e5b9ULL;
+    z = (z ^ (z >> 27)) * 0x94d049bb133111ebULL;
+    return z ^ (z >> 31);
+}
+
+}  // namespace
+
+uint32_t LibraryViewBuilder::AddContainer(const std::string& id, const std::string& parentId,
+                                          const std::string& title, const char* upnpClass) {
+    const auto index = static_cast<uint32_t>(view_.containers_.size());
+    ViewContainer container;
+    container.id = id;
+    container.parentId = parentId;
+    container.title = title;
+    view_.containers_.push_back(std::move(container));
+    containerClass_.push_back(upnpClass);
+    view_.containerIndex_.emplace(id, index);
+    return index;
+}
+
+void LibraryViewBuilder::Build() {
+    AddContainer(kRootId, "-1", "Music", kFolderClass);
+    for (const Category& category : kCategories) {
+        const uint32_t index = AddContainer(category.id, kRootId, category.title, kFolderClass);
+        category_.push_back(index);
+        view_.containers_[0].children.push_back({index, false});
+    }
+    view_.allMusic_ = category_[0];
+    view_.random_ = category_[5];
+    view_.tracks_.resize(rows_.size());
+    for (std::size_t i = 0; i < rows_.size(); ++i) {
+        const LibraryRow& row = rows_[i];
+        ViewTrack& track = view_.tracks_[i];
+        track.id = row.id;
+        track.title = row.title;
+        track.artist = row.artist;
+        track.album = row.album;
+        track.year = row.year;
+        track.trackNo = row.trackNo;
+        view_.trackIndex_.emplace(row.id, static_cast<uint32_t>(i));
+    }
+    RankTitles();
+    BuildFolders();
+    BuildAlbums();
+    BuildGenres();
+    BuildAllMusicAndRandom();
+    RenderTracks();
+    RenderContainers();
+    HashContents();
+}
+
+// --- Folders: the share's tree, each folder's subfolders (by name) before its tracks (by path).
+
+uint32_t LibraryViewBuilder::Folder(const std::string& relative) {
+    if (relative.empty())
+        return category_[1];
+    const auto found = folders_.find(relative);
+    if (found != folders_.end())
+        return found->second;
+    const std::size_t slash = relative.rfind('/');
+    const uint32_t parent = Folder(slash == std::string::npos ? "" : relative.substr(0, slash));
+    const std::string name = slash == std::string::npos ? relative : relative.substr(slash + 1);
+    const uint32_t index =
+        AddContainer(FolderId(relative), view_.containers_[parent].id, name, kFolderClass);
+    folders_.emplace(relative, index);
+    folderChildren_.resize(view_.containers_.size());
+    folderChildren_[parent].emplace_back(name, index);
+    return index;
+}
+
+// The folder container of a track's path; kNoIndex for a path outside the share or one that is
+// not a plain relative path (those show in the other views only).
+uint32_t LibraryViewBuilder::FolderOf(const std::string& path) {
+    const std::string prefix = share_ + "/";
+    if (path.compare(0, prefix.size(), prefix) != 0)
+        return kNoIndex;
+    const std::string relative = path.substr(prefix.size());
+    const std::size_t slash = relative.rfind('/');
+    const std::string folder = slash == std::string::npos ? "" : relative.substr(0, slash);
+    std::size_t start = 0;
+    while (!folder.empty() && start <= folder.size()) {
+        std::size_t end = folder.find('/', start);
+        if (end == std::string::npos)
+            end = folder.size();
+        const std::string part = folder.substr(start, end - start);
+        if (part.empty() || part == "." || part == "..")
+            return kNoIndex;
+        start = end + 1;
+    }
+    return Folder(folder);
+}
+
+void LibraryViewBuilder::BuildFolders() {
+    folderChildren_.resize(view_.containers_.size());
+    std::vector<uint32_t> byPath(rows_.size());
+    std::iota(byPath.begin(), byPath.end(), 0);
+    std::sort(byPath.begin(), byPath.end(),
+              [&](uint32_t a, uint32_t b) { return rows_[a].path < rows_[b].path; });
+    std::vector<std::vector<uint32_t>> tracksOf;
+    for (const uint32_t i : byPath) {
+        const uint32_t folder = FolderOf(rows_[i].path);
+        if (folder == kNoIndex)
+            continue;
+        view_.tracks_[i].folderIn = folder;
+        if (tracksOf.size() <= folder)
+            tracksOf.resize(folder + 1);
+        tracksOf[folder].push_back(i);
+    }
+    folderChildren_.resize(view_.containers_.size());
+    tracksOf.resize(view_.containers_.size());
+    for (uint32_t folder = 0; folder < folderChildren_.size(); ++folder) {
+        auto& subfolders = folderChildren_[folder];
+        if (subfolders.empty() && tracksOf[folder].empty())
+            continue;
+        std::sort(subfolders.begin(), subfolders.end());
+        for (const auto& [name, index] : subfolders)
+            view_.containers_[folder].children.push_back({index, false});
+        AddTrackChildren(folder, tracksOf[folder]);
+    }
+}
+
+// --- Albums (by album and album artist), album artists, latest albums ----------------------
+
+// Titles are compared once, for the whole library; every other listing sorts by the rank.
+void LibraryViewBuilder::RankTitles() {
+    byTitle_.resize(rows_.size());
+    std::iota(byTitle_.begin(), byTitle_.end(), 0);
+    std::sort(byTitle_.begin(), byTitle_.end(), [&](uint32_t a, uint32_t b) {
+        const int order = CompareNoCase(rows_[a].title, rows_[b].title);
+        return order != 0 ? order < 0 : rows_[a].id < rows_[b].id;
+    });
+    titleRank_.resize(rows_.size());
+    for (uint32_t rank = 0; rank < byTitle_.size(); ++rank)
+        titleRank_[byTitle_[rank]] = rank;
+}
+
+void LibraryViewBuilder::SortTracks(std::vector<uint32_t>& tracks, bool byDisc) const {
+    std::sort(tracks.begin(), tracks.end(), [&](uint32_t a, uint32_t b) {
+        const LibraryRow& x = rows_[a];
+        const LibraryRow& y = rows_[b];
+        if (byDisc && std::tie(x.discNo, x.trackNo) != std::tie(y.discNo, y.trackNo))
+            return std::tie(x.discNo, x.trackNo) < std::tie(y.discNo, y.trackNo);
+        return titleRank_[a] < titleRank_[b];
+    });
+}
+
+void LibraryViewBuilder::AddTrackChildren(uint32_t container, const std::vector<uint32_t>& tracks) {
+    auto& children = view_.containers_[container].children;
+    children.reserve(children.size() + tracks.size());
+    for (const uint32_t track : tracks)
+        children.push_back({track, true});
+}
+
+void LibraryViewBuilder::BuildAlbums() {
+    std::map<std::pair<std::string, std::string>, uint32_t> byKey;
+    for (uint32_t i = 0; i < rows_.size(); ++i) {
+        const LibraryRow& row = rows_[i];
+        if (row.album.empty())
+            continue;
+        const std::string& albumArtist = !row.albumArtist.empty() ? row.albumArtist : row.artist;
+        const auto [it, added] =
+            byKey.emplace(std::make_pair(row.album, albumArtist), albums_.size());
+        if (added)
+            albums_.push_back(LibraryAlbum{row.album, albumArtist, {}, 0, 0, {}, 0});
+        LibraryAlbum& album = albums_[it->second];
+        album.tracks.push_back(i);
+        album.year = std::max(album.year, row.year);
+        album.latestAdded = std::max(album.latestAdded, row.added);
+        if (album.artPath.empty() && !row.artPath.empty()) {
+            album.artPath = row.artPath;
+            album.artTrack = row.id;
+        }
+    }
+    std::vector<uint32_t> order(albums_.size());
+    std::iota(order.begin(), order.end(), 0);
+    const auto byName = [&](uint32_t a, uint32_t b) {
+        const int names = CompareNoCase(albums_[a].name, albums_[b].name);
+        return names != 0 ? names < 0 : albums_[a].albumArtist < albums_[b].albumArtist;
+    };
+    std::sort(order.begin(), order.end(), byName);
+    for (LibraryAlbum& album : albums_)
+        SortTracks(album.tracks, true);
+
+    const auto addAlbum = [&](const LibraryAlbum& album, const std::string& id, uint32_t parent,
+                              uint32_t ViewTrack::*in) {
+        const uint32_t index =
+            AddContainer(id, view_.containers_[parent].id, album.name, kAlbumClass);
+        ViewContainer& container = view_.containers_[index];
+        container.album = true;
+        container.artist = album.albumArtist;
+        container.year = album.year;
+        view_.containers_[parent].children.push_back({index, false});
+        AddTrackChildren(index, album.tracks);
+        for (const uint32_t track : album.tracks)
+            view_.tracks_[track].*in = index;
+    };
+    for (const uint32_t a : order)
+        addAlbum(albums_[a], AlbumId(albums_[a].albumArtist, albums_[a].name), category_[2],
+                 &ViewTrack::albumIn);
+
+    // Album artists, each with its albums; albums without an album artist belong to none.
+    std::map<std::string, std::vector<uint32_t>> byArtist;
+    for (const uint32_t a : order) {
+        if (!albums_[a].albumArtist.empty())
+            byArtist[albums_[a].albumArtist].push_back(a);
+    }
+    std::vector<const std::pair<const std::string, std::vector<uint32_t>>*> artists;
+    for (const auto& entry : byArtist)
+        artists.push_back(&entry);
+    std::stable_sort(artists.begin(), artists.end(), [](const auto* a, const auto* b) {
+        const int names = CompareNoCase(a->first, b->first);
+        return names != 0 ? names < 0 : a->first < b->first;
+    });
+    for (const auto* artist : artists) {
+        const uint32_t index =
+            AddContainer(ArtistId(artist->first), kAlbumArtistsId, artist->first, kArtistClass);
+        view_.containers_[category_[3]].children.push_back({index, false});
+        for (const uint32_t a : artist->second)
+            addAlbum(albums_[a], ArtistAlbumId(albums_[a].albumArtist, albums_[a].name), index,
+                     &ViewTrack::artistAlbumIn);
+    }
+
+    std::vector<uint32_t> latest = order;
+    std::stable_sort(latest.begin(), latest.end(), [&](uint32_t a, uint32_t b) {
+        return albums_[a].latestAdded > albums_[b].latestAdded;
+    });
+    latest.resize(std::min(latest.size(), kLatestAlbumCount));
+    for (const uint32_t a : latest)
+        addAlbum(albums_[a], LatestAlbumId(albums_[a].albumArtist, albums_[a].name), category_[6],
+                 &ViewTrack::latestAlbumIn);
+}
+
+void LibraryViewBuilder::BuildGenres() {
+    std::map<std::string, std::vector<uint32_t>> byGenre;
+    for (uint32_t i = 0; i < rows_.size(); ++i) {
+        if (!rows_[i].genre.empty())
+            byGenre[rows_[i].genre].push_back(i);
+    }
+    std::vector<std::pair<const std::string, std::vector<uint32_t>>*> genres;
+    for (auto& entry : byGenre)
+        genres.push_back(&entry);
+    std::stable_sort(genres.begin(), genres.end(), [](const auto* a, const auto* b) {
+        const int names = CompareNoCase(a->first, b->first);
+        return names != 0 ? names < 0 : a->first < b->first;
+    });
+    for (auto* genre : genres) {
+        const uint32_t index =
+            AddContainer(GenreId(genre->first), kGenresId, genre->first, kGenreClass);
+        view_.containers_[category_[4]].children.push_back({index, false});
+        SortTracks(genre->second, false);
+        AddTrackChildren(index, genre->second);
+        for (const uint32_t track : genre->second)
+            view_.tracks_[track].genreIn = index;
+    }
+}
+
+// All music by title; "random": 100 tracks drawn with a generator seeded by the update id, so
+// that every page of one listing, and every client, sees the same draw until the library changes.
+void LibraryViewBuilder::BuildAllMusicAndRandom() {
+    AddTrackChildren(category_[0], byTitle_);
+
+    std::vector<uint32_t> drawn(rows_.size());
+    std::iota(drawn.begin(), drawn.end(), 0);
+    uint64_t state = 0x68726d6e00000000ULL ^ view_.updateId_;
+    const std::size_t count = std::min(drawn.size(), kRandomCount);
+    for (std::size_t i = 0; i < count; ++i) {
+        const std::size_t pick = i + SplitMix(state) % (drawn.size() - i);
+        std::swap(drawn[i], drawn[pick]);
+        view_.tracks_[drawn[i]].inRandom = true;
+    }
+    drawn.resize(count);
+    AddTrackChildren(category_[5], drawn);
+}
+
+}  // namespace harmona::mediad

@@ -1,0 +1,76 @@
+// How a LibraryView is made from the rows of library.db, one job per file: the container builders
+// (LibraryViewBuilder.cpp: the root and its categories, folders, albums with album artists and
+// latest albums, genres, all music and the random draw), the DIDL-Lite rendering of every track and
+// container (LibraryViewDidl.cpp), and the content hashes that tell which containers changed
+// (LibraryViewChanges.cpp). Used by LibraryView::Load only.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <unordered_map>
+#include <utility>
+#include <vector>
+
+#include "services/harmona-mediad/LibraryReader.h"
+#include "services/harmona-mediad/LibraryView.h"
+
+namespace harmona::mediad {
+
+// The upnp:class of each kind of container; the rendering tells albums by theirs.
+inline constexpr const char* kFolderClass = "object.container.storageFolder";
+inline constexpr const char* kAlbumClass = "object.container.album.musicAlbum";
+inline constexpr const char* kArtistClass = "object.container.person.musicArtist";
+inline constexpr const char* kGenreClass = "object.container.genre.musicGenre";
+
+// An album as the rows make it: by album name and album artist.
+struct LibraryAlbum {
+    std::string name, albumArtist;
+    std::vector<uint32_t> tracks;
+    int64_t year = 0, latestAdded = 0;
+    std::string artPath;  // of its first track that has one
+    int64_t artTrack = 0;
+};
+
+class LibraryViewBuilder {
+  public:
+    LibraryViewBuilder(LibraryView& view, std::string share, LibraryRows rows)
+        : view_(view), share_(std::move(share)), rows_(std::move(rows.rows)) {
+        view_.updateId_ = rows.updateId;
+    }
+
+    // Every container with its children, then the DIDL-Lite of everything, then the hashes.
+    void Build();
+
+  private:
+    // Containers (LibraryViewBuilder.cpp).
+    uint32_t AddContainer(const std::string& id, const std::string& parentId,
+                          const std::string& title, const char* upnpClass);
+    uint32_t FolderOf(const std::string& path);
+    uint32_t Folder(const std::string& relative);
+    void BuildFolders();
+    void BuildAlbums();
+    void BuildGenres();
+    void BuildAllMusicAndRandom();
+    void RankTitles();
+    void SortTracks(std::vector<uint32_t>& tracks, bool byDisc) const;
+    void AddTrackChildren(uint32_t container, const std::vector<uint32_t>& tracks);
+    // DIDL-Lite (LibraryViewDidl.cpp).
+    void RenderTracks();
+    void RenderContainers();
+    std::string AlbumArtPath(const LibraryAlbum& album) const;
+    // Content hashes (LibraryViewChanges.cpp); after the rendering, which they cover.
+    void HashContents();
+
+    LibraryView& view_;
+    std::string share_;
+    std::vector<LibraryRow> rows_;
+    std::vector<uint32_t> byTitle_;    // every track, by title (NOCASE) and id
+    std::vector<uint32_t> titleRank_;  // each track's place in byTitle_
+    std::vector<uint32_t> category_;   // container index of each category row
+    std::unordered_map<std::string, uint32_t> folders_;
+    std::vector<std::vector<std::pair<std::string, uint32_t>>> folderChildren_;  // per container
+    std::vector<std::string> containerClass_;
+    std::vector<LibraryAlbum> albums_;
+};
+
+}  // namespace harmona::mediad

@@ -1,0 +1,60 @@
+#include "services/harmona-mediad/ServerRole.h"
+
+#include <signal.h>
+#include <sys/prctl.h>
+#include <syslog.h>
+#include <unistd.h>
+
+#include <cstdlib>
+
+#include "platform/lib/gupnp/MainLoop.h"
+#include "services/harmona-mediad/Privileges.h"
+
+namespace harmona::mediad {
+namespace {
+
+// Time for the byebye set to leave before the server exits.
+constexpr unsigned kByeByeMs = 500;
+
+}  // namespace
+
+int RunServer(const MediaServerOptions& options, int readyFd) {
+    sigset_t none;
+    sigemptyset(&none);
+    pthread_sigmask(SIG_SETMASK, &none, nullptr);
+    const pid_t parent = getppid();
+    // No user session here: keep GIO from looking for dconf in root's home after the drop.
+    setenv("GSETTINGS_BACKEND", "memory", 1);
+    setenv("GIO_USE_VFS", "local", 1);
+    if (!DropRoot()) {
+        syslog(LOG_ERR, "cannot change to user %s; not serving as root", kUnprivilegedUser);
+        return 1;
+    }
+    // The server ends with the process that keeps its pid file, however that one ends. Set after
+    // the change of user, which clears it.
+    prctl(PR_SET_PDEATHSIG, SIGTERM);
+    if (getppid() != parent)
+        return 0;
+    gupnp::MainLoop loop;
+    MediaServer server(options);
+    gupnp::Source byeByeDone;
+    auto stop = [&] {
+        server.SayByeBye();
+        byeByeDone = gupnp::Source::Timeout(kByeByeMs, [&] {
+            loop.Quit();
+            return false;
+        });
+        return false;
+    };
+    gupnp::Source term = gupnp::Source::UnixSignal(SIGTERM, stop);
+    gupnp::Source interrupt = gupnp::Source::UnixSignal(SIGINT, stop);
+    server.Start([readyFd] {
+        const char ready = 'r';
+        if (write(readyFd, &ready, 1) != 1)
+            syslog(LOG_WARNING, "cannot tell the parent that the server is ready");
+    });
+    loop.Run();
+    return 0;
+}
+
+}  // namespace harmona::mediad
