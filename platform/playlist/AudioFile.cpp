@@ -29,8 +29,8 @@
 #include "common/io/FileDescriptor.h"
 #include "common/util/Utf8.h"
 #include "platform/lib/sqlite/Database.h"
-#include "platform/paths/PlatformPaths.h"
 #include "platform/medialib/LibraryDatabase.h"
+#include "platform/paths/PlatformPaths.h"
 
 namespace harmona::playlist {
 namespace {
@@ -290,7 +290,7 @@ std::string UserNameOf(uid_t uid) {
 
 // A file (or link) at `path` that another user owns is not ours to replace: in the shared,
 // sticky temporary folder the rename would be refused anyway, and taking over another user's file
-// elsewhere is never wanted. Someone made it on purpose or by mistake; the administrator learns
+// elsewhere is never wanted. Whether it was planted or left by mistake, the administrator learns
 // here whose it is, so that he can remove it. True when `base` is absent or ours.
 bool MayReplace(int dirFd, const std::string& path, const std::string& base) {
     struct stat st {};
