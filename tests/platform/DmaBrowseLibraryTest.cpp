@@ -86,15 +86,25 @@ TEST(DmaBrowseLibrary, PrepareRefusesEmptyObjectIdAndNonHttpUrls) {
     }
     DMABrowse empty(BrowseDirectChildren, kControlUrl);
     EXPECT_NE(empty.Prepare(), 0);
+    // What a prepared browse sends, as the server receives it.
+    ScriptedHttpServer server;
+    server.SetResponder([](const RecordedRequest&) { return Reply(BrowseResponseBody("", 0, 0)); });
+    ASSERT_TRUE(server.Start());
     DMABrowse good(BrowseDirectChildren, kControlUrl);
     good.objectId = "music_album";
     EXPECT_EQ(good.Prepare(), 0);
-    EXPECT_EQ(Unescaped("ObjectID", good.Envelope()), "music_album");
-    EXPECT_EQ(Unescaped("BrowseFlag", good.Envelope()), "BrowseDirectChildren");
+    DMAParser goodParser;
+    EXPECT_EQ(goodParser.Parse(&good), 0) << goodParser.Error();
     DMABrowse meta(BrowseMetadata, "HTTP://127.0.0.1:50003/ContentDirectory/control");
     meta.objectId = "0";
     EXPECT_EQ(meta.Prepare(), 0);
-    EXPECT_EQ(Unescaped("BrowseFlag", meta.Envelope()), "BrowseMetadata");
+    DMAParser metaParser;
+    EXPECT_EQ(metaParser.Parse(&meta), 0) << metaParser.Error();
+    const std::vector<RecordedRequest> requests = server.Requests();
+    ASSERT_EQ(requests.size(), 2u);
+    EXPECT_EQ(Unescaped("ObjectID", requests[0].body), "music_album");
+    EXPECT_EQ(Unescaped("BrowseFlag", requests[0].body), "BrowseDirectChildren");
+    EXPECT_EQ(Unescaped("BrowseFlag", requests[1].body), "BrowseMetadata");
 }
 
 TEST(DmaBrowseLibrary, DefaultsOfTheBrowseObject) {
@@ -232,7 +242,7 @@ TEST(DmaBrowseLibrary, ParserSendsTheExactSoapRequest) {
     EXPECT_EQ(r.Header("SOAPACTION"), "\"urn:schemas-upnp-org:service:ContentDirectory:1#Browse\"");
     EXPECT_EQ(r.Header("Content-Type"), "text/xml; charset=\"utf-8\"");
     EXPECT_EQ(r.Header("Expect"), "");
-    EXPECT_EQ(r.body, children.browse.Envelope());
+    EXPECT_EQ(r.body, BuildBrowseEnvelope("x", "BrowseDirectChildren", "*", 0, 0, ""));
     EXPECT_TRUE(r.isBrowse);
     EXPECT_EQ(r.objectId, "x");
     EXPECT_EQ(r.browseFlag, "BrowseDirectChildren");
