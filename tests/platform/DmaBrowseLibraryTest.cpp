@@ -178,8 +178,8 @@ TEST(DmaBrowseLibrary, EntitiesOfADtdAreNeverExpanded) {
         "</item></DIDL-Lite>";
     std::vector<ItemNode*> items;
     ASSERT_EQ(ParseDidl(bomb, items), 1);
-    EXPECT_EQ(items[0]->title().find("aaaa"), std::string::npos);
-    EXPECT_EQ(items[0]->title().find("root:"), std::string::npos);
+    EXPECT_EQ(items[0]->getValueByKey("title").find("aaaa"), std::string::npos);
+    EXPECT_EQ(items[0]->getValueByKey("title").find("root:"), std::string::npos);
     delete items[0];
 }
 
@@ -221,7 +221,7 @@ TEST(DmaBrowseLibrary, SoapReplyParsingFaultsAndMissingResult) {
     std::vector<ItemNode*> items;
     std::string didl = page.ResultText();
     ASSERT_EQ(ParseDidl(didl, items), 1);
-    EXPECT_EQ(items[0]->title(), "Seven");
+    EXPECT_EQ(items[0]->getValueByKey("title"), "Seven");
     delete items[0];
 }
 
@@ -268,7 +268,7 @@ TEST(DmaBrowseLibrary, ExplicitRequestedCountAsksOnePageOnly) {
     ASSERT_EQ(children.prepareResult, 0);
     ASSERT_EQ(children.Run(), 0);
     ASSERT_EQ(children.parser.GetResult()->size(), 30u);
-    EXPECT_EQ(children.parser.GetResult()->front()->id(), "t10");
+    EXPECT_EQ(children.parser.GetResult()->front()->getValueByKey("id"), "t10");
     ASSERT_EQ(server.Requests().size(), 1u);
     EXPECT_EQ(server.Requests()[0].startingIndex, 10);
     EXPECT_EQ(server.Requests()[0].requestedCount, 30);
@@ -281,7 +281,7 @@ TEST(DmaBrowseLibrary, PagingFromAStartingIndexStopsAtTotalMatches) {
     ASSERT_EQ(children.prepareResult, 0);
     ASSERT_EQ(children.Run(), 0);
     ASSERT_EQ(children.parser.GetResult()->size(), 90u);
-    EXPECT_EQ(children.parser.GetResult()->back()->id(), "t119");
+    EXPECT_EQ(children.parser.GetResult()->back()->getValueByKey("id"), "t119");
     const std::vector<RecordedRequest> requests = server.Requests();
     ASSERT_EQ(requests.size(), 2u);
     EXPECT_EQ(requests[1].startingIndex, 80);
