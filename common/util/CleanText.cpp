@@ -1,6 +1,7 @@
 #include "common/util/CleanText.h"
 
 #include <algorithm>
+#include <array>
 
 #include "common/util/Utf8.h"
 #include "common/util/XmlEscape.h"
@@ -51,6 +52,22 @@ std::string_view CleanInvalid(std::string_view text, std::size_t i, InvalidUtf8 
     return text.substr(i, 1);
 }
 
+// Which ASCII bytes CleanAscii leaves as they are, by [deleteIsControl][markupReferences].
+using AsciiTable = std::array<bool, 0x80>;
+
+constexpr AsciiTable StaysAsIs(bool deleteIsControl, bool markupReferences) {
+    AsciiTable table{};
+    for (int byte = 0x20; byte < 0x80; ++byte) {
+        const bool markup =
+            byte == '&' || byte == '<' || byte == '>' || byte == '"' || byte == '\'';
+        table[byte] = !(byte == 0x7F && deleteIsControl) && !(markup && markupReferences);
+    }
+    return table;
+}
+
+constexpr AsciiTable kStaysAsIs[2][2] = {{StaysAsIs(false, false), StaysAsIs(false, true)},
+                                         {StaysAsIs(true, false), StaysAsIs(true, true)}};
+
 bool IsNonCharacter(char32_t code) {
     return (code >= 0xFDD0 && code <= 0xFDEF) || (code & 0xFFFE) == 0xFFFE;
 }
@@ -59,11 +76,24 @@ bool IsNonCharacter(char32_t code) {
 
 void AppendCleanText(std::string& out, std::string_view text, const TextPolicy& policy,
                      std::size_t maxBytes) {
+    const AsciiTable& staysAsIs = kStaysAsIs[policy.deleteIsControl][policy.markupReferences];
     std::size_t written = 0;
-    for (std::size_t i = 0; i < text.size();) {
+    // Bytes that stay as they are go out in runs, [runStart, i), so that plain text costs one
+    // append per run rather than one per character.
+    std::size_t runStart = 0;
+    std::size_t i = 0;
+    while (i < text.size()) {
+        const auto byte = static_cast<unsigned char>(text[i]);
+        if (byte < 0x80 && staysAsIs[byte]) {  // the common case, in short
+            if (written == maxBytes)
+                break;
+            ++written;
+            ++i;
+            continue;
+        }
         std::size_t length = 1;  // of the input that `clean` stands for
         std::string_view clean;
-        if (static_cast<unsigned char>(text[i]) < 0x80) {
+        if (byte < 0x80) {
             clean = CleanAscii(text, i, policy);
         } else if ((length = Utf8SequenceLength(text, i)) == 0) {
             length = 1;
@@ -73,10 +103,15 @@ void AppendCleanText(std::string& out, std::string_view text, const TextPolicy& 
         }
         if (clean.size() > maxBytes - written)
             break;
-        out.append(clean);
         written += clean.size();
+        if (clean.data() != text.data() + i) {  // changed: end the run, write the clean form
+            out.append(text, runStart, i - runStart);
+            out.append(clean);
+            runStart = i + length;
+        }
         i += length;
     }
+    out.append(text, runStart, i - runStart);
 }
 
 std::string CleanText(std::string_view text, const TextPolicy& policy, std::size_t maxBytes) {
