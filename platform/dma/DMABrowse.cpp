@@ -13,13 +13,10 @@ const char* DMABrowse::BrowseFlag() const {
 
 int DMABrowse::Prepare() {
     prepared_ = false;
-    envelope_.clear();
     if (type_ != BrowseMetadata && type_ != BrowseDirectChildren)
         return 1;
     if (!harmona::dma::IsAbsoluteHttpUrl(controlUrl_) || objectId.empty())
         return 1;
-    envelope_ = harmona::dma::BuildBrowseEnvelope(objectId, BrowseFlag(), filter, startingIndex,
-                                                  requestedCount, sortCriteria);
     prepared_ = true;
     return 0;
 }

@@ -13,8 +13,9 @@ class DMABrowse {
     DMABrowse(DMAGENT_BROWSETYPES type, std::string controlUrl);
     virtual ~DMABrowse();
 
-    // Checks and builds the request: non-zero when the control URL is not an absolute http:// URL
-    // or the object id is empty (or the browse type is unknown); 0 when it is ready to be sent.
+    // Checks the request: non-zero when the control URL is not an absolute http:// URL or the
+    // object id is empty (or the browse type is unknown); 0 when it is ready to be sent.
+    // DMAParser::Parse builds each page's SOAP envelope from the members as they are then.
     virtual int Prepare();
 
     std::string objectId;
@@ -29,12 +30,9 @@ class DMABrowse {
     const char* BrowseFlag() const;
     // True after a successful Prepare.
     bool IsPrepared() const { return prepared_; }
-    // The SOAP envelope that Prepare built (the first page).
-    const std::string& Envelope() const { return envelope_; }
 
   private:
     DMAGENT_BROWSETYPES type_;
     std::string controlUrl_;
     bool prepared_ = false;
-    std::string envelope_;
 };

@@ -64,6 +64,15 @@ int DMAParser::Refuse(const DMABrowse& browse, const std::string& why) {
     return Fail("too large: " + why);
 }
 
+// What one browse keeps from page to page.
+struct DMAParser::Paging {
+    harmona_http_post_fn* post = nullptr;
+    Clock::time_point deadline;  // one budget for every page of the browse
+    unsigned long index = 0;     // the StartingIndex of the next page
+    bool firstPage = true;
+    std::size_t textBytes = 0;  // of the objects of every page so far
+};
+
 int DMAParser::Parse(DMABrowse* browse) {
     Clear();
     error_.clear();
@@ -77,83 +86,101 @@ int DMAParser::Parse(DMABrowse* browse) {
     if (post == nullptr)
         return Fail("HTTP plugin unavailable: " + plugin.Error());
 
+    Paging paging;
+    paging.post = post;
     // The whole browse, every page of it, gets one 20-second budget.
-    const Clock::time_point deadline =
-        Clock::now() + std::chrono::milliseconds(harmona::dma::kWholeReplyTimeoutMs);
+    paging.deadline = Clock::now() + std::chrono::milliseconds(harmona::dma::kWholeReplyTimeoutMs);
+    paging.index = browse->startingIndex;
+    return FetchPages(*browse, paging);
+}
+
+int DMAParser::FetchPages(const DMABrowse& browse, Paging& paging) {
+    for (;; paging.firstPage = false) {
+        // The DIDL-Lite text of a page usually lies inside its reply (see BrowsePage), which lives
+        // until the page is parsed.
+        std::string reply;
+        if (RequestPage(browse, paging, reply) != 0)
+            return 1;
+        bool morePages = false;
+        if (ParsePage(browse, reply, paging, morePages) != 0)
+            return 1;
+        if (!morePages)
+            return 0;
+    }
+}
+
+int DMAParser::RequestPage(const DMABrowse& browse, const Paging& paging, std::string& reply) {
+    const long remainingMs = static_cast<long>(
+        std::chrono::duration_cast<std::chrono::milliseconds>(paging.deadline - Clock::now())
+            .count());
+    if (remainingMs <= 0)
+        return Fail("no whole reply within the time limit");
+    const std::string envelope =
+        harmona::dma::BuildBrowseEnvelope(browse.objectId, browse.BrowseFlag(), browse.filter,
+                                          paging.index, browse.requestedCount, browse.sortCriteria);
     const char* const headers[] = {harmona::dma::kBrowseContentType,
                                    harmona::dma::kBrowseSoapAction};
-    const bool fetchAll = browse->requestedCount == 0;
-    unsigned long index = browse->startingIndex;
-    std::size_t textBytes = 0;  // of the objects of every page so far
-    for (bool firstPage = true;; firstPage = false) {
-        const long remainingMs = static_cast<long>(
-            std::chrono::duration_cast<std::chrono::milliseconds>(deadline - Clock::now()).count());
-        if (remainingMs <= 0)
-            return Fail("no whole reply within the time limit");
-        const std::string envelope = harmona::dma::BuildBrowseEnvelope(
-            browse->objectId, browse->BrowseFlag(), browse->filter, index, browse->requestedCount,
-            browse->sortCriteria);
-        ReplyBuffer reply;
-        harmona_http_post_request request{};
-        request.url = browse->ControlUrl().c_str();
-        request.headers = headers;
-        request.headerCount = sizeof(headers) / sizeof(headers[0]);
-        request.body = envelope.data();
-        request.bodySize = envelope.size();
-        request.connectTimeoutMs = std::min(harmona::dma::kConnectTimeoutMs, remainingMs);
-        request.totalTimeoutMs = remainingMs;
-        request.sink = AppendToReply;
-        request.sinkContext = &reply;
-        request.expect = ExpectReplySize;
-        harmona_http_post_result outcome{};
-        if (post(&request, &outcome) != 0) {
-            if (reply.tooLarge)
-                return Refuse(
-                    *browse,
-                    "a reply over " + std::to_string(harmona::dma::kMaxReplyBytes >> 20) + " MiB");
-            return Fail(outcome.error);
-        }
-        if (outcome.status != 200)
-            return Fail("HTTP status " + std::to_string(outcome.status));
-
-        harmona::dma::BrowsePage page;
-        const harmona::dma::ReplyStatus status =
-            harmona::dma::ParseBrowseResponse(reply.data, page);
-        if (status == harmona::dma::ReplyStatus::fault)
-            return Fail("SOAP fault");
-        if (status != harmona::dma::ReplyStatus::ok)
-            return Fail("not a BrowseResponse");
-        totalMatches_ = page.totalMatches;
-        if (firstPage)
-            hasResult_ = page.hasResult;
-        if (!page.hasResult)
-            break;
-        // The DIDL-Lite text usually lies inside the reply buffer (see BrowsePage), which lives
-        // until this page is done.
-        const std::size_t treeBytes =
-            harmona::dma::EstimatedDidlTreeBytes(page.ResultData(), page.ResultSize());
-        if (treeBytes > harmona::dma::kMaxDidlTreeBytes)
-            return Refuse(*browse, "a page would take " + std::to_string(treeBytes >> 20) +
-                                       " MiB to parse, more than " +
-                                       std::to_string(harmona::dma::kMaxDidlTreeBytes >> 20));
-        const long count = harmona::dma::ParseDidl(page.ResultData(), page.ResultSize(), items_,
-                                                   harmona::dma::kMaxBrowseObjects);
-        if (count == harmona::dma::kTooManyObjects)
-            return Refuse(*browse, "more than " + std::to_string(harmona::dma::kMaxBrowseObjects) +
-                                       " objects");
-        if (count < 0)
-            return Fail("Result is not DIDL-Lite");
-        for (std::size_t i = items_.size() - static_cast<std::size_t>(count); i < items_.size();
-             ++i)
-            textBytes += items_[i]->TextBytes();
-        if (textBytes > harmona::dma::kMaxBrowseTextBytes)
-            return Refuse(*browse, "objects of more than " +
-                                       std::to_string(harmona::dma::kMaxBrowseTextBytes >> 20) +
-                                       " MiB of text");
-        index += static_cast<unsigned long>(count);
-        // Ask again from the next index while a page brought objects and some are still missing.
-        if (!fetchAll || count == 0 || index >= page.totalMatches || index > UINT_MAX)
-            break;
+    ReplyBuffer buffer;
+    harmona_http_post_request request{};
+    request.url = browse.ControlUrl().c_str();
+    request.headers = headers;
+    request.headerCount = sizeof(headers) / sizeof(headers[0]);
+    request.body = envelope.data();
+    request.bodySize = envelope.size();
+    request.connectTimeoutMs = std::min(harmona::dma::kConnectTimeoutMs, remainingMs);
+    request.totalTimeoutMs = remainingMs;
+    request.sink = AppendToReply;
+    request.sinkContext = &buffer;
+    request.expect = ExpectReplySize;
+    harmona_http_post_result outcome{};
+    if (paging.post(&request, &outcome) != 0) {
+        if (buffer.tooLarge)
+            return Refuse(browse, "a reply over " +
+                                      std::to_string(harmona::dma::kMaxReplyBytes >> 20) + " MiB");
+        return Fail(outcome.error);
     }
+    if (outcome.status != 200)
+        return Fail("HTTP status " + std::to_string(outcome.status));
+    reply = std::move(buffer.data);
+    return 0;
+}
+
+int DMAParser::ParsePage(const DMABrowse& browse, std::string& reply, Paging& paging,
+                         bool& morePages) {
+    morePages = false;
+    harmona::dma::BrowsePage page;
+    const harmona::dma::ReplyStatus status = harmona::dma::ParseBrowseResponse(reply, page);
+    if (status == harmona::dma::ReplyStatus::fault)
+        return Fail("SOAP fault");
+    if (status != harmona::dma::ReplyStatus::ok)
+        return Fail("not a BrowseResponse");
+    totalMatches_ = page.totalMatches;
+    if (paging.firstPage)
+        hasResult_ = page.hasResult;
+    if (!page.hasResult)
+        return 0;
+    const std::size_t treeBytes =
+        harmona::dma::EstimatedDidlTreeBytes(page.ResultData(), page.ResultSize());
+    if (treeBytes > harmona::dma::kMaxDidlTreeBytes)
+        return Refuse(browse, "a page would take " + std::to_string(treeBytes >> 20) +
+                                  " MiB to parse, more than " +
+                                  std::to_string(harmona::dma::kMaxDidlTreeBytes >> 20));
+    const long count = harmona::dma::ParseDidl(page.ResultData(), page.ResultSize(), items_,
+                                               harmona::dma::kMaxBrowseObjects);
+    if (count == harmona::dma::kTooManyObjects)
+        return Refuse(browse,
+                      "more than " + std::to_string(harmona::dma::kMaxBrowseObjects) + " objects");
+    if (count < 0)
+        return Fail("Result is not DIDL-Lite");
+    for (std::size_t i = items_.size() - static_cast<std::size_t>(count); i < items_.size(); ++i)
+        paging.textBytes += items_[i]->TextBytes();
+    if (paging.textBytes > harmona::dma::kMaxBrowseTextBytes)
+        return Refuse(browse, "objects of more than " +
+                                  std::to_string(harmona::dma::kMaxBrowseTextBytes >> 20) +
+                                  " MiB of text");
+    paging.index += static_cast<unsigned long>(count);
+    // Ask again from the next index while a page brought objects and some are still missing.
+    morePages = browse.requestedCount == 0 && count != 0 && paging.index < page.totalMatches &&
+                paging.index <= UINT_MAX;
     return 0;
 }

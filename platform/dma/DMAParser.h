@@ -37,6 +37,18 @@ class DMAParser {
     const std::string& Error() const { return error_; }
 
   private:
+    // One browse's way through its pages: the HTTP client, the time limit, the next index and
+    // what the pages so far have brought (DMAParser.cpp).
+    struct Paging;
+
+    // The page loop: asks for and parses one page after the other while more are wanted.
+    int FetchPages(const DMABrowse& browse, Paging& paging);
+    // The request: sends the Browse for the next page and collects its reply body.
+    int RequestPage(const DMABrowse& browse, const Paging& paging, std::string& reply);
+    // The parse: the page's BrowseResponse and DIDL-Lite, within the bounds; appends the objects
+    // and says whether another page is wanted.
+    int ParsePage(const DMABrowse& browse, std::string& reply, Paging& paging, bool& morePages);
+
     void Clear();
     int Fail(std::string why);
     // Fails for a reply too large for the request's memory bound, with a log line.

@@ -1,4 +1,5 @@
-// One DIDL-Lite object (container or item) of a Browse result.
+// One DIDL-Lite object (container or item) of a Browse result. Its values are read in one way,
+// getValueByKey, and written by the parser (SoapBrowse.cpp) with Assign.
 #pragma once
 
 #include <array>
@@ -16,17 +17,6 @@ class ItemNode {
     // missing value or an unknown key.
     std::string getValueByKey(const std::string& key) const;
 
-    std::string_view Get(Field field) const;
-    // The same values by name, as copies.
-    std::string id() const { return std::string(Get(Id)); }
-    std::string parentID() const { return std::string(Get(ParentId)); }
-    std::string title() const { return std::string(Get(Title)); }
-    std::string upnpClass() const { return std::string(Get(Class)); }
-    std::string childCount() const { return std::string(Get(ChildCount)); }
-    std::string artist() const { return std::string(Get(Artist)); }
-    std::string album() const { return std::string(Get(Album)); }
-    std::string res() const { return std::string(Get(Res)); }
-
     // Stores the eight values, in Field order, at once. A container of 100,000 objects keeps
     // 100,000 of these until its nodes are made: one block per object rather than eight strings
     // halves what they take.
@@ -38,6 +28,8 @@ class ItemNode {
     bool isContainer = false;
 
   private:
+    std::string_view Get(Field field) const;
+
     std::string values_;                             // the values one after another
     std::array<std::uint32_t, kFieldCount> ends_{};  // where each value ends in values_
 };

@@ -27,10 +27,11 @@
 #include <vector>
 
 #include "common/io/FileDescriptor.h"
+#include "common/util/CleanText.h"
 #include "common/util/Utf8.h"
 #include "platform/lib/sqlite/Database.h"
-#include "platform/paths/PlatformPaths.h"
 #include "platform/medialib/LibraryDatabase.h"
+#include "platform/paths/PlatformPaths.h"
 
 namespace harmona::playlist {
 namespace {
@@ -67,17 +68,6 @@ Generator SeededGenerator() {
     }
     std::seed_seq seed(std::begin(words), std::end(words));
     return Generator(seed);
-}
-
-// A playlist line cannot hold a line break; any control byte becomes a space.
-std::string CleanText(std::string_view text) {
-    std::string clean(util::CutUtf8(text, kMaxTextBytes));
-    for (char& c : clean) {
-        const auto byte = static_cast<unsigned char>(c);
-        if (byte < 0x20 || byte == 0x7F)
-            c = ' ';
-    }
-    return clean;
 }
 
 // A path that a playlist line can hold: not empty, not too long, no NUL or line break.
@@ -134,8 +124,11 @@ class TrackTable {
         if (byRowid_.ColumnType(0) != SQLITE_TEXT || !IsWritablePath(byRowid_.ColumnText(0)))
             return Fetch::absent;
         track.path.assign(byRowid_.ColumnText(0));
-        track.artist = CleanText(byRowid_.ColumnText(1));
-        track.title = CleanText(byRowid_.ColumnText(2));
+        // A playlist line cannot hold a line break: control bytes and DEL become spaces.
+        track.artist = util::CleanText(util::CutUtf8(byRowid_.ColumnText(1), kMaxTextBytes),
+                                       util::kSingleLine);
+        track.title = util::CleanText(util::CutUtf8(byRowid_.ColumnText(2), kMaxTextBytes),
+                                      util::kSingleLine);
         track.seconds = SecondsOf(byRowid_, 3);
         return Fetch::found;
     }
@@ -290,7 +283,7 @@ std::string UserNameOf(uid_t uid) {
 
 // A file (or link) at `path` that another user owns is not ours to replace: in the shared,
 // sticky temporary folder the rename would be refused anyway, and taking over another user's file
-// elsewhere is never wanted. Someone made it on purpose or by mistake; the administrator learns
+// elsewhere is never wanted. Whether it was planted or left by mistake, the administrator learns
 // here whose it is, so that he can remove it. True when `base` is absent or ours.
 bool MayReplace(int dirFd, const std::string& path, const std::string& base) {
     struct stat st {};

@@ -5,6 +5,7 @@
 
 #include <cstring>
 
+#include "common/util/CleanText.h"
 #include "platform/lib/gupnp/Object.h"
 #include "services/vanuaudiod/Protocol.h"
 #include "services/vanuaudiod/Url.h"
@@ -113,9 +114,11 @@ bool ParseDeviceDescription(const std::string& xml, const std::string& location,
     const std::string ip = HostOfUrl(location);
     if (ip.empty() || ip.size() > kMaxIpBytes)
         return false;
-    out.friendlyName = CleanText(Text(device, "friendlyName"), kMaxFriendlyNameBytes);
+    // Listed as JSON text: bytes that are not UTF-8, control bytes and DEL become spaces.
+    out.friendlyName =
+        util::CleanText(Text(device, "friendlyName"), util::kPrintableUtf8, kMaxFriendlyNameBytes);
     out.controlUrl = controlUrl;
-    out.ip = CleanText(ip, kMaxIpBytes);
+    out.ip = util::CleanText(ip, util::kPrintableUtf8, kMaxIpBytes);
     return true;
 }
 

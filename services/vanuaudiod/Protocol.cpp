@@ -5,8 +5,6 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "common/util/Utf8.h"
-
 namespace harmona::vanuaudiod {
 namespace {
 
@@ -154,31 +152,6 @@ std::string JsonString(const std::string& text) {
         }
     }
     out += '"';
-    return out;
-}
-
-std::string CleanText(const std::string& text, std::size_t maxBytes) {
-    std::string out;
-    std::size_t pos = 0;
-    while (pos < text.size()) {
-        const std::size_t length = harmona::util::Utf8SequenceLength(text, pos);
-        if (length == 0) {
-            // Not UTF-8: one byte becomes one space.
-            if (out.size() + 1 > maxBytes)
-                break;
-            out += ' ';
-            ++pos;
-            continue;
-        }
-        if (out.size() + length > maxBytes)
-            break;  // cut before a character that would not fit whole
-        const auto lead = static_cast<unsigned char>(text[pos]);
-        if (length == 1 && (lead < 0x20 || lead == 0x7F))
-            out += ' ';
-        else
-            out.append(text, pos, length);
-        pos += length;
-    }
     return out;
 }
 

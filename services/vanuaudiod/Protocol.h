@@ -61,11 +61,8 @@ std::string Answer(const Request& request, const std::vector<MediaServer>& serve
                    bool& startSearch);
 
 // A JSON string literal of `text` (quotes included): '"' and '\\' escaped, control characters
-// as \u00XX. Invalid UTF-8 must have been repaired before (see CleanText).
+// as \u00XX. Invalid UTF-8 must have been repaired before (util::CleanText with
+// util::kPrintableUtf8, as Description.cpp does).
 std::string JsonString(const std::string& text);
-
-// `text` made safe to list: invalid UTF-8 sequences and control characters become spaces, then
-// cut to at most `maxBytes` on a character boundary.
-std::string CleanText(const std::string& text, std::size_t maxBytes);
 
 }  // namespace harmona::vanuaudiod

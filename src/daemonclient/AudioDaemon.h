@@ -30,7 +30,9 @@ int AudioDaemonCall(const AudioDaemonRequest* request, char* reply, int replySiz
 // Each returns AudioDaemonCall's result (0 or -1), or -1 when its own argument check fails. The
 // wrappers without a reply buffer discard the reply: they only say whether the daemon answered.
 // Only commands 14 and 16 (the media server list) are used by the tree; the others are named by
-// their code.
+// their code. They stay although no program here calls them: the client covers the daemon's whole
+// command table, so that any caller of this library finds every command it may send;
+// DaemonClient.EveryWrapperSendsItsExact8196ByteRecord pins the record of each.
 
 int AudioDaemonCommand1();
 int AudioDaemonCommand2();

@@ -137,7 +137,8 @@ int AudioDaemonCall(const AudioDaemonRequest* request, char* reply, int replySiz
     if (fd < 0)
         return -1;
     const int result = Exchange(fd, request, reply, replySize);
-    // Only a descriptor above 0 is closed: a descriptor of 0 is deliberately left open.
+    // Only a descriptor above 0 is closed: a descriptor of 0 stays open, whoever owns it; pinned by
+    // DaemonClient.DescriptorZeroIsNeverClosed.
     if (fd > 0)
         close(fd);
     return result;
@@ -161,7 +162,9 @@ int LoadEqualizerProfile(const char* path, const char* label, char* value, int s
             break;
         }
         // Compared over the line's label length only: a longer given label that begins with the
-        // line's label matches too, and an empty label matches anything (kept on purpose).
+        // line's label matches too, and an empty label matches anything; pinned by
+        // EqualizerProfile.LongerLabelBeginningWithTheLinesLabelMatchesToo and
+        // EqualizerProfile.EmptyLabelOfALineMatchesAnyLabel.
         const size_t labelLength = static_cast<size_t>(colon - line);
         if (std::strncmp(line, label, labelLength) != 0)
             continue;

@@ -26,7 +26,9 @@ std::string FieldText(const char (&field)[Size]) {
 int HarmonaHandler::AddIPodChildren(Json::Value& children) {
     Json::Value texts = LoadUITexts();
     Json::Value node;
-    // The button's pid is empty on purpose, unlike the playlists' "ipod_root".
+    // The button's pid is empty, so the node has none, like the playlist categories' buttons and
+    // unlike the playlists' "ipod_root"; pinned by
+    // IPodNodes.AnIPodWithNoPlaylistsGivesTheRefreshButtonAloneWithAnEmptyPid.
     FillTreeNode(node, kIPodRefreshId, "", texts["player"]["refresh_btn_title"].asString(),
                  kRefreshButtonIcon, NODE_LEAF);
     children.append(node);

@@ -8,6 +8,11 @@
 namespace harmona::tree {
 namespace {
 
+// The line number that the error reply of a failing listing carries: a fixed identifier that the
+// browser and log readers match on, not the source line, so it must not follow the code when it
+// moves.
+constexpr int kListingErrorLine = 30;
+
 bool Is(const char* target, const char* name) {
     return target != nullptr && std::strcmp(target, name) == 0;
 }
@@ -27,7 +32,7 @@ void RefreshNode(HarmonaHandler& handler, const char* target) {
     } else if (category != nullptr) {
         if (handler.ListPlaylists(items, category) == 0 ||
             handler.ListSmartPlaylists(items, category) == 0) {
-            handler.SetError(reply, "common", "error_system", __LINE__);
+            handler.SetError(reply, "common", "error_system", kListingErrorLine);
         } else {
             reply["items"] = std::move(items);
             handler.SetSuccess(reply, true);

@@ -15,6 +15,11 @@ constexpr int kLibraryService = paths::kLocalMediaServerService;
 
 namespace {
 
+// The line number that the error reply of a failing category carries: a fixed identifier that the
+// browser and log readers match on, not the source line, so it must not follow the code when it
+// moves.
+constexpr int kCategoryErrorLine = 106;
+
 // Every category node hides its icon this way: a blank image and a hiding icon class.
 constexpr const char* kBlankIcon = "3rdparty/Harmona/images/s.gif";
 constexpr const char* kHiddenIconClass = "x-tree-hide-icon";
@@ -103,7 +108,7 @@ int BuildRootTree(HarmonaHandler& handler) {
                              0);
         node["iconCls"] = kHiddenIconClass;
         if (category.build(handler, children) == 0) {
-            handler.SetError(reply, category.errorSection, category.errorKey, __LINE__);
+            handler.SetError(reply, category.errorSection, category.errorKey, kCategoryErrorLine);
             handler.PrintResponse(reply, kReplyContentType);
             return 0;
         }

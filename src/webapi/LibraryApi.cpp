@@ -158,12 +158,13 @@ int LibraryApi::ListBrowsedContainer(const std::string& objectId, Json::Value& r
     for (const ItemNode* item : *items) {
         if (item->isContainer) {
             Json::Value row(Json::objectValue);
-            row["node"] = std::string(kLibraryPrefix) + item->id();
-            row["title"] = item->title();
+            row["node"] = std::string(kLibraryPrefix) + item->getValueByKey("id");
+            row["title"] = item->getValueByKey("title");
             containers.append(std::move(row));
             continue;
         }
-        const std::optional<std::int64_t> id = medialib::TrackIdOfLocalResource(item->res());
+        const std::optional<std::int64_t> id =
+            medialib::TrackIdOfLocalResource(item->getValueByKey("res"));
         const std::optional<Track> track = id ? catalog_.ById(*id) : std::nullopt;
         if (track)
             tracks.append(TrackRow(*track));
@@ -201,8 +202,8 @@ int LibraryApi::ListMediaServer(const std::string& node, const std::string& obje
         }
         Json::Value row(Json::objectValue);
         row["node"] = node;
-        row["object"] = item->id();
-        row["title"] = item->title();
+        row["object"] = item->getValueByKey("id");
+        row["title"] = item->getValueByKey("title");
         reply["containers"].append(std::move(row));
     }
     reply["missing"] = notPlayableHere;

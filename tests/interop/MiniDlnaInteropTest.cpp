@@ -103,7 +103,7 @@ Browsed Browse(const std::string& objectId, unsigned requestedCount = 0) {
 
 const ItemNode* FindTitle(const Browsed& browsed, const std::string& title) {
     for (const ItemNode& item : browsed.items)
-        if (item.title() == title)
+        if (item.getValueByKey("title") == title)
             return &item;
     return nullptr;
 }
@@ -186,7 +186,7 @@ class MiniDlnaInterop : public ::testing::Test {
         while (std::chrono::steady_clock::now() < deadline) {
             const Browsed music = Browse("1");
             if (const ItemNode* all = FindTitle(music, "All Music");
-                all && all->childCount() == expected)
+                all && all->getValueByKey("childCount") == expected)
                 return true;
             std::this_thread::sleep_for(std::chrono::milliseconds(200));
         }
@@ -210,36 +210,39 @@ TEST_F(MiniDlnaInterop, BrowsesFromTheRootDownToEveryTrack) {
     ASSERT_NE(folders, nullptr);
     for (const ItemNode& item : root.items) {
         EXPECT_TRUE(item.isContainer);
-        EXPECT_EQ(item.parentID(), "0");
+        EXPECT_EQ(item.getValueByKey("parentID"), "0");
     }
 
     // Music > Album: one container per album tag, each with its tracks.
-    const Browsed musicChildren = Browse(music->id());
+    const Browsed musicChildren = Browse(music->getValueByKey("id"));
     const ItemNode* albumCategory = FindTitle(musicChildren, "Album");
     ASSERT_NE(albumCategory, nullptr);
-    const Browsed albums = Browse(albumCategory->id());
+    const Browsed albums = Browse(albumCategory->getValueByKey("id"));
     ASSERT_EQ(albums.status, 0);
     ASSERT_EQ(albums.items.size(), static_cast<std::size_t>(kAlbums));
     std::set<std::string> albumTitles;
     for (const ItemNode& album : albums.items) {
-        albumTitles.insert(album.title());
-        EXPECT_EQ(album.parentID(), albumCategory->id());
-        EXPECT_EQ(album.childCount(), std::to_string(kTracksPerAlbum));
-        const Browsed tracks = Browse(album.id());
+        albumTitles.insert(album.getValueByKey("title"));
+        EXPECT_EQ(album.getValueByKey("parentID"), albumCategory->getValueByKey("id"));
+        EXPECT_EQ(album.getValueByKey("childCount"), std::to_string(kTracksPerAlbum));
+        const Browsed tracks = Browse(album.getValueByKey("id"));
         ASSERT_EQ(tracks.status, 0);
-        ASSERT_EQ(tracks.items.size(), static_cast<std::size_t>(kTracksPerAlbum)) << album.title();
+        ASSERT_EQ(tracks.items.size(), static_cast<std::size_t>(kTracksPerAlbum))
+            << album.getValueByKey("title");
         std::set<std::string> titles, ids;
         for (const ItemNode& track : tracks.items) {
             EXPECT_FALSE(track.isContainer);
-            EXPECT_EQ(track.parentID(), album.id());
-            EXPECT_EQ(track.album(), album.title());
-            EXPECT_EQ(track.upnpClass(), "object.item.audioItem.musicTrack");
-            EXPECT_EQ(track.res().rfind("http://", 0), 0u) << track.res();
-            titles.insert(track.title());
-            ids.insert(track.id());
+            EXPECT_EQ(track.getValueByKey("parentID"), album.getValueByKey("id"));
+            EXPECT_EQ(track.getValueByKey("album"), album.getValueByKey("title"));
+            EXPECT_EQ(track.getValueByKey("class"), "object.item.audioItem.musicTrack");
+            EXPECT_EQ(track.getValueByKey("res").rfind("http://", 0), 0u)
+                << track.getValueByKey("res");
+            titles.insert(track.getValueByKey("title"));
+            ids.insert(track.getValueByKey("id"));
         }
         EXPECT_EQ(ids.size(), static_cast<std::size_t>(kTracksPerAlbum));
-        const std::string albumNumber = album.title().substr(album.title().rfind(' ') + 1);
+        const std::string albumTitle = album.getValueByKey("title");
+        const std::string albumNumber = albumTitle.substr(albumTitle.rfind(' ') + 1);
         for (int n = 1; n <= kTracksPerAlbum; ++n)
             EXPECT_EQ(titles.count("Song " + std::to_string(n) + " of Album " + albumNumber), 1u);
     }
@@ -247,11 +250,11 @@ TEST_F(MiniDlnaInterop, BrowsesFromTheRootDownToEveryTrack) {
         EXPECT_EQ(albumTitles.count("Album " + std::to_string(a)), 1u);
 
     // Browse Folders > big: MiniDLNA cuts one reply at 2 MiB; the library still yields every track.
-    const Browsed top = Browse(folders->id());
+    const Browsed top = Browse(folders->getValueByKey("id"));
     const ItemNode* big = FindTitle(top, "big");
     ASSERT_NE(big, nullptr);
-    EXPECT_EQ(big->childCount(), std::to_string(kBigFolderTracks));
-    const Browsed onePage = Browse(big->id(), kBigFolderTracks);
+    EXPECT_EQ(big->getValueByKey("childCount"), std::to_string(kBigFolderTracks));
+    const Browsed onePage = Browse(big->getValueByKey("id"), kBigFolderTracks);
     ASSERT_EQ(onePage.status, 0);
     EXPECT_EQ(onePage.totalMatches, static_cast<unsigned long>(kBigFolderTracks));
     EXPECT_GT(onePage.items.size(), 0u);
@@ -259,14 +262,14 @@ TEST_F(MiniDlnaInterop, BrowsesFromTheRootDownToEveryTrack) {
         << "MiniDLNA did not cut its reply: make the folder larger";
     std::printf("MiniDLNA answered %zu of %d objects in one reply\n", onePage.items.size(),
                 kBigFolderTracks);
-    const Browsed all = Browse(big->id());
+    const Browsed all = Browse(big->getValueByKey("id"));
     ASSERT_EQ(all.status, 0);
     ASSERT_EQ(all.items.size(), static_cast<std::size_t>(kBigFolderTracks));
     std::set<std::string> titles, ids;
     for (const ItemNode& track : all.items) {
-        EXPECT_EQ(track.parentID(), big->id());
-        titles.insert(track.title());
-        ids.insert(track.id());
+        EXPECT_EQ(track.getValueByKey("parentID"), big->getValueByKey("id"));
+        titles.insert(track.getValueByKey("title"));
+        ids.insert(track.getValueByKey("id"));
     }
     EXPECT_EQ(ids.size(), static_cast<std::size_t>(kBigFolderTracks));
     for (int n = 0; n < kBigFolderTracks; ++n)
@@ -275,7 +278,7 @@ TEST_F(MiniDlnaInterop, BrowsesFromTheRootDownToEveryTrack) {
     // All Music: every track of the library, complete.
     const ItemNode* allMusic = FindTitle(musicChildren, "All Music");
     ASSERT_NE(allMusic, nullptr);
-    const Browsed everything = Browse(allMusic->id());
+    const Browsed everything = Browse(allMusic->getValueByKey("id"));
     ASSERT_EQ(everything.status, 0);
     EXPECT_EQ(everything.items.size(),
               static_cast<std::size_t>(kAlbums * kTracksPerAlbum + kBigFolderTracks));

@@ -86,15 +86,25 @@ TEST(DmaBrowseLibrary, PrepareRefusesEmptyObjectIdAndNonHttpUrls) {
     }
     DMABrowse empty(BrowseDirectChildren, kControlUrl);
     EXPECT_NE(empty.Prepare(), 0);
+    // What a prepared browse sends, as the server receives it.
+    ScriptedHttpServer server;
+    server.SetResponder([](const RecordedRequest&) { return Reply(BrowseResponseBody("", 0, 0)); });
+    ASSERT_TRUE(server.Start());
     DMABrowse good(BrowseDirectChildren, kControlUrl);
     good.objectId = "music_album";
     EXPECT_EQ(good.Prepare(), 0);
-    EXPECT_EQ(Unescaped("ObjectID", good.Envelope()), "music_album");
-    EXPECT_EQ(Unescaped("BrowseFlag", good.Envelope()), "BrowseDirectChildren");
+    DMAParser goodParser;
+    EXPECT_EQ(goodParser.Parse(&good), 0) << goodParser.Error();
     DMABrowse meta(BrowseMetadata, "HTTP://127.0.0.1:50003/ContentDirectory/control");
     meta.objectId = "0";
     EXPECT_EQ(meta.Prepare(), 0);
-    EXPECT_EQ(Unescaped("BrowseFlag", meta.Envelope()), "BrowseMetadata");
+    DMAParser metaParser;
+    EXPECT_EQ(metaParser.Parse(&meta), 0) << metaParser.Error();
+    const std::vector<RecordedRequest> requests = server.Requests();
+    ASSERT_EQ(requests.size(), 2u);
+    EXPECT_EQ(Unescaped("ObjectID", requests[0].body), "music_album");
+    EXPECT_EQ(Unescaped("BrowseFlag", requests[0].body), "BrowseDirectChildren");
+    EXPECT_EQ(Unescaped("BrowseFlag", requests[1].body), "BrowseMetadata");
 }
 
 TEST(DmaBrowseLibrary, DefaultsOfTheBrowseObject) {
@@ -168,8 +178,8 @@ TEST(DmaBrowseLibrary, EntitiesOfADtdAreNeverExpanded) {
         "</item></DIDL-Lite>";
     std::vector<ItemNode*> items;
     ASSERT_EQ(ParseDidl(bomb, items), 1);
-    EXPECT_EQ(items[0]->title().find("aaaa"), std::string::npos);
-    EXPECT_EQ(items[0]->title().find("root:"), std::string::npos);
+    EXPECT_EQ(items[0]->getValueByKey("title").find("aaaa"), std::string::npos);
+    EXPECT_EQ(items[0]->getValueByKey("title").find("root:"), std::string::npos);
     delete items[0];
 }
 
@@ -211,7 +221,7 @@ TEST(DmaBrowseLibrary, SoapReplyParsingFaultsAndMissingResult) {
     std::vector<ItemNode*> items;
     std::string didl = page.ResultText();
     ASSERT_EQ(ParseDidl(didl, items), 1);
-    EXPECT_EQ(items[0]->title(), "Seven");
+    EXPECT_EQ(items[0]->getValueByKey("title"), "Seven");
     delete items[0];
 }
 
@@ -232,7 +242,7 @@ TEST(DmaBrowseLibrary, ParserSendsTheExactSoapRequest) {
     EXPECT_EQ(r.Header("SOAPACTION"), "\"urn:schemas-upnp-org:service:ContentDirectory:1#Browse\"");
     EXPECT_EQ(r.Header("Content-Type"), "text/xml; charset=\"utf-8\"");
     EXPECT_EQ(r.Header("Expect"), "");
-    EXPECT_EQ(r.body, children.browse.Envelope());
+    EXPECT_EQ(r.body, BuildBrowseEnvelope("x", "BrowseDirectChildren", "*", 0, 0, ""));
     EXPECT_TRUE(r.isBrowse);
     EXPECT_EQ(r.objectId, "x");
     EXPECT_EQ(r.browseFlag, "BrowseDirectChildren");
@@ -258,7 +268,7 @@ TEST(DmaBrowseLibrary, ExplicitRequestedCountAsksOnePageOnly) {
     ASSERT_EQ(children.prepareResult, 0);
     ASSERT_EQ(children.Run(), 0);
     ASSERT_EQ(children.parser.GetResult()->size(), 30u);
-    EXPECT_EQ(children.parser.GetResult()->front()->id(), "t10");
+    EXPECT_EQ(children.parser.GetResult()->front()->getValueByKey("id"), "t10");
     ASSERT_EQ(server.Requests().size(), 1u);
     EXPECT_EQ(server.Requests()[0].startingIndex, 10);
     EXPECT_EQ(server.Requests()[0].requestedCount, 30);
@@ -271,7 +281,7 @@ TEST(DmaBrowseLibrary, PagingFromAStartingIndexStopsAtTotalMatches) {
     ASSERT_EQ(children.prepareResult, 0);
     ASSERT_EQ(children.Run(), 0);
     ASSERT_EQ(children.parser.GetResult()->size(), 90u);
-    EXPECT_EQ(children.parser.GetResult()->back()->id(), "t119");
+    EXPECT_EQ(children.parser.GetResult()->back()->getValueByKey("id"), "t119");
     const std::vector<RecordedRequest> requests = server.Requests();
     ASSERT_EQ(requests.size(), 2u);
     EXPECT_EQ(requests[1].startingIndex, 80);

@@ -98,6 +98,15 @@ TEST(RefreshAction, FailingSharedListingPrintsTheErrorEnvelope) {
     EXPECT_EQ(r.json["errinfo"]["key"], "error_system");
 }
 
+// The line number of the error reply is a fixed identifier, the same wherever the code moves.
+TEST(RefreshAction, FailingListingReportsLine30) {
+    TreeFixture fixture(WorldWithUnlistablePersonalPlaylists());
+    const CgiResult r = Refresh("personal");
+    ASSERT_TRUE(r.jsonOk) << r.output;
+    EXPECT_EQ(r.json["success"], false);
+    EXPECT_EQ(r.json["errinfo"]["line"], 30);
+}
+
 TEST(RefreshAction, CapitalisedEmptyAndAbsentTargetsGiveAnEmptyReply) {
     TreeFixture fixture(TreeWorld{});
     for (const char* query :

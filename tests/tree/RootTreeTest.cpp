@@ -219,6 +219,15 @@ TEST(RootTree, FailingPersonalPlaylistsEndTheTreeWithTheErrorPair) {
     EXPECT_EQ(r.LogMessages(), (Strings{"audio:642 Failed to enum user's playlist!"}));
 }
 
+// The line number of the error reply is a fixed identifier, the same wherever the code moves.
+TEST(RootTree, FailingCategoryReportsLine106) {
+    TreeFixture fixture(WorldWithUnlistablePersonalPlaylists());
+    const CgiResult r = Get(kRootQuery);
+    ASSERT_TRUE(r.jsonOk) << r.output;
+    EXPECT_EQ(r.json["success"], false);
+    EXPECT_EQ(r.json["errinfo"]["line"], 106);
+}
+
 TEST(RootTree, SharedLibraryThatIsNotADatabaseEndsTheTree) {
     TreeFixture fixture(TreeWorld{});
     WriteFile(kLibraryDb, std::string(4096, 'x'));
@@ -227,7 +236,6 @@ TEST(RootTree, SharedLibraryThatIsNotADatabaseEndsTheTree) {
     EXPECT_EQ(r.json["errinfo"]["key"], "error_system");
     EXPECT_EQ(Ids(r.json["items"]), (Strings{"musiclib_root", "musiclib_music_personal"}));
 }
-
 
 TEST(RootTree, TextsAreLoadedEvenWhenOnlyRadioIsShown) {
     TreeWorld world;

@@ -1,15 +1,18 @@
 // vanuaudiod's pieces beneath the socket: the request record, the replies of commands 14 (search)
 // and 16 (a page of the server list; platform/README.md, "Audio daemon"), their size bound, and the
-// text cleaning.
+// text cleaning of what it lists (util::CleanText with util::kPrintableUtf8).
 #include <gtest/gtest.h>
 #include <json/json.h>
 
 #include <cstring>
 
+#include "common/util/CleanText.h"
 #include "services/vanuaudiod/Protocol.h"
 #include "tests/harness/CgiRunner.h"
 
 using namespace harmona::vanuaudiod;
+using harmona::util::CleanText;
+using harmona::util::kPrintableUtf8;
 
 namespace {
 
@@ -154,18 +157,19 @@ TEST(DaemonReplies, JsonStringEscapesQuotesBackslashesAndControls) {
 TEST(DaemonReplies, LongNamesAreCutOnAUtf8Boundary) {
     // "ü" is two bytes: a cut at 5 bytes must not split the third one.
     const std::string name = "\xC3\xBC\xC3\xBC\xC3\xBC";
-    EXPECT_EQ(CleanText(name, 5), "\xC3\xBC\xC3\xBC");
-    EXPECT_EQ(CleanText(name, 6), name);
+    EXPECT_EQ(CleanText(name, kPrintableUtf8, 5), "\xC3\xBC\xC3\xBC");
+    EXPECT_EQ(CleanText(name, kPrintableUtf8, 6), name);
     // Four-byte characters too.
-    EXPECT_EQ(CleanText("a\xF0\x9F\x8E\xB5", 4), "a");
+    EXPECT_EQ(CleanText("a\xF0\x9F\x8E\xB5", kPrintableUtf8, 4), "a");
 }
 
 TEST(DaemonReplies, InvalidUtf8AndControlCharactersBecomeSpaces) {
     EXPECT_EQ(CleanText("a\xFF"
                         "b\x01"
                         "c\xC3",
-                        100),
+                        kPrintableUtf8, 100),
               "a b c ");
-    EXPECT_EQ(CleanText("\xED\xA0\x80", 100), "   ");  // a UTF-16 surrogate is not UTF-8
-    EXPECT_EQ(CleanText("\xC0\xAF", 100), "  ");       // overlong '/'
+    EXPECT_EQ(CleanText("\xED\xA0\x80", kPrintableUtf8, 100),
+              "   ");                                             // a UTF-16 surrogate is not UTF-8
+    EXPECT_EQ(CleanText("\xC0\xAF", kPrintableUtf8, 100), "  ");  // overlong '/'
 }
