@@ -14,11 +14,10 @@ index_files=${INDEX_FILES:-10000}
 browse_tracks=${BROWSE_TRACKS:-100000}
 repeats=${REPEATS:-5}
 
+# The test kit's shell side: the veth link and the bounded stop of the servers.
+. "$here/../../tests/harness/stack.sh"
 ip link set lo up
-ip link add hm0 type veth peer name hm1
-for i in hm0 hm1; do echo 1 > /proc/sys/net/ipv6/conf/$i/disable_ipv6; done
-ip addr add 192.0.2.1/24 dev hm0; ip addr add 192.0.2.2/24 dev hm1
-ip link set hm0 up; ip link set hm1 up; ip route add 239.0.0.0/8 dev hm0
+veth_pair hm0 192.0.2.1 hm1 192.0.2.2
 mount --make-rprivate /
 for d in /volume1 /var/packages /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
 # MiniDLNA skips MP3 files under 8 KiB ("File too small"): 1.2 s at 44.1 kHz is about 10 KB.
@@ -60,7 +59,7 @@ if [[ "$with_gerbera" == 1 ]]; then
     gerbera -m /tmp/gerbera -f gerbera -e hm0 -p 49152 -a /volume1/music >/tmp/gerbera/stdout.log 2>&1 &
     gerbera=$!
 fi
-trap 'kill $mediad $minidlna $gerbera 2>/dev/null || true' EXIT
+trap 'for p in $gerbera $minidlna $mediad; do stop_process "$p"; done' EXIT
 
 soap() {  # url object start count [flag]
     printf '<?xml version="1.0"?><s:Envelope xmlns:s="http://schemas.xmlsoap.org/soap/envelope/" s:encodingStyle="http://schemas.xmlsoap.org/soap/encoding/"><s:Body><u:Browse xmlns:u="urn:schemas-upnp-org:service:ContentDirectory:1"><ObjectID>%s</ObjectID><BrowseFlag>'"${5:-BrowseDirectChildren}"'</BrowseFlag><Filter>*</Filter><StartingIndex>%s</StartingIndex><RequestedCount>%s</RequestedCount><SortCriteria></SortCriteria></u:Browse></s:Body></s:Envelope>' "$2" "$3" "$4" |

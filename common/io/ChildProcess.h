@@ -25,7 +25,13 @@ class ChildProcess {
     // the read end. An empty owner (and a closed `output`) when fork or pipe failed.
     static ChildProcess Start(const std::function<int(int writeFd)>& work, FileDescriptor& output);
 
+    // The owner of a child that the caller forked itself (a test's helper process).
+    static ChildProcess Adopt(pid_t pid) { return ChildProcess(pid); }
+
     explicit operator bool() const { return pid_ > 0; }
+    // The child's process id (-1 when there is none): for signals other than Stop's and for its
+    // entries under /proc.
+    pid_t pid() const { return pid_; }
 
     // Waits for the child to end; its exit status, or -1 when it was ended by a signal.
     int Wait();

@@ -18,6 +18,9 @@
 #ifndef HARMONA_CGI_PATH
 #error "HARMONA_CGI_PATH must name the built audiotree.cgi"
 #endif
+#ifndef HARMONA_LIBRARY_CGI_PATH
+#error "HARMONA_LIBRARY_CGI_PATH must name the built library.cgi"
+#endif
 
 namespace harmona::test {
 namespace {
@@ -112,6 +115,10 @@ std::vector<std::string> CgiResult::LogMessages() const {
 
 std::string CgiProgram() {
     return HARMONA_CGI_PATH;
+}
+
+std::string LibraryCgiProgram() {
+    return HARMONA_LIBRARY_CGI_PATH;
 }
 
 bool ParseJson(const std::string& text, Json::Value& out) {

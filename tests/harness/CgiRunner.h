@@ -31,7 +31,7 @@ struct CgiRequest {
     // Parse the reply body as JSON into CgiResult::json (off for replies of hundreds of MiB).
     bool parseJson = true;
     int timeoutMs = 30000;
-    std::string program;  // empty: the built audiotree.cgi
+    std::string program;  // empty: the built audiotree.cgi; LibraryCgiProgram() for library.cgi
 };
 
 struct CgiResult {
@@ -56,8 +56,10 @@ struct CgiResult {
     std::vector<std::string> LogMessages() const;
 };
 
-// Path of the built CGI program.
+// Paths of the built CGI programs: audiotree.cgi (the tree) and library.cgi (the listening page's
+// JSON API). Both run through RunCgi.
 std::string CgiProgram();
+std::string LibraryCgiProgram();
 
 // Convenience: a GET request with the given query string for `user`.
 CgiResult RunCgi(const CgiRequest& request);

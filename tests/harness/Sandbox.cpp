@@ -15,6 +15,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <mutex>
 #include <thread>
 
 #ifndef HARMONA_KEEP_PATHS
@@ -64,6 +65,9 @@ std::vector<KeptPath>& KeptPaths() {
 bool entered = false;
 int syslogFd = -1;
 std::vector<LogLine> pendingLines;
+// A running system's services log while the test works (Stack.h drains the socket from a thread of
+// its own), so the pending lines are shared.
+std::mutex pendingMutex;
 
 void BringLoopbackUp() {
     const int s = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
@@ -116,6 +120,7 @@ void OpenSyslogCatcher() {
     chmod("/dev/log", 0666);
     int size = 4 << 20;
     setsockopt(syslogFd, SOL_SOCKET, SO_RCVBUF, &size, sizeof(size));
+    std::lock_guard<std::mutex> lock(pendingMutex);
     pendingLines.clear();
 }
 
@@ -203,6 +208,7 @@ int SyslogSocket() {
 }
 
 void DrainSyslog() {
+    std::lock_guard<std::mutex> lock(pendingMutex);
     char buffer[65536];
     for (;;) {
         const ssize_t n = recv(syslogFd, buffer, sizeof(buffer), MSG_DONTWAIT);
@@ -217,6 +223,7 @@ std::vector<LogLine> TakeLogLines(int settleMs) {
         std::this_thread::sleep_for(std::chrono::milliseconds(settleMs));
     DrainSyslog();
     std::vector<LogLine> lines;
+    std::lock_guard<std::mutex> lock(pendingMutex);
     lines.swap(pendingLines);
     return lines;
 }

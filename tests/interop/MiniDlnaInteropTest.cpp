@@ -16,6 +16,7 @@
 #include "platform/dma/DMABrowse.h"
 #include "platform/dma/DMAParser.h"
 #include "tests/harness/Fixtures.h"
+#include "tests/harness/Service.h"
 
 using namespace harmona::test;
 
@@ -123,13 +124,7 @@ class MiniDlnaInterop : public ::testing::Test {
         StartServer();
     }
 
-    void TearDown() override {
-        if (server_ > 0) {
-            kill(server_, SIGTERM);
-            int status = 0;
-            waitpid(server_, &status, 0);
-        }
-    }
+    void TearDown() override { server_.Stop(SIGTERM, Stack().stopGraceMs); }
 
     void GenerateLibrary() {
         MakeDirs(kRoot + "/music/big");
@@ -167,16 +162,10 @@ class MiniDlnaInterop : public ::testing::Test {
                                                 "/db\nlog_dir=" + kRoot +
                                                 "\ninotify=no\nnetwork_interface=lo\n"
                                                 "friendly_name=harmona-interop\n");
-        server_ = fork();
-        ASSERT_GE(server_, 0);
-        if (server_ == 0) {
-            const std::string log = kRoot + "/minidlnad.out";
-            freopen(log.c_str(), "w", stdout);
-            freopen(log.c_str(), "a", stderr);
-            execl("/usr/sbin/minidlnad", "minidlnad", "-f", (kRoot + "/minidlna.conf").c_str(),
-                  "-P", (kRoot + "/minidlna.pid").c_str(), "-S", "-R", static_cast<char*>(nullptr));
-            _exit(127);
-        }
+        server_ = Service::Start({"/usr/sbin/minidlnad", "-f", kRoot + "/minidlna.conf", "-P",
+                                  kRoot + "/minidlna.pid", "-S", "-R"},
+                                 kRoot + "/minidlnad.out");
+        ASSERT_TRUE(server_);
     }
 
     // Waits, bounded, until "All Music" counts every track.
@@ -193,7 +182,7 @@ class MiniDlnaInterop : public ::testing::Test {
         return false;
     }
 
-    pid_t server_ = -1;
+    Service server_;
 };
 
 TEST_F(MiniDlnaInterop, BrowsesFromTheRootDownToEveryTrack) {

@@ -24,6 +24,7 @@
 #include <thread>
 
 #include "tests/harness/Fixtures.h"
+#include "tests/harness/Network.h"
 
 namespace harmona::test::mediad {
 namespace {
@@ -181,60 +182,21 @@ void IndexStandardShare() {
 }
 
 void SetUpNetwork() {
-    if (std::system("ip link show hm0 >/dev/null 2>&1") == 0)
-        return;
-    Run("ip link add hm0 type veth peer name hm1");
-    Run("echo 1 > /proc/sys/net/ipv6/conf/hm0/disable_ipv6");
-    Run("echo 1 > /proc/sys/net/ipv6/conf/hm1/disable_ipv6");
-    // Both ends live in this namespace: packets between them carry a local source address, which
-    // the kernel drops unless told to accept them (SSDP search and reply between hm1 and hm0).
-    for (const char* end : {"hm0", "hm1", "all"}) {
-        Run(std::string("echo 1 > /proc/sys/net/ipv4/conf/") + end + "/accept_local");
-        Run(std::string("echo 0 > /proc/sys/net/ipv4/conf/") + end + "/rp_filter");
-    }
-    Run("ip addr add 192.0.2.1/24 dev hm0 && ip addr add 192.0.2.2/24 dev hm1");
-    Run("ip link set hm0 up && ip link set hm1 up && ip link set lo multicast on");
-    Run("ip route add 239.0.0.0/8 dev hm0");
+    VethPair("hm0", "192.0.2.1", "hm1", "192.0.2.2");
 }
 
 bool ServerProcess::Start() {
-    pid_ = fork();
-    if (pid_ == 0) {
-        execl(HARMONA_MEDIAD_PATH, HARMONA_MEDIAD_PATH, "--interface", kInterface,
-              static_cast<char*>(nullptr));
-        _exit(127);
-    }
-    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(10);
-    while (std::chrono::steady_clock::now() < deadline) {
-        int status = 0;
-        if (waitpid(pid_, &status, WNOHANG) == pid_) {
-            pid_ = -1;
-            return false;
-        }
-        if (Exists(kPidFile) && std::atol(ReadFile(kPidFile).c_str()) == pid_)
-            return true;
-        std::this_thread::sleep_for(std::chrono::milliseconds(20));
-    }
-    return false;
+    service_ =
+        Service::Start({HARMONA_MEDIAD_PATH, "--interface", kInterface}, "/tmp/harmona-mediad.log");
+    const pid_t pid = service_.pid();
+    return service_.WaitUntilReady([pid] { return PidFileNames(kPidFile, pid); }, 10000);
 }
 
 int ServerProcess::Stop() {
-    if (pid_ <= 0)
+    if (!service_)
         return -1;
-    kill(pid_, SIGTERM);
-    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(10);
-    int status = 0;
-    while (waitpid(pid_, &status, WNOHANG) == 0) {
-        if (std::chrono::steady_clock::now() > deadline) {
-            kill(pid_, SIGKILL);
-            waitpid(pid_, &status, 0);
-            pid_ = -1;
-            return -1;
-        }
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    }
-    pid_ = -1;
-    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+    const int status = service_.Stop(SIGTERM, 10000);
+    return status >= 0 && WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 
 BrowseReply SoapBrowse(const std::string& objectId, const std::string& flag, unsigned start,

@@ -1,8 +1,9 @@
 // The test kit of the indexer and media server tests: a generated audio share (sox makes the
 // files, TagLib writes their tags), the real harmona-index and harmona-mediad run as child
-// processes (the server serves 127.0.0.1 by itself; tests of the LAN side add a network of two veth
-// ends in the test's namespace), and an independent ContentDirectory client (a hand-written SOAP
-// body over libcurl, the reply read with pugixml).
+// processes through the one kit (tests/harness/Service.h; the server serves 127.0.0.1 by itself;
+// tests of the LAN side add a network of two veth ends in the test's namespace, Network.h), and an
+// independent ContentDirectory client (a hand-written SOAP body over libcurl, the reply read with
+// pugixml).
 #pragma once
 
 #include <sys/types.h>
@@ -11,6 +12,8 @@
 #include <map>
 #include <string>
 #include <vector>
+
+#include "tests/harness/Service.h"
 
 namespace harmona::test::mediad {
 
@@ -48,17 +51,18 @@ void IndexStandardShare();
 // packets between the two ends accepted although both addresses are local.
 void SetUpNetwork();
 
-// harmona-mediad as a child; Start waits for the pid file (up to 10 s).
+// harmona-mediad as a child (its output in /tmp/harmona-mediad.log); Start waits until the pid
+// file names it (up to 10 s).
 class ServerProcess {
   public:
     ~ServerProcess() { Stop(); }
     bool Start();
-    // SIGTERM and wait (up to 10 s); the exit status, or -1.
+    // SIGTERM and wait (up to 10 s, then SIGKILL); the exit status, or -1.
     int Stop();
-    pid_t pid() const { return pid_; }
+    pid_t pid() const { return service_.pid(); }
 
   private:
-    pid_t pid_ = -1;
+    Service service_;
 };
 
 struct DidlEntry {

@@ -33,160 +33,7 @@ int ElapsedMs(SteadyClock::time_point since) {
         std::chrono::duration_cast<std::chrono::milliseconds>(SteadyClock::now() - since).count());
 }
 
-bool Shell(const std::string& command) {
-    const int status = std::system(command.c_str());
-    if (status != 0)
-        ADD_FAILURE() << "command failed (" << status << "): " << command;
-    return status == 0;
-}
-
-// In a forked child of a threaded test: only async-signal-safe calls until exec (everything is
-// prepared before the fork).
-[[noreturn]] void ExecChild(char* const* args, const char* logPath, const char* netnsPath) {
-    prctl(PR_SET_PDEATHSIG, SIGKILL);
-    if (netnsPath != nullptr) {
-        const int ns = open(netnsPath, O_RDONLY | O_CLOEXEC);
-        if (ns < 0 || setns(ns, CLONE_NEWNET) != 0)
-            _exit(126);
-    }
-    const int log = open(logPath, O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0644);
-    if (log >= 0) {
-        dup2(log, 1);
-        dup2(log, 2);
-    }
-    const int null = open("/dev/null", O_RDONLY);
-    if (null >= 0)
-        dup2(null, 0);
-    sigset_t none;
-    sigemptyset(&none);
-    sigprocmask(SIG_SETMASK, &none, nullptr);
-    execvp(args[0], args);
-    _exit(127);
-}
-
 }  // namespace
-
-Process::~Process() {
-    if (pid_ > 0)
-        Stop(SIGKILL, 2000);
-}
-
-Process& Process::operator=(Process&& other) noexcept {
-    if (this != &other) {
-        if (pid_ > 0)
-            Stop(SIGKILL, 2000);
-        pid_ = other.pid_;
-        other.pid_ = -1;
-    }
-    return *this;
-}
-
-bool Process::WaitExit(int timeoutMs, int& status) {
-    if (pid_ <= 0)
-        return false;
-    const auto start = SteadyClock::now();
-    for (;;) {
-        const pid_t done = waitpid(pid_, &status, WNOHANG);
-        if (done == pid_ || (done < 0 && errno == ECHILD)) {
-            pid_ = -1;
-            return true;
-        }
-        if (ElapsedMs(start) >= timeoutMs)
-            return false;
-        // A program that logs while it stops must not wait on the sandbox's unread log socket.
-        DrainSyslog();
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    }
-}
-
-int Process::Stop(int signal, int timeoutMs) {
-    if (pid_ <= 0)
-        return -1;
-    kill(pid_, signal);
-    int status = -1;
-    if (WaitExit(timeoutMs, status))
-        return status;
-    kill(pid_, SIGKILL);
-    WaitExit(5000, status);
-    return status;
-}
-
-Process Spawn(const std::vector<std::string>& argv, const std::string& logPath, pid_t netnsOf) {
-    std::vector<char*> args;
-    for (const std::string& arg : argv)
-        args.push_back(const_cast<char*>(arg.c_str()));
-    args.push_back(nullptr);
-    const std::string netnsPath = "/proc/" + std::to_string(netnsOf) + "/ns/net";
-    const pid_t pid = fork();
-    if (pid == 0)
-        ExecChild(args.data(), logPath.c_str(), netnsOf > 0 ? netnsPath.c_str() : nullptr);
-    EXPECT_GT(pid, 0) << "fork";
-    return Process(pid);
-}
-
-PeerNetwork::PeerNetwork() {
-    // The holder: a child in a new network namespace that lives until we close our pipe end.
-    int ready[2];
-    int hold[2];
-    if (pipe2(ready, O_CLOEXEC) != 0 || pipe2(hold, O_CLOEXEC) != 0) {
-        ADD_FAILURE() << "pipe";
-        return;
-    }
-    const pid_t pid = fork();
-    if (pid == 0) {
-        prctl(PR_SET_PDEATHSIG, SIGKILL);
-        close(hold[1]);  // else our own copy would keep the pipe open forever
-        close(ready[0]);
-        const char status = unshare(CLONE_NEWNET) == 0 ? 'y' : 'n';
-        (void)!write(ready[1], &status, 1);
-        char byte;
-        (void)!read(hold[0], &byte, 1);  // returns when the test closes its end
-        _exit(0);
-    }
-    close(ready[1]);
-    close(hold[0]);
-    holder_ = Process(pid);
-    holdFd_ = hold[1];
-    char status = 'n';
-    pollfd entry{ready[0], POLLIN, 0};
-    if (poll(&entry, 1, 5000) != 1 || read(ready[0], &status, 1) != 1 || status != 'y') {
-        close(ready[0]);
-        ADD_FAILURE() << "could not make the peer's network namespace";
-        return;
-    }
-    close(ready[0]);
-    const std::string peer = std::to_string(pid);
-    ok_ = Shell("ip link add va type veth peer name vb netns " + peer) &&
-          Shell("echo 0 > /proc/sys/net/ipv6/conf/va/accept_dad") &&
-          Shell("ip addr add 10.77.0.1/24 dev va && ip link set va up") &&
-          // More addresses of this host, for scripted servers beyond what one address may
-          // announce.
-          Shell("for n in 11 12 13 14 15 16 17; do ip addr add 10.77.0.$n/24 dev va; done") &&
-          // A route for multicast, as a LAN host has with its default route (without one the
-          // daemon warns).
-          Shell("ip route add 224.0.0.0/4 dev va") &&
-          Shell("nsenter -t " + peer +
-                " -n sh -c 'echo 0 > /proc/sys/net/ipv6/conf/vb/accept_dad && ip link set lo up && "
-                "ip addr add 10.77.0.2/24 dev vb && ip link set vb up && ip route add 224.0.0.0/4 "
-                "dev vb'");
-}
-
-PeerNetwork::~PeerNetwork() {
-    if (holdFd_ >= 0)
-        close(holdFd_);
-    int status = 0;
-    if (!holder_.WaitExit(2000, status))
-        holder_.Stop(SIGKILL, 2000);
-    // The namespace goes with its last process, and the veth pair with it.
-}
-
-Process PeerNetwork::SpawnOnPeer(const std::vector<std::string>& argv, const std::string& logPath) {
-    return Spawn(argv, logPath, holder_.pid());
-}
-
-bool RunCommand(const std::string& command) {
-    return Shell(command);
-}
 
 void SendNotify(const std::string& fromAddress, const std::string& udn, const std::string& location,
                 int maxAgeSeconds) {
@@ -269,28 +116,28 @@ void UseDaemonProgram(const std::string& path) {
 Process StartDaemon(const char* interfaceName, bool waitForDiscovery) {
     Process daemon =
         Spawn({DaemonProgram(), "--interface", interfaceName, "--verbose"}, "/tmp/vanuaudiod.log");
-    const auto start = SteadyClock::now();
     // The socket answers at once; discovery listens once the interface's address has its SSDP
     // client, which its log line tells.
     const std::string discovering =
         "searching for media servers on " + std::string(interfaceName) + " (" + kHostAddress + ")";
     bool answered = false;
-    while (ElapsedMs(start) < 5000) {
-        answered = answered || Call(3).answered;
-        if (answered && (!waitForDiscovery ||
-                         ReadFile("/tmp/vanuaudiod.log").find(discovering) != std::string::npos))
-            return daemon;
-        int status = 0;
-        if (daemon.WaitExit(0, status)) {
-            ADD_FAILURE() << "vanuaudiod exited (" << status
-                          << "): " << ReadFile("/tmp/vanuaudiod.log");
-            return daemon;
-        }
-        DrainSyslog();
-        std::this_thread::sleep_for(std::chrono::milliseconds(20));
-    }
-    ADD_FAILURE() << "vanuaudiod did not answer (or discover) within 5 s: "
-                  << ReadFile("/tmp/vanuaudiod.log");
+    const bool ready = daemon.WaitUntilReady(
+        [&] {
+            answered = answered || Call(3).answered;
+            return answered &&
+                   (!waitForDiscovery ||
+                    ReadFile("/tmp/vanuaudiod.log").find(discovering) != std::string::npos);
+        },
+        5000);
+    if (ready)
+        return daemon;
+    int status = 0;
+    if (!daemon || daemon.WaitExit(0, status))
+        ADD_FAILURE() << "vanuaudiod exited (" << status
+                      << "): " << ReadFile("/tmp/vanuaudiod.log");
+    else
+        ADD_FAILURE() << "vanuaudiod did not answer (or discover) within 5 s: "
+                      << ReadFile("/tmp/vanuaudiod.log");
     return daemon;
 }
 

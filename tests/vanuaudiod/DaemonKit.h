@@ -1,7 +1,6 @@
-// Test kit for the audio daemon: processes started by the test, a second network namespace
-// linked to the test's own by a veth pair (a second "host" on a real Ethernet-like link, so that
-// SSDP multicast and byebye travel as on a LAN), the real built vanuaudiod, a client sending the
-// request record exactly as the CGI does, and a scriptable fake media server (SSDP announcer and
+// Test kit for the audio daemon, on the one kit's services and peer network
+// (tests/harness/Service.h, Network.h): the real built vanuaudiod, a client sending the request
+// record exactly as the CGI does, and a scriptable fake media server (SSDP announcer and
 // description server) for the cases no real server can be made to produce.
 #pragma once
 
@@ -17,66 +16,22 @@
 #include <vector>
 
 #include "tests/harness/CgiRunner.h"
+#include "tests/harness/Network.h"
 #include "tests/harness/Sandbox.h"
+#include "tests/harness/Service.h"
 
 namespace harmona::test {
 
-// The test's host on the link, and the peer's.
-inline constexpr const char* kHostAddress = "10.77.0.1";
-inline constexpr const char* kHostInterface = "va";
-inline constexpr const char* kPeerAddress = "10.77.0.2";
-inline constexpr const char* kPeerInterface = "vb";
-
-// A child process; killed (SIGKILL) and reaped when destroyed unless stopped before.
-class Process {
-  public:
-    Process() = default;
-    explicit Process(pid_t pid) : pid_(pid) {}
-    ~Process();
-    Process(Process&& other) noexcept : pid_(other.pid_) { other.pid_ = -1; }
-    Process& operator=(Process&& other) noexcept;
-    Process(const Process&) = delete;
-    Process& operator=(const Process&) = delete;
-
-    pid_t pid() const { return pid_; }
-    // A child was started and is held by this object.
-    explicit operator bool() const { return pid_ > 0; }
-    // Sends `signal` and waits up to `timeoutMs` for the exit; SIGKILL after that. Returns the
-    // wait status (or -1).
-    int Stop(int signal, int timeoutMs);
-    // Waits up to `timeoutMs` for an exit by itself; true with the wait status when it exited.
-    bool WaitExit(int timeoutMs, int& status);
-
-  private:
-    pid_t pid_ = -1;
-};
+// A child process of the test (tests/harness/Service.h): killed and reaped when destroyed unless
+// stopped before.
+using Process = Service;
 
 // Starts argv[0] with `argv`, stdout and stderr into `logPath`, in this network namespace, or in
 // the one of process `netnsOf` when it is > 0.
-Process Spawn(const std::vector<std::string>& argv, const std::string& logPath, pid_t netnsOf = 0);
-
-// The veth link between this test's namespace (va, 10.77.0.1/24) and a second namespace held by a
-// sleeping child (vb, 10.77.0.2/24). Both ends up, IPv6 duplicate address detection off (the
-// link-local address is usable at once), and a route for multicast on each side.
-class PeerNetwork {
-  public:
-    PeerNetwork();  // fails the test (ADD_FAILURE) when the link cannot be made
-    ~PeerNetwork();
-    PeerNetwork(const PeerNetwork&) = delete;
-    PeerNetwork& operator=(const PeerNetwork&) = delete;
-    // The link is up on both sides.
-    explicit operator bool() const { return ok_; }
-    // Runs a program on the peer host.
-    Process SpawnOnPeer(const std::vector<std::string>& argv, const std::string& logPath);
-
-  private:
-    Process holder_;
-    int holdFd_ = -1;  // the holder exits when this closes
-    bool ok_ = false;
-};
-
-// Runs a shell command (ip, ...); a failure fails the test.
-bool RunCommand(const std::string& command);
+inline Process Spawn(const std::vector<std::string>& argv, const std::string& logPath,
+                     pid_t netnsOf = 0) {
+    return Service::Start(argv, logPath, netnsOf);
+}
 
 // Sends one ssdp:alive NOTIFY for a MediaServer:1 device `udn` from `fromAddress` (one of this
 // host's addresses on va) to the SSDP group, with whatever `location` the test wants to forge.

@@ -517,11 +517,7 @@ Process StartMediad(PeerNetwork& peer) {
                                       "/tmp/harmona-mediad.log");
     // It writes the pid file of service 3 once it serves (platform/README.md, "System
     // configuration, shares and services").
-    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(10);
-    while (!Exists("/run/vanu/service/3.pid") && std::chrono::steady_clock::now() < deadline) {
-        DrainSyslog();  // a server that logs while it starts must not block on a full log socket
-        std::this_thread::sleep_for(std::chrono::milliseconds(20));
-    }
+    mediad.WaitUntilReady([] { return Exists(Stack().mediadPidFile); }, 10000);
     EXPECT_TRUE(Exists("/run/vanu/service/3.pid")) << ReadFile("/tmp/harmona-mediad.log");
     return mediad;
 }

@@ -21,7 +21,7 @@ namespace {
 CgiResult Api(const std::vector<std::pair<std::string, std::string>>& params,
               const std::string& user = "admin") {
     CgiRequest request;
-    request.program = HARMONA_LIBRARY_CGI_PATH;
+    request.program = LibraryCgiProgram();
     request.queryString = Query(params);
     request.remoteUser = user;
     return RunCgi(request);
@@ -321,7 +321,7 @@ TEST_F(LibraryApi, WithoutALibraryIndexTheListIsRefusedAsUnavailable) {
 
 TEST_F(LibraryApi, ACallerWithoutALoginGets401AndNoBody) {
     CgiRequest request;
-    request.program = HARMONA_LIBRARY_CGI_PATH;
+    request.program = LibraryCgiProgram();
     request.queryString = "action=list&node=musiclib_random";
     request.hasRemoteUser = false;
     const CgiResult r = RunCgi(request);
@@ -331,7 +331,7 @@ TEST_F(LibraryApi, ACallerWithoutALoginGets401AndNoBody) {
 
 TEST_F(LibraryApi, ARequestFromAnotherSiteGets401) {
     CgiRequest request;
-    request.program = HARMONA_LIBRARY_CGI_PATH;
+    request.program = LibraryCgiProgram();
     request.queryString = "action=list&node=musiclib_random";
     request.extraEnv["HTTP_SEC_FETCH_SITE"] = "cross-site";
     const CgiResult r = RunCgi(request);
