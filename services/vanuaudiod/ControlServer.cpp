@@ -242,9 +242,9 @@ void ControlServer::Readable(int fd) {
 }
 
 void ControlServer::Finish(int fd, const std::string& reply) {
-    // One write, as the CGI's daemon client reads once. The reply is at most 40959 bytes and the
-    // connection is fresh, so a UNIX socket's send buffer takes it whole; a peer that already
-    // left just loses it.
+    // One write, as the CGI's daemon client reads once. The reply is at most
+    // paths::kDaemonMaxReplySize bytes and the connection is fresh, so a UNIX socket's send buffer
+    // takes it whole; a peer that already left just loses it.
     const ssize_t written = send(fd, reply.data(), reply.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
     if (written >= 0 && static_cast<std::size_t>(written) != reply.size())
         syslog(LOG_ERR, "reply cut: %zd of %zu bytes", written, reply.size());
