@@ -63,8 +63,9 @@ class Hostile : public ::testing::Test {
                 });
             EXPECT_TRUE(allowed) << "changed: " << path;
         }
-        if (r.headerEnded && r.Header("Content-Type").find("text/plain") == 0)
+        if (r.headerEnded && r.Header("Content-Type").find("text/plain") == 0) {
             EXPECT_TRUE(r.jsonOk) << r.body.substr(0, 300);
+        }
         return r;
     }
 
@@ -183,8 +184,9 @@ TEST_F(Hostile, EveryActionWithEveryParameterMissingOrEmpty) {
         const CgiResult r = RunQuery(query);
         EXPECT_TRUE(r.exited) << query;
         // Some print nothing (no action, or no node); whatever is printed is one JSON reply.
-        if (!r.output.empty())
+        if (!r.output.empty()) {
             EXPECT_TRUE(r.jsonOk) << query << ": " << r.output;
+        }
     }
     EXPECT_EQ(RunQuery("action=gettreenode&node=").body, "[]\n");  // no underscore: malformed id
     EXPECT_EQ(RunQuery("action=refresh").body, "[]\n");

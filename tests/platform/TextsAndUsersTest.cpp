@@ -99,8 +99,9 @@ TEST(ShippedTexts, EveryLanguageHoldsEveryKeyTheTreeUses) {
                 << lang << " " << section << "/" << key;
         }
         // Translated: sentences differ from the English ones.
-        if (std::string(lang) != "enu")
+        if (std::string(lang) != "enu") {
             EXPECT_NE(texts["common"]["error_system"], english["common"]["error_system"]) << lang;
+        }
     }
 }
 
