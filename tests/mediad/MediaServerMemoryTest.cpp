@@ -31,7 +31,7 @@ constexpr unsigned kPageSize = 2000;
 // allocator's ordinary drift. AddressSanitizer holds freed blocks back (256 MiB by default)
 // before it reuses them.
 #ifdef HARMONA_SANITIZE
-constexpr int kPasses = 14;  // the sanitizer build answers about four times slower
+constexpr int kPasses = 10;  // the sanitizer build answers about four times slower
 constexpr long kMarginKiB = (24 + 256) * 1024;
 #else
 constexpr int kPasses = 25;
