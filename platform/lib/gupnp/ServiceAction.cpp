@@ -5,16 +5,21 @@
 #include <cstring>
 #include <utility>
 
+#include "platform/lib/gupnp/Object.h"
+
 namespace harmona::gupnp {
 namespace {
 
 // GUPnP warns on the log for an argument the request lacks; looking in the request body first
 // keeps a client's malformed request out of the log and lets the caller answer 402 instead.
+// gupnp_service_action_get_message returns a reference of its own ("transfer full"): kept, it
+// would hold the whole message (request, and the reply once written) for the life of the process.
 bool RequestCarries(GUPnPServiceAction* action, const char* name) {
-    SoupServerMessage* message = gupnp_service_action_get_message(action);
-    if (message == nullptr)
+    const ObjectRef<SoupServerMessage> message =
+        ObjectRef<SoupServerMessage>::Adopt(gupnp_service_action_get_message(action));
+    if (!message)
         return false;
-    SoupMessageBody* body = soup_server_message_get_request_body(message);
+    SoupMessageBody* body = soup_server_message_get_request_body(message.get());
     if (body == nullptr || body->data == nullptr)
         return false;
     const std::string open = std::string("<") + name;
