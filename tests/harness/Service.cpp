@@ -27,14 +27,16 @@
 #endif
 
 namespace harmona::test {
+
+int ElapsedMs(std::chrono::steady_clock::time_point since) {
+    return static_cast<int>(std::chrono::duration_cast<std::chrono::milliseconds>(
+                                std::chrono::steady_clock::now() - since)
+                                .count());
+}
+
 namespace {
 
 using SteadyClock = std::chrono::steady_clock;
-
-int ElapsedMs(SteadyClock::time_point since) {
-    return static_cast<int>(
-        std::chrono::duration_cast<std::chrono::milliseconds>(SteadyClock::now() - since).count());
-}
 
 // The NAME=value lines of stack.sh.
 std::map<std::string, std::string> ReadStackValues() {

@@ -7,6 +7,7 @@
 
 #include <sys/types.h>
 
+#include <chrono>
 #include <functional>
 #include <string>
 #include <vector>
@@ -14,6 +15,9 @@
 #include "common/io/ChildProcess.h"
 
 namespace harmona::test {
+
+// Milliseconds since `since` on the steady clock: the budget of every bounded wait in the kit.
+int ElapsedMs(std::chrono::steady_clock::time_point since);
 
 // The running system's ports, paths and times, shared with the shell side
 // (tests/harness/stack.sh, whose NAME=value lines they are read from).

@@ -28,11 +28,6 @@ namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
-int ElapsedMs(SteadyClock::time_point since) {
-    return static_cast<int>(
-        std::chrono::duration_cast<std::chrono::milliseconds>(SteadyClock::now() - since).count());
-}
-
 }  // namespace
 
 void SendNotify(const std::string& fromAddress, const std::string& udn, const std::string& location,
