@@ -192,6 +192,7 @@ std::unique_ptr<ServedContext> ServedContext::Create(
     served->files_ =
         std::make_unique<MediaFileServer>(context, *served->directory_, options.sharePath);
     served->guard_ = std::make_unique<SubscriptionGuard>(context);
+    served->bodyLimit_ = std::make_unique<RequestBodyLimit>(context);
     gssdp_resource_group_set_message_delay(ResourceGroupOf(served->device_.get()),
                                            kSsdpMessageDelayMs);
     served->onAvailable_ = std::move(onAvailable);
@@ -247,6 +248,7 @@ ServedContext::~ServedContext() {
     settle_.Remove();
     announcements_.clear();
     // The services and the file handler go before the device and the context they hang on.
+    bodyLimit_.reset();
     guard_.reset();
     files_.reset();
     contentDirectoryService_.reset();

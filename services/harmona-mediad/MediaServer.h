@@ -86,6 +86,7 @@ class ServedContext {
     std::unique_ptr<ConnectionManagerService> connectionManagerService_;
     std::unique_ptr<MediaFileServer> files_;
     std::unique_ptr<SubscriptionGuard> guard_;
+    std::unique_ptr<RequestBodyLimit> bodyLimit_;
     std::vector<gupnp::Source> announcements_;
     gupnp::ObjectRef<GCancellable> introspection_;
     std::function<void(ServedContext&)> onAvailable_;

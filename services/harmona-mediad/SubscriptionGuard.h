@@ -42,4 +42,24 @@ class SubscriptionGuard {
     gupnp::SignalConnection requestFinished_;
 };
 
+// Bounds what one request may make this server read, on one context's HTTP server, judged from
+// the request's headers before any of its body is read: a SOAP action or a subscription is a few
+// kilobytes, so a body larger than kMaxRequestBodyBytes is answered 413, a body whose size is not
+// given up front (chunked) 411, and a GET or HEAD with a body 400; the connection is closed after
+// that answer, without reading the body.
+inline constexpr long long kMaxRequestBodyBytes = 256 * 1024;
+
+class RequestBodyLimit {
+  public:
+    explicit RequestBodyLimit(GUPnPContext* context);
+    RequestBodyLimit(const RequestBodyLimit&) = delete;
+    RequestBodyLimit& operator=(const RequestBodyLimit&) = delete;
+
+  private:
+    static void OnRequestStarted(SoupServer* server, SoupServerMessage* message, gpointer self);
+    static void OnGotHeaders(SoupServerMessage* message, gpointer self);
+
+    gupnp::SignalConnection requestStarted_;
+};
+
 }  // namespace harmona::mediad

@@ -328,5 +328,61 @@ TEST_F(MediaServerOnAChangingNetwork, AnInterfaceThatWasDownAtStartIsAnnouncedWh
                     "the interface down at start, then up");
 }
 
+// Requests whose body is too large, of unstated size or out of place are answered from their
+// headers, at once, and the server goes on serving.
+class MediaServerRequestBodies : public ::testing::Test {
+  protected:
+    void SetUp() override {
+        ASSERT_NO_FATAL_FAILURE(IndexStandardShare());
+        ASSERT_TRUE(server_.Start());
+    }
+    // The status of the answer to `head` followed by 64 KiB of body, read within 2 s; -1 if none.
+    static int StatusOf(const std::string& head) {
+        const std::string answer =
+            RawHttpExchange("127.0.0.1", 50003, head + std::string(64 * 1024, 'x'), 2000);
+        if (answer.compare(0, 9, "HTTP/1.1 ") != 0)
+            return -1;
+        return std::atoi(answer.c_str() + 9);
+    }
+    ServerProcess server_;
+};
+
+TEST_F(MediaServerRequestBodies, A300MebibytePostIsRefusedFromItsHeaders) {
+    for (const char* path : {"/ContentDirectory/control", "/ConnectionManager/control",
+                             "/ContentDirectory/event", "/media/1.mp3", "/"}) {
+        SCOPED_TRACE(path);
+        EXPECT_EQ(
+            StatusOf(std::string("POST ") + path +
+                     " HTTP/1.1\r\nHost: 127.0.0.1:50003\r\nContent-Type: text/xml\r\n"
+                     "SOAPACTION: \"urn:schemas-upnp-org:service:ContentDirectory:1#Browse\"\r\n"
+                     "Content-Length: 314572800\r\n\r\n"),
+            413);
+    }
+    EXPECT_EQ(SoapBrowse("0").entries.size(), 7u);
+}
+
+TEST_F(MediaServerRequestBodies, AChunkedPostIsAskedForItsLength) {
+    EXPECT_EQ(StatusOf("POST /ContentDirectory/control HTTP/1.1\r\nHost: 127.0.0.1:50003\r\n"
+                       "Transfer-Encoding: chunked\r\n\r\n10000\r\n"),
+              411);
+    EXPECT_EQ(SoapBrowse("0").entries.size(), 7u);
+}
+
+TEST_F(MediaServerRequestBodies, AGetOrHeadWithABodyIsRefused) {
+    for (const char* method : {"GET", "HEAD"}) {
+        SCOPED_TRACE(method);
+        EXPECT_EQ(StatusOf(std::string(method) +
+                           " /ContentDirectory.xml HTTP/1.1\r\nHost: 127.0.0.1:50003\r\n"
+                           "Content-Length: 1048576\r\n\r\n"),
+                  400);
+    }
+    EXPECT_EQ(SoapBrowse("0").entries.size(), 7u);
+}
+
+TEST_F(MediaServerRequestBodies, AnOrdinaryActionStillWorks) {
+    EXPECT_NE(SoapSimpleAction("GetSystemUpdateID", "Id"), "<failed>");
+    EXPECT_EQ(SoapBrowse("0").httpStatus, 200);
+}
+
 }  // namespace
 }  // namespace harmona::test::mediad
