@@ -35,7 +35,8 @@ struct FoundFile {
     std::string path;
     int64_t mtime = 0;
     int64_t size = 0;
-    std::string artPath;  // the folder's cover image, "" when it has none
+    std::string artPath;    // the folder's cover image, "" when it has none
+    FileIdentity identity;  // the regular file the walk saw at `path`
 };
 
 struct KnownRow {
@@ -97,8 +98,11 @@ void WalkFolder(io::FileDescriptor folder, const std::string& path, int depth,
             if (childFd)
                 WalkFolder(std::move(childFd), child, depth + 1, found);
         } else if (S_ISREG(st.st_mode) && medialib::IsIndexableAudioFile(child)) {
-            here.push_back(
-                {child, static_cast<int64_t>(st.st_mtime), static_cast<int64_t>(st.st_size), {}});
+            here.push_back({child,
+                            static_cast<int64_t>(st.st_mtime),
+                            static_cast<int64_t>(st.st_size),
+                            {},
+                            {st.st_dev, st.st_ino}});
         } else if (S_ISREG(st.st_mode)) {
             const int rank = CoverRank(name);
             if (rank < coverRank || (rank == coverRank && rank < kNoCover && child < cover)) {
@@ -153,10 +157,19 @@ bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFi
                 IndexReport& report) {
     std::vector<TrackTags> tags;
     tags.reserve(batch.size());
-    for (const FoundFile* file : batch) {
-        tags.push_back(ReadTrackTags(file->path));
+    std::vector<bool> swapped(batch.size(), false);
+    for (std::size_t i = 0; i < batch.size(); ++i) {
+        const FoundFile* file = batch[i];
+        bool changed = false;
+        tags.push_back(ReadTrackTagsOf(file->path, file->identity, changed));
         ++report.tagReads;
-        if (tags.back().broken) {
+        if (changed) {
+            // Replaced (by a link, say) since the walk saw it: not indexed in this pass; the
+            // next one sees what is there then.
+            swapped[i] = true;
+            syslog(LOG_WARNING, "file replaced while indexed, left for the next pass: %s",
+                   file->path.c_str());
+        } else if (tags.back().broken) {
             ++report.brokenTags;
             syslog(LOG_WARNING, "unreadable tags, indexed by file name: %s", file->path.c_str());
         }
@@ -165,6 +178,8 @@ bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFi
     if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
         return false;
     for (std::size_t i = 0; i < batch.size(); ++i) {
+        if (swapped[i])
+            continue;
         const TrackTags& t = tags[i];
         upsert.Reset();
         upsert.Bind(1, batch[i]->path);
