@@ -269,6 +269,35 @@ TEST(Indexer, FilesSwappedForLinksDuringAPassNeverBringTheLinkedFilesTags) {
                                 << passes << " passes, first " << leaked.front();
 }
 
+TEST(Indexer, RenamedFilesAndFoldersKeepTheirTrackIds) {
+    MakeStandardShare();
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    const auto before = TrackRows();
+    ASSERT_EQ(before.size(), 5u);
+    ASSERT_EQ(rename(SharePath("loose.ogg").c_str(), SharePath("Loose One.ogg").c_str()), 0);
+    ASSERT_EQ(rename(SharePath("Jazz/Blue").c_str(), SharePath("Jazz/Blue Note").c_str()), 0);
+    const IndexRun run = RunIndexer();
+    ASSERT_EQ(run.exitStatus, 0) << run.output;
+    EXPECT_EQ(run.counts.at("added"), 0) << run.output;
+    EXPECT_EQ(run.counts.at("removed"), 0) << run.output;
+    EXPECT_EQ(run.counts.at("moved"), 3) << run.output;
+    EXPECT_EQ(run.counts.at("tagreads"), 0) << run.output;
+    const auto after = TrackRows();
+    ASSERT_EQ(after.size(), 5u);
+    const std::pair<const char*, const char*> moves[] = {
+        {"loose.ogg", "Loose One.ogg"},
+        {"Jazz/Blue/Late/03 Third.mp3", "Jazz/Blue Note/Late/03 Third.mp3"},
+        {"Jazz/Blue/04 Fourth.wav", "Jazz/Blue Note/04 Fourth.wav"},
+        {"Rock/Alpha & Omega/01 First.flac", "Rock/Alpha & Omega/01 First.flac"}};
+    for (const auto& [from, to] : moves) {
+        SCOPED_TRACE(to);
+        ASSERT_TRUE(after.count(SharePath(to)));
+        EXPECT_EQ(after.at(SharePath(to)).id, before.at(SharePath(from)).id);
+        EXPECT_EQ(after.at(SharePath(to)).columns.at("title"),
+                  before.at(SharePath(from)).columns.at("title"));
+    }
+}
+
 TEST(Indexer, TheShareOfAudioConfIsScanned) {
     MakeAudioFile("/volume1/other/a.flac", {"Other A", "", "", "", "", 0, 0, 0});
     WriteFile(kAudioConf, "audio_share_path=/volume1/other\n");
