@@ -12,6 +12,7 @@
 
 #include <cstring>
 #include <future>
+#include <iostream>
 
 #include "platform/dma/DMABrowse.h"
 #include "platform/dma/DMAParser.h"
@@ -752,6 +753,33 @@ TEST_F(AudioDaemon, StartedBeforeItsInterfaceHasAnAddressItAnswersAtOnceAndFinds
     ASSERT_TRUE(
         ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
     EXPECT_EQ(reply["list"][0]["friendly_name"], "Late");
+}
+
+// An interface that goes down and comes back (ifdown/ifup, a Wi-Fi reconnect): GUPnP hands the
+// same context back; the daemon searches on it again and the scan button finds servers.
+TEST_F(AudioDaemon, AfterItsLinkGoesDownAndUpTheScanButtonStillFindsServers) {
+    FakeMediaServers fake;
+    fake.Add("uuid:back", FakeMediaServers::DescriptionXml("uuid:back", "Back", "/cd"));
+    daemon_ = StartDaemon();
+    ASSERT_TRUE(RunCommand("ip link set va down"));
+    std::this_thread::sleep_for(std::chrono::seconds(1));
+    ASSERT_TRUE(RunCommand("ip link set va up && ip route replace 224.0.0.0/4 dev va"));
+    const auto up = std::chrono::steady_clock::now();
+    std::this_thread::sleep_for(std::chrono::seconds(2));  // past the search on its return
+    fake.AnswerSearches("uuid:back", 60);
+    const int before = fake.SearchesSeen();
+    EXPECT_EQ(Call(14).reply, "{\"success\": true}");
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply))
+        << "searches seen since the link came back: " << fake.SearchesSeen() - before << "\n"
+        << ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(reply["list"][0]["friendly_name"], "Back");
+    std::cout << "[ recovery ] vanuaudiod, link down for 1 s then up: listed "
+              << std::chrono::duration_cast<std::chrono::milliseconds>(
+                     std::chrono::steady_clock::now() - up)
+                     .count()
+              << " ms after the link came back (2 s of it waiting before the scan)\n";
 }
 
 // The host lacks a route for multicast: one line says so, and the searches, bound to the
