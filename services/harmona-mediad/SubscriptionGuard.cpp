@@ -71,10 +71,18 @@ std::size_t SubscriptionGuard::active() {
     return subscriptions_.size();
 }
 
+std::size_t SubscriptionGuard::activeOf(const std::string& peer) {
+    ForgetExpired();
+    std::size_t count = 0;
+    for (const auto& [sid, lease] : subscriptions_)
+        count += lease.peer == peer ? 1 : 0;
+    return count;
+}
+
 void SubscriptionGuard::ForgetExpired() {
     const auto now = std::chrono::steady_clock::now();
     for (auto it = subscriptions_.begin(); it != subscriptions_.end();) {
-        if (it->second <= now)
+        if (it->second.until <= now)
             it = subscriptions_.erase(it);
         else
             ++it;
@@ -107,6 +115,14 @@ void SubscriptionGuard::OnRequestRead(SoupServer*, SoupServerMessage* message, g
                me->where_.c_str(), peerText.c_str(), kMaxSubscriptions);
         soup_server_message_set_status(message, SOUP_STATUS_SERVICE_UNAVAILABLE,
                                        "Too many subscriptions");
+        return;
+    }
+    const bool loopback = peerText.rfind("127.", 0) == 0 || peerText == "::1";
+    if (!loopback && me->activeOf(peerText) >= kMaxSubscriptionsPerPeer) {
+        syslog(LOG_WARNING, "refused a subscription on %s from %s: it holds %zu already",
+               me->where_.c_str(), peerText.c_str(), kMaxSubscriptionsPerPeer);
+        soup_server_message_set_status(message, SOUP_STATUS_SERVICE_UNAVAILABLE,
+                                       "Too many subscriptions from this host");
     }
 }
 
@@ -121,9 +137,12 @@ void SubscriptionGuard::OnRequestFinished(SoupServer*, SoupServerMessage* messag
     if (subscribe) {
         SoupMessageHeaders* response = soup_server_message_get_response_headers(message);
         const char* sid = soup_message_headers_get_one(response, "SID");
+        const char* peer = soup_server_message_get_remote_host(message);
         if (sid != nullptr)
-            me->subscriptions_[sid] = std::chrono::steady_clock::now() +
-                                      LeaseOf(soup_message_headers_get_one(response, "Timeout"));
+            me->subscriptions_[sid] =
+                Lease{std::chrono::steady_clock::now() +
+                          LeaseOf(soup_message_headers_get_one(response, "Timeout")),
+                      peer != nullptr ? peer : ""};
     } else {
         const char* sid =
             soup_message_headers_get_one(soup_server_message_get_request_headers(message), "SID");

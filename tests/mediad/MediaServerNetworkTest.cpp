@@ -384,5 +384,51 @@ TEST_F(MediaServerRequestBodies, AnOrdinaryActionStillWorks) {
     EXPECT_EQ(SoapBrowse("0").httpStatus, 200);
 }
 
+// Event subscriptions from the LAN: one host holds a few of them at most, so that the others
+// still get theirs.
+class MediaServerLanSubscriptions : public ::testing::Test {
+  protected:
+    void SetUp() override {
+        ASSERT_NO_FATAL_FAILURE(IndexStandardShare());
+        SetUpNetwork();
+        ASSERT_TRUE(Shell("ip addr add 192.0.2.4/24 dev hm1"));
+        ASSERT_TRUE(server_.Start());
+        std::string description;
+        for (int i = 0; i < 100 && description.find(" 200 ") == std::string::npos; ++i) {
+            description = RawHttpExchange("192.0.2.1", 50003,
+                                          "GET /ContentDirectory.xml HTTP/1.1\r\nHost: "
+                                          "192.0.2.1:50003\r\nConnection: close\r\n\r\n",
+                                          1000);
+            std::this_thread::sleep_for(std::chrono::milliseconds(100));
+        }
+        ASSERT_NE(description.find(" 200 "), std::string::npos) << "the LAN side never served";
+    }
+    // A SUBSCRIBE from `peer` with a callback on `peer`; the answer's status, -1 if none.
+    static int Subscribe(const std::string& peer) {
+        const std::string request =
+            "SUBSCRIBE /ContentDirectory/event HTTP/1.1\r\nHOST: 192.0.2.1:50003\r\n"
+            "CALLBACK: <http://" +
+            peer + ":9/>\r\nNT: upnp:event\r\nTIMEOUT: Second-1800\r\nContent-Length: 0\r\n\r\n";
+        const std::string answer = RawHttpExchange("192.0.2.1", 50003, request, 3000, peer);
+        if (answer.compare(0, 9, "HTTP/1.1 ") != 0)
+            return -1;
+        return std::atoi(answer.c_str() + 9);
+    }
+    ServerProcess server_;
+};
+
+TEST_F(MediaServerLanSubscriptions, OneHostHoldsEightAndAnotherStillGetsItsOwn) {
+    int accepted = 0;
+    int refused = 0;
+    for (int i = 0; i < 12; ++i) {
+        const int status = Subscribe(kPeerSide);
+        accepted += status == 200 ? 1 : 0;
+        refused += status == 503 ? 1 : 0;
+    }
+    EXPECT_EQ(accepted, 8);
+    EXPECT_EQ(refused, 4);
+    EXPECT_EQ(Subscribe("192.0.2.4"), 200);
+}
+
 }  // namespace
 }  // namespace harmona::test::mediad
