@@ -809,6 +809,22 @@ TEST_F(AudioDaemon, WithoutAMulticastRouteOneLogLineSaysSoAndSearchesStillFindSe
         << log;
 }
 
+// The route comes a moment after the address (as a DHCP client or a network manager sets them):
+// no warning about a missing route.
+TEST_F(AudioDaemon, AMulticastRouteThatFollowsItsAddressIsNotReportedMissing) {
+    ASSERT_TRUE(RunCommand("ip route del 224.0.0.0/4 dev va && ip addr flush dev va"));
+    daemon_ = StartDaemon(kHostInterface, false);
+    ASSERT_TRUE(RunCommand("ip addr add 10.77.0.1/24 dev va"));
+    ASSERT_TRUE(WaitForLog("searching for media servers on va (10.77.0.1)", 5000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    std::this_thread::sleep_for(std::chrono::milliseconds(500));
+    ASSERT_TRUE(RunCommand("ip route replace 224.0.0.0/4 dev va"));
+    std::this_thread::sleep_for(std::chrono::milliseconds(4000));
+    DrainSyslog();
+    const std::string log = ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(log.find("no multicast route"), std::string::npos) << log;
+}
+
 // The media servers users have beside ours, found through the real CGI and gone when they stop.
 namespace {
 
