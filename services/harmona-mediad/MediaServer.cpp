@@ -19,7 +19,7 @@
 namespace harmona::mediad {
 namespace {
 
-constexpr unsigned kLoopbackRetryMs = 2000;
+constexpr unsigned kLoopbackRetryMs = 1000;
 constexpr unsigned kLibraryWatchMs = 2000;
 constexpr unsigned kMulticastWatchMs = 2000;
 // After a context appears: announce again this many seconds later, so that a player that missed
@@ -340,11 +340,12 @@ MediaServer::~MediaServer() {
 
 void MediaServer::Start(std::function<void()> onLoopbackReady) {
     onLoopbackReady_ = std::move(onLoopbackReady);
-    if (!TryLoopback()) {
-        loopbackRetry_ =
-            gupnp::Source::Timeout(kLoopbackRetryMs, [this] { return !TryLoopback(); });
-    }
+    // The context manager makes the loopback context too, within its first turns of the loop; a
+    // context of our own is made only when it has not, so that nothing binds the port twice (GLib
+    // would warn of a port in use at every start).
     StartContextManager();
+    loopbackRetry_ =
+        gupnp::Source::Timeout(kLoopbackRetryMs, [this] { return !loopback_ && !TryLoopback(); });
     // The library as it is now, loaded before anything is served; later changes are loaded by a
     // thread (RefreshLibrary), so that SSDP and the other requests never wait for a load.
     directory_->SystemUpdateId();
@@ -412,6 +413,8 @@ void MediaServer::StartContextManager() {
     if (options_.interfaceName != nullptr) {
         GUPnPContextFilter* filter = gupnp_context_manager_get_context_filter(manager_.get());
         gupnp_context_filter_add_entry(filter, options_.interfaceName);
+        // Loopback serves this host's own programs whatever interface serves the LAN.
+        gupnp_context_filter_add_entry(filter, "lo");
         gupnp_context_filter_set_enabled(filter, TRUE);
     }
     managerSignals_.emplace_back(manager_.get(), "context-available",
@@ -425,9 +428,8 @@ void MediaServer::OnContextAvailable(GUPnPContextManager*, GUPnPContext* context
     const std::string address = OrEmpty(gssdp_client_get_host_ip(GSSDP_CLIENT(context)));
     const std::string interfaceName = OrEmpty(gssdp_client_get_interface(GSSDP_CLIENT(context)));
     if (address.rfind("127.", 0) == 0) {
-        // Loopback has a context of its own, made first; the manager's attempt on lo then fails
-        // to bind (GUPnP warns once). Should the manager have got there first, its context
-        // serves 127.0.0.1 instead.
+        // The manager's context on lo serves 127.0.0.1 (a context of our own is made only when
+        // none came from the manager in time).
         std::string error;
         if (!me->loopback_ && me->ServeLoopback(context, error))
             me->loopbackRetry_.Remove();

@@ -104,8 +104,9 @@ class MediaServer {
     MediaServer(const MediaServer&) = delete;
     MediaServer& operator=(const MediaServer&) = delete;
 
-    // Starts serving on loopback (retried every 2 s while it fails) and on the LAN (as the
-    // context manager reports interfaces). `onLoopbackReady` runs once, when 127.0.0.1 serves.
+    // Starts serving on loopback (the context manager's context on lo; one of our own, retried
+    // every second, when none came) and on the LAN (as the context manager reports interfaces).
+    // `onLoopbackReady` runs once, when 127.0.0.1 serves.
     void Start(std::function<void()> onLoopbackReady);
     // Byebye on every context.
     void SayByeBye();

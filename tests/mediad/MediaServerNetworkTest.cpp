@@ -328,6 +328,20 @@ TEST_F(MediaServerOnAChangingNetwork, AnInterfaceThatWasDownAtStartIsAnnouncedWh
                     "the interface down at start, then up");
 }
 
+// A start on a healthy host prints nothing that reads like a fault: no GLib warning about a port
+// in use (the server's own loopback port, tried twice).
+TEST_F(MediaServerOnAChangingNetwork, AStartPrintsNoWarningAboutItsOwnPort) {
+    SetUpNetwork();
+    SsdpRecorder recorder;
+    ASSERT_TRUE(StartOnTheNetwork(recorder));
+    EXPECT_EQ(SoapBrowse("0").entries.size(), 7u);
+    std::this_thread::sleep_for(std::chrono::seconds(1));
+    const std::string log = ReadFile("/tmp/harmona-mediad.log");
+    EXPECT_EQ(log.find("Address already in use"), std::string::npos) << log;
+    EXPECT_EQ(log.find("Unable to listen"), std::string::npos) << log;
+    EXPECT_EQ(log.find("WARNING"), std::string::npos) << log;
+}
+
 // Requests whose body is too large, of unstated size or out of place are answered from their
 // headers, at once, and the server goes on serving.
 class MediaServerRequestBodies : public ::testing::Test {
