@@ -49,7 +49,10 @@ bool OriginNamesHost(std::string_view origin, std::string_view host) {
 }  // namespace
 
 bool IsCrossSiteRequest(const char* secFetchSite, const char* origin, const char* host) {
-    if (secFetchSite != nullptr && strcasecmp(secFetchSite, "cross-site") == 0)
+    // Only this very origin, or the user's own navigation ("none"), may act: "same-site" is any
+    // other port or subdomain of the host's site, which may run pages nobody here vetted.
+    if (secFetchSite != nullptr && strcasecmp(secFetchSite, "same-origin") != 0 &&
+        strcasecmp(secFetchSite, "none") != 0)
         return true;
     if (origin == nullptr)
         return false;

@@ -8,7 +8,8 @@
 namespace harmona::cgi {
 
 // True when the request must be refused as coming from another site:
-// - `secFetchSite` (the Sec-Fetch-Site header) is "cross-site", or
+// - `secFetchSite` (the Sec-Fetch-Site header) is present and neither "same-origin" nor "none"
+//   (so "same-site" and "cross-site" are refused), or
 // - `origin` (the Origin header) is present and does not name the request's own host `host` (the
 //   Host header): its scheme is http or https, and what follows "://" equals `host`, letters of
 //   any case, the scheme's default port (":80" for http, ":443" for https) written or not.

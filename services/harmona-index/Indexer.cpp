@@ -13,6 +13,7 @@
 #include <ctime>
 #include <functional>
 #include <iterator>
+#include <map>
 #include <unordered_map>
 #include <vector>
 
@@ -35,7 +36,8 @@ struct FoundFile {
     std::string path;
     int64_t mtime = 0;
     int64_t size = 0;
-    std::string artPath;  // the folder's cover image, "" when it has none
+    std::string artPath;    // the folder's cover image, "" when it has none
+    FileIdentity identity;  // the regular file the walk saw at `path`
 };
 
 struct KnownRow {
@@ -97,8 +99,11 @@ void WalkFolder(io::FileDescriptor folder, const std::string& path, int depth,
             if (childFd)
                 WalkFolder(std::move(childFd), child, depth + 1, found);
         } else if (S_ISREG(st.st_mode) && medialib::IsIndexableAudioFile(child)) {
-            here.push_back(
-                {child, static_cast<int64_t>(st.st_mtime), static_cast<int64_t>(st.st_size), {}});
+            here.push_back({child,
+                            static_cast<int64_t>(st.st_mtime),
+                            static_cast<int64_t>(st.st_size),
+                            {},
+                            {st.st_dev, st.st_ino}});
         } else if (S_ISREG(st.st_mode)) {
             const int rank = CoverRank(name);
             if (rank < coverRank || (rank == coverRank && rank < kNoCover && child < cover)) {
@@ -153,10 +158,19 @@ bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFi
                 IndexReport& report) {
     std::vector<TrackTags> tags;
     tags.reserve(batch.size());
-    for (const FoundFile* file : batch) {
-        tags.push_back(ReadTrackTags(file->path));
+    std::vector<bool> swapped(batch.size(), false);
+    for (std::size_t i = 0; i < batch.size(); ++i) {
+        const FoundFile* file = batch[i];
+        bool changed = false;
+        tags.push_back(ReadTrackTagsOf(file->path, file->identity, changed));
         ++report.tagReads;
-        if (tags.back().broken) {
+        if (changed) {
+            // Replaced (by a link, say) since the walk saw it: not indexed in this pass; the
+            // next one sees what is there then.
+            swapped[i] = true;
+            syslog(LOG_WARNING, "file replaced while indexed, left for the next pass: %s",
+                   file->path.c_str());
+        } else if (tags.back().broken) {
             ++report.brokenTags;
             syslog(LOG_WARNING, "unreadable tags, indexed by file name: %s", file->path.c_str());
         }
@@ -165,6 +179,8 @@ bool WriteBatch(Database& db, Statement& upsert, const std::vector<const FoundFi
     if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
         return false;
     for (std::size_t i = 0; i < batch.size(); ++i) {
+        if (swapped[i])
+            continue;
         const TrackTags& t = tags[i];
         upsert.Reset();
         upsert.Bind(1, batch[i]->path);
@@ -223,6 +239,20 @@ bool RefreshRows(Database& db, const std::vector<const FoundFile*>& files) {
     });
 }
 
+// Rows whose file was renamed or moved: the new path and folder cover, the same id and tags.
+bool MoveRows(Database& db, const std::vector<std::pair<std::string, const FoundFile*>>& moved) {
+    Statement move = db.Prepare("UPDATE track SET path = ?1, art_path = ?2 WHERE path = ?3");
+    if (!move)
+        return false;
+    return WriteRowsInBatches(db, moved.size(), [&](std::size_t i) {
+        move.Reset();
+        move.Bind(1, moved[i].second->path);
+        BindOptionalText(move, 2, moved[i].second->artPath);
+        move.Bind(3, moved[i].first);
+        return move.Step() == SQLITE_DONE;
+    });
+}
+
 bool RemoveRows(Database& db, const std::vector<std::string>& gone) {
     Statement remove = db.Prepare("DELETE FROM track WHERE path = ?1");
     if (!remove)
@@ -267,11 +297,11 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath,
     std::unordered_map<std::string, KnownRow> known = LoadKnownRows(db);
     std::vector<const FoundFile*> toRead;
     std::vector<const FoundFile*> toRefresh;
+    std::vector<const FoundFile*> newFiles;
     for (const FoundFile& file : found) {
         auto row = known.find(file.path);
         if (row == known.end()) {
-            toRead.push_back(&file);
-            ++report.added;
+            newFiles.push_back(&file);
             continue;
         }
         row->second.seen = true;
@@ -283,6 +313,34 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath,
             toRefresh.push_back(&file);
         }
     }
+
+    // Renamed files and folders keep their rows (and ids, which queues, bookmarks and playlists
+    // hold): a file new to the library whose size and mtime match those of exactly one row whose
+    // file is gone, and no other new file's, is that row's file moved (a rename changes neither).
+    std::map<std::pair<int64_t, int64_t>, std::vector<std::string>> goneByStamp;
+    for (const auto& [path, row] : known) {
+        if (!row.seen && row.size >= 0)
+            goneByStamp[{row.mtime, row.size}].push_back(path);
+    }
+    std::map<std::pair<int64_t, int64_t>, int> newByStamp;
+    for (const FoundFile* file : newFiles)
+        ++newByStamp[{file->mtime, file->size}];
+    std::vector<std::pair<std::string, const FoundFile*>> moved;
+    for (const FoundFile* file : newFiles) {
+        const std::pair<int64_t, int64_t> stamp{file->mtime, file->size};
+        const auto candidates = goneByStamp.find(stamp);
+        if (candidates != goneByStamp.end() && candidates->second.size() == 1 &&
+            newByStamp[stamp] == 1) {
+            known[candidates->second.front()].seen = true;
+            moved.emplace_back(candidates->second.front(), file);
+            continue;
+        }
+        toRead.push_back(file);
+        ++report.added;
+    }
+    report.moved = moved.size();
+    if (!MoveRows(db, moved))
+        return Fail(report, "cannot record moved tracks: " + db.Error());
 
     // A re-read keeps the row's id and its "added" (the first time the file was seen).
     Statement upsert = db.Prepare(
@@ -327,9 +385,9 @@ IndexReport IndexShare(const std::string& share, const std::string& dbPath,
 std::string FormatReport(const IndexReport& report) {
     char line[256];
     std::snprintf(line, sizeof(line),
-                  "files=%zu added=%zu updated=%zu removed=%zu tagreads=%zu broken=%zu",
-                  report.filesSeen, report.added, report.updated, report.removed, report.tagReads,
-                  report.brokenTags);
+                  "files=%zu added=%zu updated=%zu removed=%zu moved=%zu tagreads=%zu broken=%zu",
+                  report.filesSeen, report.added, report.updated, report.removed, report.moved,
+                  report.tagReads, report.brokenTags);
     return line;
 }
 

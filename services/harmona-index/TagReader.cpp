@@ -1,11 +1,17 @@
 #include "services/harmona-index/TagReader.h"
 
+#include <fcntl.h>
+#include <sys/stat.h>
 #include <taglib/fileref.h>
 #include <taglib/tag.h>
+#include <taglib/tfilestream.h>
+#include <taglib/tiostream.h>
 #include <taglib/tpropertymap.h>
+#include <unistd.h>
 
 #include <cstdlib>
 
+#include "common/io/FileDescriptor.h"
 #include "common/util/Utf8.h"
 
 namespace harmona::index {
@@ -28,20 +34,34 @@ int64_t LeadingNumber(const std::string& text) {
     return value > 0 ? value : 0;
 }
 
-}  // namespace
+// An open descriptor as TagLib's stream, under the file's own name, so that TagLib picks the file
+// type by the name's extension as it does for a path.
+class NamedDescriptorStream : public TagLib::IOStream {
+  public:
+    NamedDescriptorStream(int fd, const std::string& path)
+        : stream_(fd, true), name_(path.c_str()) {}
+    TagLib::FileName name() const override { return name_.c_str(); }
+    TagLib::ByteVector readBlock(unsigned long length) override {
+        return stream_.readBlock(length);
+    }
+    void writeBlock(const TagLib::ByteVector&) override {}
+    void insert(const TagLib::ByteVector&, unsigned long, unsigned long) override {}
+    void removeBlock(unsigned long, unsigned long) override {}
+    bool readOnly() const override { return true; }
+    bool isOpen() const override { return stream_.isOpen(); }
+    void seek(long offset, Position p) override { stream_.seek(offset, p); }
+    void clear() override { stream_.clear(); }
+    long tell() const override { return stream_.tell(); }
+    long length() override { return stream_.length(); }
+    void truncate(long) override {}
 
-std::string TitleFromFileName(const std::string& path) {
-    const std::size_t slash = path.rfind('/');
-    std::string name = slash == std::string::npos ? path : path.substr(slash + 1);
-    const std::size_t dot = name.rfind('.');
-    if (dot != std::string::npos && dot > 0)
-        name.erase(dot);
-    return std::string(util::CutUtf8(name, kMaxTagBytes));
-}
+  private:
+    TagLib::FileStream stream_;  // takes over the descriptor
+    std::string name_;
+};
 
-TrackTags ReadTrackTags(const std::string& path) {
+TrackTags TagsOf(TagLib::FileRef& file, const std::string& path) {
     TrackTags tags;
-    TagLib::FileRef file(path.c_str(), true, TagLib::AudioProperties::Fast);
     if (file.isNull() || file.tag() == nullptr) {
         tags.broken = true;
         tags.title = TitleFromFileName(path);
@@ -62,6 +82,36 @@ TrackTags ReadTrackTags(const std::string& path) {
     if (tags.title.empty())
         tags.title = TitleFromFileName(path);
     return tags;
+}
+
+}  // namespace
+
+std::string TitleFromFileName(const std::string& path) {
+    const std::size_t slash = path.rfind('/');
+    std::string name = slash == std::string::npos ? path : path.substr(slash + 1);
+    const std::size_t dot = name.rfind('.');
+    if (dot != std::string::npos && dot > 0)
+        name.erase(dot);
+    return std::string(util::CutUtf8(name, kMaxTagBytes));
+}
+
+TrackTags ReadTrackTagsOf(const std::string& path, const FileIdentity& seen, bool& swapped) {
+    swapped = false;
+    // O_NONBLOCK: a FIFO put in the file's place must not hold the open up.
+    io::FileDescriptor fd(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+    struct stat st {};
+    if (!fd || fstat(fd.Get(), &st) != 0 || !S_ISREG(st.st_mode) || st.st_dev != seen.device ||
+        st.st_ino != seen.inode) {
+        swapped = bool(fd) || errno == ELOOP;
+        TrackTags tags;
+        tags.broken = true;
+        tags.title = TitleFromFileName(path);
+        return tags;
+    }
+    fcntl(fd.Get(), F_SETFL, fcntl(fd.Get(), F_GETFL) & ~O_NONBLOCK);
+    NamedDescriptorStream stream(fd.Release(), path);
+    TagLib::FileRef file(&stream, true, TagLib::AudioProperties::Fast);
+    return TagsOf(file, path);
 }
 
 }  // namespace harmona::index

@@ -5,6 +5,8 @@
 #include <cstdint>
 #include <string>
 
+#include <sys/types.h>
+
 namespace harmona::index {
 
 // A tag value is cut to this many bytes (on a UTF-8 character boundary) when read: a display text
@@ -18,7 +20,17 @@ struct TrackTags {
     bool broken = false;  // TagLib could not read the file: only the title (file name) is set
 };
 
-TrackTags ReadTrackTags(const std::string& path);
+// The file the walk saw: its device and inode.
+struct FileIdentity {
+    dev_t device = 0;
+    ino_t inode = 0;
+};
+
+// The tags of `path` read through one descriptor, opened without following a symbolic link and
+// checked to be the regular file `seen` (the walk's fstatat): a file swapped for a link, a FIFO or
+// another file between the walk and the read gives `broken` tags by file name and sets `swapped`,
+// never the tags of what the path names now.
+TrackTags ReadTrackTagsOf(const std::string& path, const FileIdentity& seen, bool& swapped);
 
 // The file name of `path` without its extension ("a/b/Song.mp3" -> "Song").
 std::string TitleFromFileName(const std::string& path);

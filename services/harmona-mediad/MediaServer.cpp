@@ -1,6 +1,7 @@
 #include "services/harmona-mediad/MediaServer.h"
 
 #include <arpa/inet.h>
+#include <ifaddrs.h>
 #include <net/if.h>
 #include <netinet/in.h>
 #include <sys/ioctl.h>
@@ -12,12 +13,13 @@
 #include <cstring>
 
 #include "common/io/FileDescriptor.h"
+#include "platform/lib/gupnp/ContextManager.h"
 #include "services/harmona-mediad/DeviceDescription.h"
 
 namespace harmona::mediad {
 namespace {
 
-constexpr unsigned kLoopbackRetryMs = 2000;
+constexpr unsigned kLoopbackRetryMs = 1000;
 constexpr unsigned kLibraryWatchMs = 2000;
 constexpr unsigned kMulticastWatchMs = 2000;
 // After a context appears: announce again this many seconds later, so that a player that missed
@@ -25,6 +27,10 @@ constexpr unsigned kMulticastWatchMs = 2000;
 constexpr unsigned kAnnounceAgainSeconds[] = {3, 10, 30};
 // GSSDP's pause between SSDP messages; short, so that the byebye set leaves before exit.
 constexpr unsigned kSsdpMessageDelayMs = 20;
+// How many times each alive datagram goes out per announcement (UDP may lose one).
+constexpr int kAliveCopies = 2;
+// The hop limit of SSDP multicast, as GSSDP sets it.
+constexpr int kSsdpTtl = 4;
 
 const char* OrEmpty(const char* text) {
     return text != nullptr ? text : "";
@@ -73,6 +79,78 @@ bool MulticastCanLeave(const std::string& interfaceName, const std::string& addr
     return ok;
 }
 
+// Whether `address` is still configured on some interface of this host: after a link goes down
+// it is, after the address was removed it is not.
+bool AddressIsConfigured(const std::string& address) {
+    ifaddrs* list = nullptr;
+    if (getifaddrs(&list) != 0)
+        return true;  // cannot tell: keep what is served
+    bool found = false;
+    for (ifaddrs* entry = list; entry != nullptr && !found; entry = entry->ifa_next) {
+        if (entry->ifa_addr == nullptr || entry->ifa_addr->sa_family != AF_INET)
+            continue;
+        char text[INET_ADDRSTRLEN] = "";
+        inet_ntop(AF_INET, &reinterpret_cast<sockaddr_in*>(entry->ifa_addr)->sin_addr, text,
+                  sizeof(text));
+        found = address == text;
+    }
+    freeifaddrs(list);
+    return found;
+}
+
+// The ssdp:alive set of a root device: the root, its UDN, its type and each service type, as
+// GSSDP announces them, sent from `address` to the SSDP group. GSSDP has no way to send an alive
+// set alone (it announces only on becoming available, after a byebye), so the re-announcements
+// are written here.
+void SendAliveSet(GUPnPRootDevice* device, GUPnPContext* context, const std::string& address) {
+    GUPnPDeviceInfo* info = GUPNP_DEVICE_INFO(device);
+    const std::string location = OrEmpty(gupnp_device_info_get_location(info));
+    const std::string udn = OrEmpty(gupnp_device_info_get_udn(info));
+    const std::string deviceType = OrEmpty(gupnp_device_info_get_device_type(info));
+    if (location.empty() || udn.empty())
+        return;
+    std::vector<std::pair<std::string, std::string>> resources = {
+        {"upnp:rootdevice", udn + "::upnp:rootdevice"}, {udn, udn}};
+    if (!deviceType.empty())
+        resources.emplace_back(deviceType, udn + "::" + deviceType);
+    GList* services = gupnp_device_info_list_service_types(info);
+    for (GList* l = services; l != nullptr; l = l->next)
+        resources.emplace_back(static_cast<char*>(l->data),
+                               udn + "::" + static_cast<char*>(l->data));
+    g_list_free_full(services, g_free);
+
+    const io::FileDescriptor socketFd(socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+    if (!socketFd)
+        return;
+    sockaddr_in local{};
+    local.sin_family = AF_INET;
+    if (inet_pton(AF_INET, address.c_str(), &local.sin_addr) != 1 ||
+        bind(socketFd.Get(), reinterpret_cast<sockaddr*>(&local), sizeof(local)) != 0)
+        return;
+    setsockopt(socketFd.Get(), IPPROTO_IP, IP_MULTICAST_IF, &local.sin_addr,
+               sizeof(local.sin_addr));
+    setsockopt(socketFd.Get(), IPPROTO_IP, IP_MULTICAST_TTL, &kSsdpTtl, sizeof(kSsdpTtl));
+    sockaddr_in group{};
+    group.sin_family = AF_INET;
+    group.sin_port = htons(1900);
+    inet_pton(AF_INET, "239.255.255.250", &group.sin_addr);
+    GSSDPClient* client = GSSDP_CLIENT(context);
+    const unsigned maxAge =
+        gssdp_resource_group_get_max_age(gupnp_root_device_get_ssdp_resource_group(device));
+    const std::string head =
+        "NOTIFY * HTTP/1.1\r\nHost: 239.255.255.250:1900\r\n"
+        "Cache-Control: max-age=" +
+        std::to_string(maxAge) + "\r\nLocation: " + location +
+        "\r\nServer: " + OrEmpty(gssdp_client_get_server_id(client)) + "\r\nNTS: ssdp:alive\r\n";
+    for (int copy = 0; copy < kAliveCopies; ++copy) {
+        for (const auto& [target, usn] : resources) {
+            const std::string message = head + "NT: " + target + "\r\nUSN: " + usn + "\r\n\r\n";
+            sendto(socketFd.Get(), message.data(), message.size(), 0,
+                   reinterpret_cast<sockaddr*>(&group), sizeof(group));
+        }
+    }
+}
+
 }  // namespace
 
 // --- ServedContext -------------------------------------------------------------------------------
@@ -114,6 +192,7 @@ std::unique_ptr<ServedContext> ServedContext::Create(
     served->files_ =
         std::make_unique<MediaFileServer>(context, *served->directory_, options.sharePath);
     served->guard_ = std::make_unique<SubscriptionGuard>(context);
+    served->bodyLimit_ = std::make_unique<RequestBodyLimit>(context);
     gssdp_resource_group_set_message_delay(ResourceGroupOf(served->device_.get()),
                                            kSsdpMessageDelayMs);
     served->onAvailable_ = std::move(onAvailable);
@@ -138,17 +217,38 @@ void ServedContext::OnIntrospected(GObject* service, GAsyncResult* result, gpoin
     me->BecomeAvailable();
 }
 
+// GSSDP starts a resource group with a byebye for every resource before the first alive: a
+// control point that still lists this server (the same device back on an interface after a
+// reset, or on a new address of it) would drop it and find it again. Those first messages are
+// sent while the client is passive, so that they go nowhere (a delay of 0 lets GSSDP's queue
+// drain within a few loop turns; the idle source runs once it has), and this server's own alive
+// set follows. Searches are answered from then on.
 void ServedContext::BecomeAvailable() {
+    GSSDPResourceGroup* group = ResourceGroupOf(device_.get());
+    gupnp::MakePassive(context_.get());
+    gssdp_resource_group_set_message_delay(group, 0);
     gupnp_root_device_set_available(device_.get(), TRUE);
-    if (onAvailable_)
-        std::exchange(onAvailable_, nullptr)(*this);
+    settling_ = true;
+    settle_ = gupnp::Source::Idle([this, group] {
+        settling_ = false;
+        gssdp_resource_group_set_message_delay(group, kSsdpMessageDelayMs);
+        if (!down_) {
+            gupnp::MakeActive(context_.get());
+            AnnounceAgain();
+        }
+        if (onAvailable_)
+            std::exchange(onAvailable_, nullptr)(*this);
+        return false;
+    });
 }
 
 ServedContext::~ServedContext() {
     if (introspection_)
         g_cancellable_cancel(introspection_.get());
+    settle_.Remove();
     announcements_.clear();
     // The services and the file handler go before the device and the context they hang on.
+    bodyLimit_.reset();
     guard_.reset();
     files_.reset();
     contentDirectoryService_.reset();
@@ -157,11 +257,9 @@ ServedContext::~ServedContext() {
 }
 
 void ServedContext::AnnounceAgain() {
-    // GSSDP announces on becoming available; taking the resource group (not the root device,
-    // whose services would drop their subscribers) down and up again sends a fresh set.
-    GSSDPResourceGroup* group = ResourceGroupOf(device_.get());
-    gssdp_resource_group_set_available(group, FALSE);
-    gssdp_resource_group_set_available(group, TRUE);
+    if (down_ || settling_ || !gssdp_client_get_active(GSSDP_CLIENT(context_.get())))
+        return;
+    SendAliveSet(device_.get(), context_.get(), address_);
 }
 
 void ServedContext::ScheduleAnnouncements() {
@@ -179,11 +277,35 @@ void ServedContext::SayByeBye() {
     gupnp_root_device_set_available(device_.get(), FALSE);
 }
 
+void ServedContext::GoDown() {
+    down_ = true;
+    announcements_.clear();
+    gupnp::MakePassive(context_.get());
+}
+
+void ServedContext::ComeBack() {
+    down_ = false;
+    gupnp::MakeActive(context_.get());
+    multicastOk_ = true;
+    ScheduleAnnouncements();
+    AnnounceAgain();
+}
+
+void ServedContext::Withdraw() {
+    down_ = true;
+    announcements_.clear();
+    // Passive, so that the byebye GSSDP sends when the device goes reaches no one: the address
+    // is gone, the server is not.
+    gupnp::MakePassive(context_.get());
+}
+
 void ServedContext::NotifyIfLibraryChanged() {
     contentDirectoryService_->NotifyIfChanged();
 }
 
 void ServedContext::CheckMulticast() {
+    if (down_)
+        return;
     std::string why;
     const bool ok = MulticastCanLeave(interface_, address_, why);
     if (ok == multicastOk_)
@@ -218,11 +340,12 @@ MediaServer::~MediaServer() {
 
 void MediaServer::Start(std::function<void()> onLoopbackReady) {
     onLoopbackReady_ = std::move(onLoopbackReady);
-    if (!TryLoopback()) {
-        loopbackRetry_ =
-            gupnp::Source::Timeout(kLoopbackRetryMs, [this] { return !TryLoopback(); });
-    }
+    // The context manager makes the loopback context too, within its first turns of the loop; a
+    // context of our own is made only when it has not, so that nothing binds the port twice (GLib
+    // would warn of a port in use at every start).
     StartContextManager();
+    loopbackRetry_ =
+        gupnp::Source::Timeout(kLoopbackRetryMs, [this] { return !loopback_ && !TryLoopback(); });
     // The library as it is now, loaded before anything is served; later changes are loaded by a
     // thread (RefreshLibrary), so that SSDP and the other requests never wait for a load.
     directory_->SystemUpdateId();
@@ -233,6 +356,7 @@ void MediaServer::Start(std::function<void()> onLoopbackReady) {
     multicastWatch_ = gupnp::Source::Timeout(kMulticastWatchMs, [this] {
         for (auto& entry : lan_)
             entry.second->CheckMulticast();
+        DropStale("");
         return true;
     });
 }
@@ -289,6 +413,8 @@ void MediaServer::StartContextManager() {
     if (options_.interfaceName != nullptr) {
         GUPnPContextFilter* filter = gupnp_context_manager_get_context_filter(manager_.get());
         gupnp_context_filter_add_entry(filter, options_.interfaceName);
+        // Loopback serves this host's own programs whatever interface serves the LAN.
+        gupnp_context_filter_add_entry(filter, "lo");
         gupnp_context_filter_set_enabled(filter, TRUE);
     }
     managerSignals_.emplace_back(manager_.get(), "context-available",
@@ -302,14 +428,26 @@ void MediaServer::OnContextAvailable(GUPnPContextManager*, GUPnPContext* context
     const std::string address = OrEmpty(gssdp_client_get_host_ip(GSSDP_CLIENT(context)));
     const std::string interfaceName = OrEmpty(gssdp_client_get_interface(GSSDP_CLIENT(context)));
     if (address.rfind("127.", 0) == 0) {
-        // Loopback has a context of its own, made first; the manager's attempt on lo then fails
-        // to bind (GUPnP warns once). Should the manager have got there first, its context
-        // serves 127.0.0.1 instead.
+        // The manager's context on lo serves 127.0.0.1 (a context of our own is made only when
+        // none came from the manager in time).
         std::string error;
         if (!me->loopback_ && me->ServeLoopback(context, error))
             me->loopbackRetry_.Remove();
         return;
     }
+    auto known = me->lan_.find(context);
+    if (known != me->lan_.end()) {
+        // The same address on an interface that was down: GUPnP hands back the same context.
+        if (known->second->down()) {
+            syslog(LOG_INFO, "serving %s (%s:%u) again; announcing", interfaceName.c_str(),
+                   address.c_str(), me->options_.port);
+            known->second->ComeBack();
+        }
+        return;
+    }
+    // An earlier context on this address whose removal GUPnP did not report (the address went
+    // while the link was down) holds the port: it goes first.
+    me->DropStale(address);
     std::string error;
     auto served = ServedContext::Create(
         context, me->options_, me->directory_,
@@ -333,9 +471,34 @@ void MediaServer::OnContextUnavailable(GUPnPContextManager*, GUPnPContext* conte
     auto it = me->lan_.find(context);
     if (it == me->lan_.end())
         return;
-    syslog(LOG_INFO, "%s (%s) went away; no longer served there",
-           it->second->interfaceName().c_str(), it->second->address().c_str());
+    ServedContext& served = *it->second;
+    if (AddressIsConfigured(served.address())) {
+        // The link went down with its address kept: the device stays, silent, until it is up.
+        syslog(LOG_INFO, "%s (%s) is down; serving there again when it is back",
+               served.interfaceName().c_str(), served.address().c_str());
+        served.GoDown();
+        return;
+    }
+    syslog(LOG_INFO, "%s (%s) went away; no longer served there", served.interfaceName().c_str(),
+           served.address().c_str());
+    served.Withdraw();
     me->lan_.erase(it);
+}
+
+void MediaServer::DropStale(const std::string& address) {
+    for (auto it = lan_.begin(); it != lan_.end();) {
+        ServedContext& served = *it->second;
+        const bool stale = served.down() &&
+                           (served.address() == address || !AddressIsConfigured(served.address()));
+        if (stale) {
+            syslog(LOG_INFO, "%s (%s) went away while down; no longer served there",
+                   served.interfaceName().c_str(), served.address().c_str());
+            served.Withdraw();
+            it = lan_.erase(it);
+        } else {
+            ++it;
+        }
+    }
 }
 
 void MediaServer::ForEachContext(const std::function<void(ServedContext&)>& action) {

@@ -52,12 +52,23 @@ class ServedContext {
 
     const std::string& address() const { return address_; }
     const std::string& interfaceName() const { return interface_; }
+    GUPnPContext* context() const { return context_.get(); }
     // Sends the alive set again (after start and after network changes; not only at the
-    // periodic renewal GSSDP does on its own).
+    // periodic renewal GSSDP does on its own). Alive only: a byebye would make every control
+    // point drop the server and find it again.
     void AnnounceAgain();
     // Announces now and a few more times over the next half minute.
     void ScheduleAnnouncements();
+    // The only byebye this server sends: when it leaves the network.
     void SayByeBye();
+    // The interface went down (or lost its carrier, as GUPnP sees it): nothing is sent until it
+    // is back; the device, its subscribers and its HTTP server stay.
+    void GoDown();
+    bool down() const { return down_; }
+    // The same interface address is usable again: announced at once and a few times more.
+    void ComeBack();
+    // The address is gone: nothing more goes out (no byebye from a dead address).
+    void Withdraw();
     void NotifyIfLibraryChanged();
     // Whether SSDP multicast can leave this context's interface; logged when that changes.
     void CheckMulticast();
@@ -75,10 +86,15 @@ class ServedContext {
     std::unique_ptr<ConnectionManagerService> connectionManagerService_;
     std::unique_ptr<MediaFileServer> files_;
     std::unique_ptr<SubscriptionGuard> guard_;
+    std::unique_ptr<RequestBodyLimit> bodyLimit_;
     std::vector<gupnp::Source> announcements_;
     gupnp::ObjectRef<GCancellable> introspection_;
     std::function<void(ServedContext&)> onAvailable_;
+    // Runs once GSSDP's own first messages were dropped (see BecomeAvailable).
+    gupnp::Source settle_;
+    bool settling_ = false;
     bool multicastOk_ = true;
+    bool down_ = false;
 };
 
 class MediaServer {
@@ -88,8 +104,9 @@ class MediaServer {
     MediaServer(const MediaServer&) = delete;
     MediaServer& operator=(const MediaServer&) = delete;
 
-    // Starts serving on loopback (retried every 2 s while it fails) and on the LAN (as the
-    // context manager reports interfaces). `onLoopbackReady` runs once, when 127.0.0.1 serves.
+    // Starts serving on loopback (the context manager's context on lo; one of our own, retried
+    // every second, when none came) and on the LAN (as the context manager reports interfaces).
+    // `onLoopbackReady` runs once, when 127.0.0.1 serves.
     void Start(std::function<void()> onLoopbackReady);
     // Byebye on every context.
     void SayByeBye();
@@ -103,6 +120,8 @@ class MediaServer {
     static void OnContextUnavailable(GUPnPContextManager* manager, GUPnPContext* context,
                                      gpointer self);
     void ForEachContext(const std::function<void(ServedContext&)>& action);
+    // Ends (without a byebye) served contexts whose address left their interface.
+    void DropStale(const std::string& address);
     void RefreshLibrary();
 
     MediaServerOptions options_;

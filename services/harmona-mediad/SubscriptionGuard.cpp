@@ -4,6 +4,7 @@
 
 #include <cstdlib>
 #include <cstring>
+#include <string>
 
 namespace harmona::mediad {
 namespace {
@@ -70,10 +71,18 @@ std::size_t SubscriptionGuard::active() {
     return subscriptions_.size();
 }
 
+std::size_t SubscriptionGuard::activeOf(const std::string& peer) {
+    ForgetExpired();
+    std::size_t count = 0;
+    for (const auto& [sid, lease] : subscriptions_)
+        count += lease.peer == peer ? 1 : 0;
+    return count;
+}
+
 void SubscriptionGuard::ForgetExpired() {
     const auto now = std::chrono::steady_clock::now();
     for (auto it = subscriptions_.begin(); it != subscriptions_.end();) {
-        if (it->second <= now)
+        if (it->second.until <= now)
             it = subscriptions_.erase(it);
         else
             ++it;
@@ -106,6 +115,14 @@ void SubscriptionGuard::OnRequestRead(SoupServer*, SoupServerMessage* message, g
                me->where_.c_str(), peerText.c_str(), kMaxSubscriptions);
         soup_server_message_set_status(message, SOUP_STATUS_SERVICE_UNAVAILABLE,
                                        "Too many subscriptions");
+        return;
+    }
+    const bool loopback = peerText.rfind("127.", 0) == 0 || peerText == "::1";
+    if (!loopback && me->activeOf(peerText) >= kMaxSubscriptionsPerPeer) {
+        syslog(LOG_WARNING, "refused a subscription on %s from %s: it holds %zu already",
+               me->where_.c_str(), peerText.c_str(), kMaxSubscriptionsPerPeer);
+        soup_server_message_set_status(message, SOUP_STATUS_SERVICE_UNAVAILABLE,
+                                       "Too many subscriptions from this host");
     }
 }
 
@@ -120,15 +137,65 @@ void SubscriptionGuard::OnRequestFinished(SoupServer*, SoupServerMessage* messag
     if (subscribe) {
         SoupMessageHeaders* response = soup_server_message_get_response_headers(message);
         const char* sid = soup_message_headers_get_one(response, "SID");
+        const char* peer = soup_server_message_get_remote_host(message);
         if (sid != nullptr)
-            me->subscriptions_[sid] = std::chrono::steady_clock::now() +
-                                      LeaseOf(soup_message_headers_get_one(response, "Timeout"));
+            me->subscriptions_[sid] =
+                Lease{std::chrono::steady_clock::now() +
+                          LeaseOf(soup_message_headers_get_one(response, "Timeout")),
+                      peer != nullptr ? peer : ""};
     } else {
         const char* sid =
             soup_message_headers_get_one(soup_server_message_get_request_headers(message), "SID");
         if (sid != nullptr)
             me->subscriptions_.erase(sid);
     }
+}
+
+// --- RequestBodyLimit ----------------------------------------------------------------------------
+
+RequestBodyLimit::RequestBodyLimit(GUPnPContext* context) {
+    requestStarted_ = gupnp::SignalConnection(gupnp_context_get_server(context), "request-started",
+                                              G_CALLBACK(&OnRequestStarted), this);
+}
+
+void RequestBodyLimit::OnRequestStarted(SoupServer*, SoupServerMessage* message, gpointer) {
+    // No pointer to this object goes with the message: a request may outlive it.
+    g_signal_connect(message, "got-headers", G_CALLBACK(&OnGotHeaders), nullptr);
+}
+
+void RequestBodyLimit::OnGotHeaders(SoupServerMessage* message, gpointer) {
+    SoupMessageHeaders* headers = soup_server_message_get_request_headers(message);
+    const SoupEncoding encoding = soup_message_headers_get_encoding(headers);
+    const goffset length = encoding == SOUP_ENCODING_CONTENT_LENGTH
+                               ? soup_message_headers_get_content_length(headers)
+                               : 0;
+    const bool fetch = IsMethod(message, "GET") || IsMethod(message, "HEAD");
+    guint status = SOUP_STATUS_NONE;
+    if (encoding == SOUP_ENCODING_CHUNKED)
+        status = fetch ? SOUP_STATUS_BAD_REQUEST : SOUP_STATUS_LENGTH_REQUIRED;
+    else if (fetch && length > 0)
+        status = SOUP_STATUS_BAD_REQUEST;
+    else if (length > kMaxRequestBodyBytes)
+        status = SOUP_STATUS_REQUEST_ENTITY_TOO_LARGE;
+    if (status == SOUP_STATUS_NONE)
+        return;
+    const char* peer = soup_server_message_get_remote_host(message);
+    syslog(LOG_WARNING, "refused a %s request of %s from %s: body of %s bytes (%u)",
+           soup_server_message_get_method(message),
+           g_uri_get_path(soup_server_message_get_uri(message)), peer != nullptr ? peer : "?",
+           encoding == SOUP_ENCODING_CHUNKED ? "unstated" : std::to_string(length).c_str(), status);
+    // The answer is written here and the connection closed, so that not one byte of the body is
+    // read (libsoup would read it all before answering).
+    GIOStream* stream = soup_server_message_steal_connection(message);
+    if (stream == nullptr)
+        return;
+    const std::string answer = "HTTP/1.1 " + std::to_string(status) + " " +
+                               soup_status_get_phrase(status) +
+                               "\r\nContent-Length: 0\r\nConnection: close\r\n\r\n";
+    g_output_stream_write_all(g_io_stream_get_output_stream(stream), answer.data(), answer.size(),
+                              nullptr, nullptr, nullptr);
+    g_io_stream_close(stream, nullptr, nullptr);
+    g_object_unref(stream);
 }
 
 }  // namespace harmona::mediad

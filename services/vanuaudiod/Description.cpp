@@ -114,6 +114,10 @@ bool ParseDeviceDescription(const std::string& xml, const std::string& location,
     const std::string ip = HostOfUrl(location);
     if (ip.empty() || ip.size() > kMaxIpBytes)
         return false;
+    // The location was checked against the announcer; the control URL must be on that same host
+    // (any port), or a LAN device could have the CGI post to loopback or to a third host.
+    if (g_ascii_strcasecmp(HostOfUrl(controlUrl).c_str(), ip.c_str()) != 0)
+        return false;
     // Listed as JSON text: bytes that are not UTF-8, control bytes and DEL become spaces.
     out.friendlyName =
         util::CleanText(Text(device, "friendlyName"), util::kPrintableUtf8, kMaxFriendlyNameBytes);

@@ -12,7 +12,8 @@ namespace harmona::vanuaudiod {
 // embedded device whose deviceType is a MediaServer (preferring one whose UDN is `udn`); its
 // ContentDirectory service's controlURL is resolved against URLBase when present, else against
 // `location`. Fills friendlyName (cleaned and bounded), controlUrl and ip (the host of
-// `location`); false when the document does not parse or has no usable ContentDirectory.
+// `location`); false when the document does not parse, has no usable ContentDirectory, or puts
+// its control URL on another host than `location`'s.
 bool ParseDeviceDescription(const std::string& xml, const std::string& location,
                             const std::string& udn, MediaServer& out);
 

@@ -40,6 +40,9 @@ constexpr guint kSearchIntervalMs = 1000;
 // A search listens this long for answers through GSSDP's browser, whose cache is then dropped
 // (our own table holds what was found; the browser's would grow with every forged answer).
 constexpr guint kSearchWindowMs = 10000;
+// A multicast route often follows its interface's address by a moment (a DHCP client, a network
+// manager): it is reported missing only when it still is this much later.
+constexpr guint kRouteGraceMs = 3000;
 // Queued description fetches beyond this are refused (a flood must not grow memory); the device
 // is fetched again on a later announcement.
 constexpr std::size_t kMaxQueuedFetches = 64;
@@ -205,8 +208,8 @@ class Discovery::Worker {
         });
     }
 
-    // The route is the host's, not the address's: one line when it goes missing, one when it
-    // is back.
+    // The route is the host's, not the address's: one line when it goes missing (and stays so
+    // for kRouteGraceMs), one when it is back.
     void CheckMulticastRoute(Address& address) {
         GInetAddress* local = gssdp_client_get_address(GSSDP_CLIENT(address.context.get()));
         const std::string problem = MulticastRouteProblem(local);
@@ -214,14 +217,30 @@ class Discovery::Worker {
         g_object_unref(local);
         if (!ipv4)
             return;
-        if (!problem.empty() && !routeMissing_)
-            syslog(LOG_WARNING,
-                   "network: no multicast route (%s): searches are sent on %s (%s) only, bound "
-                   "to it; add a default route or 224.0.0.0/4 for SSDP",
-                   problem.c_str(), address.interfaceName.c_str(), address.address.c_str());
-        else if (problem.empty() && routeMissing_)
-            syslog(LOG_INFO, "network: multicast route present again");
-        routeMissing_ = !problem.empty();
+        if (problem.empty()) {
+            routeRecheck_.Remove();
+            if (routeMissing_)
+                syslog(LOG_INFO, "network: multicast route present again");
+            routeMissing_ = false;
+            return;
+        }
+        if (routeMissing_ || routeRecheck_.active())
+            return;
+        routeRecheck_ = Source::Timeout(
+            kRouteGraceMs, [this, interfaceName = address.interfaceName, text = address.address] {
+                GInetAddress* again = g_inet_address_new_from_string(text.c_str());
+                const std::string still = again != nullptr ? MulticastRouteProblem(again) : "";
+                if (again != nullptr)
+                    g_object_unref(again);
+                if (!still.empty() && !routeMissing_) {
+                    syslog(LOG_WARNING,
+                           "network: no multicast route (%s): searches are sent on %s (%s) only, "
+                           "bound to it; add a default route or 224.0.0.0/4 for SSDP",
+                           still.c_str(), interfaceName.c_str(), text.c_str());
+                    routeMissing_ = true;
+                }
+                return false;
+            });
     }
 
     static void MessageReceived(GSSDPClient* client, const char* fromIp, guint /*fromPort*/,
@@ -365,6 +384,7 @@ class Discovery::Worker {
     Source expiry_;
     Source research_;
     Source searchTimer_;
+    Source routeRecheck_;
     // Last: its handlers use everything above, and it goes first.
     harmona::gupnp::ContextManager contexts_;
 };

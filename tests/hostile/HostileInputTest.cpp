@@ -777,6 +777,32 @@ TEST_F(Hostile, CrossSiteRequestsAreRefusedBeforeAnyActionRuns) {
     EXPECT_TRUE(daemon.Requests().empty());
 }
 
+// Another port or subdomain of the same site is not this origin: its pages may not act either.
+TEST_F(Hostile, SameSiteRequestsAreRefusedBeforeAnyActionRuns) {
+    MakeGeneratedLibrary(150);
+    ScriptedDaemon daemon(
+        [](const DaemonRequest&) { return DaemonAnswer::Reply("{\"success\":true}"); });
+    const std::vector<std::map<std::string, std::string>> sameSite = {
+        {{"HTTP_SEC_FETCH_SITE", "same-site"}},
+        {{"HTTP_SEC_FETCH_SITE", "Same-Site"}, {"HTTP_HOST", "nas.local:8080"}},
+        {{"HTTP_SEC_FETCH_SITE", "same-site"},
+         {"HTTP_ORIGIN", "http://nas.local:8080"},
+         {"HTTP_HOST", "nas.local:8080"}},
+        {{"HTTP_SEC_FETCH_SITE", "something-new"}, {"HTTP_HOST", "nas.local"}},
+    };
+    for (const auto& headers : sameSite) {
+        std::string described;
+        for (const auto& [name, value] : headers)
+            described += name + "=" + value + " ";
+        for (const char* query : {"action=rerandom100", "action=refresh&target=mediaserver"}) {
+            const CgiResult r = Run(BrowserRequest(query, headers));
+            EXPECT_EQ(r.output, kUnauthorized) << described << query;
+        }
+    }
+    EXPECT_FALSE(Exists(kRandomFile));
+    EXPECT_TRUE(daemon.Requests().empty());
+}
+
 TEST_F(Hostile, SameOriginAndHeaderlessRequestsStillAct) {
     MakeGeneratedLibrary(150);
     ScriptedDaemon daemon(

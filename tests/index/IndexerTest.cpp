@@ -4,8 +4,13 @@
 #include <sys/stat.h>
 #include <utime.h>
 
+#include <unistd.h>
+
+#include <atomic>
+#include <chrono>
 #include <map>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "tests/harness/Fixtures.h"
@@ -200,6 +205,97 @@ TEST(Indexer, OnlySupportedRegularFilesAreIndexedAndLinksAreNotFollowed) {
     for (const auto& [path, row] : TrackRows())
         EXPECT_EQ(path.compare(0, std::string(kShare).size() + 1, std::string(kShare) + "/"), 0)
             << path;
+}
+
+// A share writer swaps files of the share for links to a file only root may read, and back, over
+// and over while the indexer (root) runs: the linked file's tags never reach the library.
+TEST(Indexer, FilesSwappedForLinksDuringAPassNeverBringTheLinkedFilesTags) {
+    constexpr int kFiles = 40;
+    MakeDirs(SharePath("swap"));
+    MakeDirs("/volume1/private");
+    MakeAudioFile("/volume1/private/secret.mp3", {"SECRET TITLE", "Root", "", "", "", 0, 0, 0});
+    chmod("/volume1/private/secret.mp3", 0600);
+    std::vector<std::string> paths;
+    for (int i = 0; i < kFiles; ++i) {
+        const std::string path = SharePath("swap/" + std::to_string(i) + ".mp3");
+        MakeAudioFile(path, {"Share " + std::to_string(i), "Writer", "", "", "", 0, 0, 0});
+        // A hidden hard link keeps the real file for the swaps back (the walk skips it).
+        ASSERT_EQ(link(path.c_str(), (path + ".keep").insert(path.rfind('/') + 1, ".").c_str()), 0);
+        paths.push_back(path);
+    }
+    std::atomic<bool> stop{false};
+    std::atomic<long> swaps{0};
+    std::thread swapper([&] {
+        while (!stop) {
+            for (const std::string& path : paths) {
+                const std::string folder = path.substr(0, path.rfind('/') + 1);
+                const std::string name = path.substr(path.rfind('/') + 1);
+                const std::string tmpLink = folder + ".l" + name;
+                const std::string tmpReal = folder + ".r" + name;
+                unlink(tmpLink.c_str());
+                unlink(tmpReal.c_str());
+                if (symlink("/volume1/private/secret.mp3", tmpLink.c_str()) == 0)
+                    rename(tmpLink.c_str(), path.c_str());
+                if (link((folder + "." + name + ".keep").c_str(), tmpReal.c_str()) == 0)
+                    rename(tmpReal.c_str(), path.c_str());
+                ++swaps;
+            }
+        }
+    });
+    // Passes over a fresh library (every file read) for at most 20 s.
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(20);
+    int passes = 0;
+    long shareTitles = 0;
+    std::vector<std::string> leaked;
+    while (passes < 30 && std::chrono::steady_clock::now() < deadline) {
+        for (const char* suffix : {"", "-wal", "-shm"})
+            unlink((std::string(kLibraryDb) + suffix).c_str());
+        const IndexRun run = RunIndexer();
+        ++passes;
+        TakeLogLines();  // the log socket holds only so many lines
+        ASSERT_EQ(run.exitStatus, 0) << run.output;
+        for (const auto& [path, row] : TrackRows()) {
+            const std::string& title = row.columns.at("title");
+            if (title == "SECRET TITLE" || row.columns.at("artist") == "Root")
+                leaked.push_back(path);
+            shareTitles += title.rfind("Share ", 0) == 0 ? 1 : 0;
+        }
+    }
+    stop = true;
+    swapper.join();
+    EXPECT_GT(swaps.load(), kFiles);
+    EXPECT_GT(shareTitles, 0) << "no file was ever indexed with its own tags";
+    EXPECT_TRUE(leaked.empty()) << leaked.size() << " row(s) carry the linked file's tags in "
+                                << passes << " passes, first " << leaked.front();
+}
+
+TEST(Indexer, RenamedFilesAndFoldersKeepTheirTrackIds) {
+    MakeStandardShare();
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    const auto before = TrackRows();
+    ASSERT_EQ(before.size(), 5u);
+    ASSERT_EQ(rename(SharePath("loose.ogg").c_str(), SharePath("Loose One.ogg").c_str()), 0);
+    ASSERT_EQ(rename(SharePath("Jazz/Blue").c_str(), SharePath("Jazz/Blue Note").c_str()), 0);
+    const IndexRun run = RunIndexer();
+    ASSERT_EQ(run.exitStatus, 0) << run.output;
+    EXPECT_EQ(run.counts.at("added"), 0) << run.output;
+    EXPECT_EQ(run.counts.at("removed"), 0) << run.output;
+    EXPECT_EQ(run.counts.at("moved"), 3) << run.output;
+    EXPECT_EQ(run.counts.at("tagreads"), 0) << run.output;
+    const auto after = TrackRows();
+    ASSERT_EQ(after.size(), 5u);
+    const std::pair<const char*, const char*> moves[] = {
+        {"loose.ogg", "Loose One.ogg"},
+        {"Jazz/Blue/Late/03 Third.mp3", "Jazz/Blue Note/Late/03 Third.mp3"},
+        {"Jazz/Blue/04 Fourth.wav", "Jazz/Blue Note/04 Fourth.wav"},
+        {"Rock/Alpha & Omega/01 First.flac", "Rock/Alpha & Omega/01 First.flac"}};
+    for (const auto& [from, to] : moves) {
+        SCOPED_TRACE(to);
+        ASSERT_TRUE(after.count(SharePath(to)));
+        EXPECT_EQ(after.at(SharePath(to)).id, before.at(SharePath(from)).id);
+        EXPECT_EQ(after.at(SharePath(to)).columns.at("title"),
+                  before.at(SharePath(from)).columns.at("title"));
+    }
 }
 
 TEST(Indexer, TheShareOfAudioConfIsScanned) {

@@ -12,6 +12,7 @@
 
 #include <cstring>
 #include <future>
+#include <iostream>
 
 #include "platform/dma/DMABrowse.h"
 #include "platform/dma/DMAParser.h"
@@ -754,6 +755,33 @@ TEST_F(AudioDaemon, StartedBeforeItsInterfaceHasAnAddressItAnswersAtOnceAndFinds
     EXPECT_EQ(reply["list"][0]["friendly_name"], "Late");
 }
 
+// An interface that goes down and comes back (ifdown/ifup, a Wi-Fi reconnect): GUPnP hands the
+// same context back; the daemon searches on it again and the scan button finds servers.
+TEST_F(AudioDaemon, AfterItsLinkGoesDownAndUpTheScanButtonStillFindsServers) {
+    FakeMediaServers fake;
+    fake.Add("uuid:back", FakeMediaServers::DescriptionXml("uuid:back", "Back", "/cd"));
+    daemon_ = StartDaemon();
+    ASSERT_TRUE(RunCommand("ip link set va down"));
+    std::this_thread::sleep_for(std::chrono::seconds(1));
+    ASSERT_TRUE(RunCommand("ip link set va up && ip route replace 224.0.0.0/4 dev va"));
+    const auto up = std::chrono::steady_clock::now();
+    std::this_thread::sleep_for(std::chrono::seconds(2));  // past the search on its return
+    fake.AnswerSearches("uuid:back", 60);
+    const int before = fake.SearchesSeen();
+    EXPECT_EQ(Call(14).reply, "{\"success\": true}");
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply))
+        << "searches seen since the link came back: " << fake.SearchesSeen() - before << "\n"
+        << ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(reply["list"][0]["friendly_name"], "Back");
+    std::cout << "[ recovery ] vanuaudiod, link down for 1 s then up: listed "
+              << std::chrono::duration_cast<std::chrono::milliseconds>(
+                     std::chrono::steady_clock::now() - up)
+                     .count()
+              << " ms after the link came back (2 s of it waiting before the scan)\n";
+}
+
 // The host lacks a route for multicast: one line says so, and the searches, bound to the
 // interface, still find the servers.
 TEST_F(AudioDaemon, WithoutAMulticastRouteOneLogLineSaysSoAndSearchesStillFindServers) {
@@ -779,6 +807,22 @@ TEST_F(AudioDaemon, WithoutAMulticastRouteOneLogLineSaysSoAndSearchesStillFindSe
                        "on va (10.77.0.1) only"),
               std::string::npos)
         << log;
+}
+
+// The route comes a moment after the address (as a DHCP client or a network manager sets them):
+// no warning about a missing route.
+TEST_F(AudioDaemon, AMulticastRouteThatFollowsItsAddressIsNotReportedMissing) {
+    ASSERT_TRUE(RunCommand("ip route del 224.0.0.0/4 dev va && ip addr flush dev va"));
+    daemon_ = StartDaemon(kHostInterface, false);
+    ASSERT_TRUE(RunCommand("ip addr add 10.77.0.1/24 dev va"));
+    ASSERT_TRUE(WaitForLog("searching for media servers on va (10.77.0.1)", 5000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    std::this_thread::sleep_for(std::chrono::milliseconds(500));
+    ASSERT_TRUE(RunCommand("ip route replace 224.0.0.0/4 dev va"));
+    std::this_thread::sleep_for(std::chrono::milliseconds(4000));
+    DrainSyslog();
+    const std::string log = ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(log.find("no multicast route"), std::string::npos) << log;
 }
 
 // The media servers users have beside ours, found through the real CGI and gone when they stop.

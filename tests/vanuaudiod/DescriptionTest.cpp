@@ -98,17 +98,33 @@ TEST(ServerDescription, PathRelativeControlUrlUsesTheLocationsFolder) {
 
 TEST(ServerDescription, UrlBaseWinsOverTheLocation) {
     MediaServer server;
-    ASSERT_TRUE(ParseDeviceDescription(Description("http://10.9.9.9:5000/", "ContentDirectory/ctl"),
+    ASSERT_TRUE(ParseDeviceDescription(Description("http://10.1.2.3:5000/", "ContentDirectory/ctl"),
                                        "http://10.1.2.3:49152/desc.xml", "uuid:abc", server));
-    EXPECT_EQ(server.controlUrl, "http://10.9.9.9:5000/ContentDirectory/ctl");
+    EXPECT_EQ(server.controlUrl, "http://10.1.2.3:5000/ContentDirectory/ctl");
     EXPECT_EQ(server.ip, "10.1.2.3");  // the ip is the location's host
 }
 
 TEST(ServerDescription, AbsoluteControlUrlIsKept) {
     MediaServer server;
-    ASSERT_TRUE(ParseDeviceDescription(Description("", "http://10.5.5.5:80/x"),
+    ASSERT_TRUE(ParseDeviceDescription(Description("", "http://10.1.2.3:80/x"),
                                        "http://10.1.2.3:1/d.xml", "uuid:abc", server));
-    EXPECT_EQ(server.controlUrl, "http://10.5.5.5:80/x");
+    EXPECT_EQ(server.controlUrl, "http://10.1.2.3:80/x");
+}
+
+TEST(ServerDescription, ControlUrlOnAnotherHostThanTheDescriptionIsRefused) {
+    MediaServer server;
+    for (const char* urlBase : {"http://127.0.0.1:8080/", "http://10.9.9.9:5000/",
+                                "http://localhost:631/", "http://[::1]:80/"}) {
+        SCOPED_TRACE(urlBase);
+        EXPECT_FALSE(ParseDeviceDescription(Description(urlBase, "admin/ctl"),
+                                            "http://10.1.2.3:49152/desc.xml", "uuid:abc", server));
+    }
+    for (const char* control : {"http://127.0.0.1:50003/ContentDirectory/control",
+                                "http://10.5.5.5:80/x", "http://169.254.1.1/x"}) {
+        SCOPED_TRACE(control);
+        EXPECT_FALSE(ParseDeviceDescription(Description("", control), "http://10.1.2.3:1/d.xml",
+                                            "uuid:abc", server));
+    }
 }
 
 TEST(ServerDescription, EmbeddedMediaServerIsFound) {

@@ -4,6 +4,16 @@
 
 namespace harmona::gupnp {
 
+void MakeActive(GUPnPContext* context) {
+    if (!gssdp_client_get_active(GSSDP_CLIENT(context)))
+        g_object_set(context, "active", TRUE, nullptr);
+}
+
+void MakePassive(GUPnPContext* context) {
+    if (gssdp_client_get_active(GSSDP_CLIENT(context)))
+        g_object_set(context, "active", FALSE, nullptr);
+}
+
 ContextManager::ContextManager(const char* interfaceName, Handler available, Handler unavailable)
     : available_(std::move(available)), unavailable_(std::move(unavailable)) {
     manager_ = ObjectRef<GUPnPContextManager>::Adopt(
@@ -22,6 +32,10 @@ ContextManager::ContextManager(const char* interfaceName, Handler available, Han
 }
 
 void ContextManager::Available(GUPnPContextManager*, GUPnPContext* context, gpointer data) {
+    // GUPnP makes a context passive (it sends nothing, not even searches) when its interface goes
+    // down, and hands the same context back when the interface is up again without making it
+    // active: without this the interface stays silent for good after a link down and up.
+    MakeActive(context);
     static_cast<ContextManager*>(data)->available_(context);
 }
 

@@ -12,6 +12,11 @@
 
 namespace harmona::gupnp {
 
+// A passive context sends nothing (no announcement, no search, no answer to a search) and still
+// serves HTTP. GUPnP makes a context passive when its interface goes down.
+void MakeActive(GUPnPContext* context);
+void MakePassive(GUPnPContext* context);
+
 class ContextManager {
   public:
     using Handler = std::function<void(GUPnPContext*)>;

@@ -26,6 +26,10 @@ Source Source::Timeout(unsigned milliseconds, Callback callback) {
     return Attach(g_timeout_source_new(milliseconds), std::move(callback));
 }
 
+Source Source::Idle(Callback callback) {
+    return Attach(g_idle_source_new(), std::move(callback));
+}
+
 Source Source::UnixSignal(int signalNumber, Callback callback) {
     return Attach(g_unix_signal_source_new(signalNumber), std::move(callback));
 }

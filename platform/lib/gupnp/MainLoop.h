@@ -52,6 +52,8 @@ class Source {
 
     // Calls `callback` every `milliseconds` while it returns true.
     static Source Timeout(unsigned milliseconds, Callback callback);
+    // Calls `callback` whenever the loop has nothing of default priority (or higher) to do.
+    static Source Idle(Callback callback);
     // Calls `callback` in the loop when `signalNumber` (SIGTERM, SIGINT, SIGHUP, ...) arrives.
     static Source UnixSignal(int signalNumber, Callback callback);
 
