@@ -1,6 +1,10 @@
 #include "platform/dma/SoapBrowse.h"
 
+#include <arpa/inet.h>
+#include <netinet/in.h>
+
 #include <array>
+#include <cstdint>
 #include <cstdlib>
 #include <cstring>
 #include <pugixml.hpp>
@@ -24,6 +28,53 @@ bool IsAbsoluteHttpUrl(const std::string& url) {
         if (static_cast<unsigned char>(c) <= 0x20 || c == 0x7f)
             return false;
     return true;
+}
+
+namespace {
+
+// The host of an absolute http URL, without the brackets of an IPv6 literal; "" when malformed.
+std::string HostOf(const std::string& url) {
+    const std::size_t start = url.find("://") + 3;
+    const std::size_t end = url.find_first_of("/?#", start);
+    const std::string authority = url.substr(start, end == std::string::npos ? end : end - start);
+    if (!authority.empty() && authority[0] == '[') {
+        const std::size_t close = authority.find(']');
+        return close == std::string::npos ? std::string() : authority.substr(1, close - 1);
+    }
+    return authority.substr(0, authority.find(':'));
+}
+
+bool IsNetworkIpv4(const in_addr& address) {
+    const uint32_t host = ntohl(address.s_addr);
+    const bool loopback = (host >> 24) == 127;
+    const bool linkLocal = (host >> 16) == 0xa9fe;  // 169.254.0.0/16
+    return host != 0 && !loopback && !linkLocal;
+}
+
+bool IsNetworkIpv6(const in6_addr& address) {
+    if (IN6_IS_ADDR_V4MAPPED(&address)) {
+        in_addr v4{};
+        std::memcpy(&v4, address.s6_addr + 12, sizeof(v4));
+        return IsNetworkIpv4(v4);
+    }
+    return !IN6_IS_ADDR_UNSPECIFIED(&address) && !IN6_IS_ADDR_LOOPBACK(&address) &&
+           !IN6_IS_ADDR_LINKLOCAL(&address);
+}
+
+}  // namespace
+
+bool IsNetworkHostUrl(const std::string& url) {
+    if (!IsAbsoluteHttpUrl(url))
+        return false;
+    const std::string host = HostOf(url);
+    in_addr v4{};
+    in6_addr v6{};
+    // inet_pton takes only the dotted quad for IPv4: no "127.1", octal or hexadecimal forms.
+    if (inet_pton(AF_INET, host.c_str(), &v4) == 1)
+        return IsNetworkIpv4(v4);
+    if (inet_pton(AF_INET6, host.c_str(), &v6) == 1)
+        return IsNetworkIpv6(v6);
+    return false;
 }
 
 std::string BuildBrowseEnvelope(const std::string& objectId, const char* browseFlag,

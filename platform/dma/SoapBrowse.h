@@ -49,6 +49,13 @@ std::size_t EstimatedDidlTreeBytes(const char* didl, std::size_t size);
 // True for "http://host[:port][/path]" with a non-empty host (scheme case-insensitive).
 bool IsAbsoluteHttpUrl(const std::string& url);
 
+// True for an absolute http URL (as above) whose host is a numeric IPv4 or IPv6 address of another
+// machine: not a name (which a lookup could point anywhere), not loopback (127.0.0.0/8, ::1), not
+// link-local (169.254.0.0/16, fe80::/10) and not unspecified (0.0.0.0, ::). Media servers on the
+// network are browsed only at such a URL, so that a device's description cannot steer a request
+// to a service on this machine.
+bool IsNetworkHostUrl(const std::string& url);
+
 // The SOAP 1.1 body of a Browse action; every argument escaped.
 std::string BuildBrowseEnvelope(const std::string& objectId, const char* browseFlag,
                                 const std::string& filter, unsigned long startingIndex,

@@ -8,6 +8,7 @@
 #include "platform/cgi/ApplicationRequest.h"
 #include "platform/dma/DMABrowse.h"
 #include "platform/dma/DMAParser.h"
+#include "platform/dma/SoapBrowse.h"
 #include "platform/medialib/MediaFiles.h"
 #include "platform/medialib/StreamName.h"
 #include "platform/paths/PlatformPaths.h"
@@ -185,7 +186,8 @@ int LibraryApi::ListMediaServer(const std::string& node, const std::string& obje
     daemonclient::ReadMediaServerList([&](const daemonclient::ListedMediaServer& server) {
         listed = listed || server.controlUrl == controlUrl;
     });
-    if (!listed)
+    // Nor one whose control URL names this machine or a link-local host, whoever listed it.
+    if (!listed || !dma::IsNetworkHostUrl(controlUrl))
         return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
     DMAParser parser;
     if (BrowseChildren(controlUrl, objectId, parser) == 0)

@@ -13,6 +13,7 @@
 #include <chrono>
 #include <cstring>
 #include <pugixml.hpp>
+#include <utility>
 
 #include "common/util/XmlEscape.h"
 
@@ -206,7 +207,8 @@ ScriptedReply ContentTree::Answer(const RecordedRequest& request, unsigned long 
     return Reply(BrowseResponseBody(DidlLite(page), count, all.size()));
 }
 
-ScriptedHttpServer::ScriptedHttpServer(std::uint16_t port) : port_(port) {}
+ScriptedHttpServer::ScriptedHttpServer(std::uint16_t port, std::string address)
+    : port_(port), address_(std::move(address)) {}
 
 ScriptedHttpServer::~ScriptedHttpServer() {
     Stop();
@@ -221,8 +223,8 @@ bool ScriptedHttpServer::Start() {
     sockaddr_in address{};
     address.sin_family = AF_INET;
     address.sin_port = htons(port_);
-    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    if (bind(listener_, reinterpret_cast<sockaddr*>(&address), sizeof(address)) != 0 ||
+    if (inet_pton(AF_INET, address_.c_str(), &address.sin_addr) != 1 ||
+        bind(listener_, reinterpret_cast<sockaddr*>(&address), sizeof(address)) != 0 ||
         listen(listener_, 64) != 0 || pipe2(stopPipe_, O_CLOEXEC) != 0) {
         close(listener_);
         listener_ = -1;

@@ -121,7 +121,8 @@ class ContentTree {
 
 class ScriptedHttpServer {
   public:
-    explicit ScriptedHttpServer(std::uint16_t port = 50003);
+    // Listens on `address` (an IPv4 address of this namespace), port `port`.
+    explicit ScriptedHttpServer(std::uint16_t port = 50003, std::string address = "127.0.0.1");
     ~ScriptedHttpServer();
     ScriptedHttpServer(const ScriptedHttpServer&) = delete;
     ScriptedHttpServer& operator=(const ScriptedHttpServer&) = delete;
@@ -149,6 +150,7 @@ class ScriptedHttpServer {
     ScriptedReply NextReply(const RecordedRequest& request);
 
     std::uint16_t port_;
+    std::string address_;
     int listener_ = -1;
     int stopPipe_[2] = {-1, -1};
     std::thread thread_;

@@ -107,6 +107,21 @@ TEST(DmaBrowseLibrary, PrepareRefusesEmptyObjectIdAndNonHttpUrls) {
     EXPECT_EQ(Unescaped("BrowseFlag", requests[1].body), "BrowseMetadata");
 }
 
+TEST(DmaBrowseLibrary, OnlyNumericAddressesOfOtherMachinesAreNetworkHosts) {
+    for (const char* url :
+         {"http://192.168.1.20:8200/ctl", "http://10.0.0.1/ctl", "HTTP://172.16.5.4:49152",
+          "http://[2001:db8::7]:8200/ctl", "http://[fd00::1]/c", "http://198.51.100.2:50004/ctl?x"})
+        EXPECT_TRUE(IsNetworkHostUrl(url)) << url;
+    for (const char* url :
+         {"http://127.0.0.1:50003/ctl", "http://127.8.9.10/ctl", "http://0.0.0.0:80/",
+          "http://169.254.1.1/ctl", "http://[::1]/ctl", "http://[::]/ctl", "http://[fe80::1]/ctl",
+          "http://[::ffff:127.0.0.1]/ctl", "http://[::ffff:169.254.0.9]/ctl", "http://localhost/c",
+          "http://mediaserver.lan/ctl", "http://127.1/ctl", "http://2130706433/ctl",
+          "http://0x7f.0.0.1/ctl", "http://[::1/ctl", "https://192.168.1.20/ctl",
+          "http://user@192.168.1.20/ctl", "http://:80/ctl", ""})
+        EXPECT_FALSE(IsNetworkHostUrl(url)) << url;
+}
+
 TEST(DmaBrowseLibrary, DefaultsOfTheBrowseObject) {
     DMABrowse browse(BrowseDirectChildren, kControlUrl);
     EXPECT_EQ(browse.filter, "*");

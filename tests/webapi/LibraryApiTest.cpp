@@ -10,6 +10,7 @@
 
 #include "tests/harness/CgiRunner.h"
 #include "tests/harness/Fixtures.h"
+#include "tests/harness/Network.h"
 #include "tests/harness/PlaylistFixtures.h"
 #include "tests/harness/ScriptedDaemon.h"
 #include "tests/harness/ScriptedHttpServer.h"
@@ -219,19 +220,25 @@ TEST_F(LibraryApi, RandomNodeIsEmptyBeforeTheFirstDraw) {
     EXPECT_EQ(r.json["tracks"].size(), 0u);
 }
 
-// A media server on the network, as the audio daemon lists it, answering at 127.0.0.1:50004.
-constexpr const char* kNetworkServerUrl = "http://127.0.0.1:50004/ctl";
-std::vector<MediaServer> NetworkServers() {
+// A media server on the network, as the audio daemon lists it, answering at 198.51.100.2:50004 on
+// a link of the test's own namespace.
+constexpr const char* kNetworkServerAddress = "198.51.100.2";
+constexpr const char* kNetworkServerUrl = "http://198.51.100.2:50004/ctl";
+std::vector<MediaServer> ServersAt(const std::string& controlUrl, const std::string& ip) {
     MediaServer server;
-    server.controlUrl = kNetworkServerUrl;
+    server.controlUrl = controlUrl;
     server.friendlyName = "Shelf";
-    server.ip = "127.0.0.1";
+    server.ip = ip;
     return {server};
+}
+std::vector<MediaServer> NetworkServers() {
+    return ServersAt(kNetworkServerUrl, kNetworkServerAddress);
 }
 
 TEST_F(LibraryApi, AListedMediaServerShowsItsTopContainersBrowsedOnThatServer) {
     ScriptedDaemon daemon(ServeMediaServers(NetworkServers()));
-    ScriptedHttpServer network(50004);
+    ASSERT_TRUE(VethPair("lan0", "198.51.100.1", "lan1", kNetworkServerAddress));
+    ScriptedHttpServer network(50004, kNetworkServerAddress);
     ContentTree tree;
     tree.AddContainer("0", "64", "Music");
     tree.AddContainer("0", "1", "Video");
@@ -270,6 +277,29 @@ TEST_F(LibraryApi, AMediaServerThatTheDaemonDoesNotListIsNeverContacted) {
         EXPECT_NE(r.Header("Status").find("404"), std::string::npos) << node << r.output;
     }
     EXPECT_TRUE(elsewhere.Requests().empty());
+}
+
+TEST_F(LibraryApi, AListedMediaServerOnThisMachineIsNeverContacted) {
+    // A description may name a loopback control URL; whoever listed it, the CGI does not post
+    // there.
+    const std::string loopbackUrl = "http://127.0.0.1:50004/ctl";
+    ScriptedDaemon daemon(ServeMediaServers(ServersAt(loopbackUrl, "127.0.0.1")));
+    ScriptedHttpServer local(50004);
+    ASSERT_TRUE(local.Start());
+    const CgiResult r = ListNode("mediaserver_" + loopbackUrl);
+    EXPECT_NE(r.Header("Status").find("404"), std::string::npos) << r.output;
+    EXPECT_TRUE(local.Requests().empty());
+}
+
+TEST_F(LibraryApi, ListedMediaServersOnLinkLocalUnspecifiedOrNamedHostsGive404) {
+    for (const char* url :
+         {"http://169.254.10.20:50004/ctl", "http://0.0.0.0:50004/ctl", "http://[::1]:50004/ctl",
+          "http://[fe80::1]:50004/ctl", "http://[::]:50004/ctl", "http://localhost:50004/ctl",
+          "http://127.1:50004/ctl", "http://[::ffff:127.0.0.1]:50004/ctl"}) {
+        ScriptedDaemon daemon(ServeMediaServers(ServersAt(url, "127.0.0.1")));
+        const CgiResult r = ListNode(std::string("mediaserver_") + url);
+        EXPECT_NE(r.Header("Status").find("404"), std::string::npos) << url << r.output;
+    }
 }
 
 TEST_F(LibraryApi, MediaServersNeedTheMediaServerPermission) {
