@@ -210,12 +210,22 @@ BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
                                  ? total
                                  : std::min<std::size_t>(total, first + args.requestedCount);
     BrowseResult result;
-    result.didl.reserve(kDidlBegin.size() + (last - first) * 640);
+    result.didl.reserve(
+        std::min(kMaxResultBytes, kDidlBegin.size() + kDidlEnd.size() + (last - first) * 640));
     result.didl = kDidlBegin;
     const std::vector<ViewChild>& children = sorted != nullptr ? *sorted : container.children;
     std::size_t end = first;
-    while (end < last && (end == first || result.didl.size() < kMaxResultBytes))
-        AppendChild(result.didl, view, index, children[end++], pieces);
+    while (end < last && end - first < kMaxResultObjects) {
+        const std::size_t before = result.didl.size();
+        AppendChild(result.didl, view, index, children[end], pieces);
+        // An object that would take the reply past its byte budget is left for the next page,
+        // unless it is the first.
+        if (end > first && result.didl.size() + kDidlEnd.size() > kMaxResultBytes) {
+            result.didl.resize(before);
+            break;
+        }
+        ++end;
+    }
     result.didl += kDidlEnd;
     result.numberReturned = ClampCount(end - first);
     result.totalMatches = ClampCount(total);
