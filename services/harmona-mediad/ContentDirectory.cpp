@@ -81,7 +81,8 @@ struct SortValues {
 SortValues ValuesOf(const LibraryView& view, const ViewChild& child) {
     if (child.track) {
         const ViewTrack& track = view.tracks()[child.index];
-        return {track.title, track.artist, track.album, track.trackNo, track.year};
+        return {view.Text(track.title), view.Text(track.artist), view.Text(track.album),
+                track.trackNo, track.year};
     }
     const ViewContainer& container = view.containers()[child.index];
     return {container.title, container.artist,
@@ -137,8 +138,10 @@ void AppendTrackIn(std::string& out, const LibraryView& view, uint32_t container
                    const ViewTrack& track, const DidlPieces& pieces) {
     const std::string& containerId = view.containers()[container].id;
     const bool own = container == view.allMusic();
-    AppendItem(out, TrackIdIn(containerId, track.id), containerId,
-               own ? std::string() : TrackId(track.id), track.body, pieces);
+    AppendItemStart(out, TrackIdIn(containerId, track.id), containerId,
+                    own ? std::string() : TrackId(track.id));
+    view.AppendTrackBody(out, track, pieces.mediaBase);
+    out += kItemEnd;
 }
 
 void AppendChild(std::string& out, const LibraryView& view, uint32_t container,
@@ -374,8 +377,7 @@ BrowseResult ContentDirectory::Browse(const BrowseArgs& args) const {
     const std::shared_ptr<const LibraryView> view = CurrentView();
     if (!view)
         return Error(kErrorActionFailed, "The library database cannot be read");
-    const DidlPieces pieces{args.mediaBaseUrl.empty() ? mediaBaseUrl_ : args.mediaBaseUrl,
-                            &view->protocolInfos()};
+    const DidlPieces pieces{args.mediaBaseUrl.empty() ? mediaBaseUrl_ : args.mediaBaseUrl, nullptr};
     std::shared_ptr<const std::vector<ViewChild>> sorted;
     const uint32_t container = view->ContainerIndex(args.objectId);
     if (!args.metadata && !sort.empty() && container != kNoIndex)

@@ -150,8 +150,66 @@ void AppendExpanded(std::string& out, std::string_view piece, const DidlPieces& 
     out.append(piece.data() + copied, piece.size() - copied);
 }
 
-void AppendItem(std::string& out, std::string_view id, std::string_view parentId,
-                std::string_view refId, std::string_view body, const DidlPieces& pieces) {
+void AppendTrackItemBody(std::string& out, const TrackFields& track, std::string_view mediaBase) {
+    out += "<dc:title>";
+    AppendXmlText(out, track.title);
+    out += "</dc:title>";
+    out += kTrackClassElement;
+    AppendElement(out, "dc:creator", track.artist);
+    AppendElement(out, "upnp:artist", track.artist);
+    AppendElement(out, "upnp:album", track.album);
+    AppendElement(out, "upnp:genre", track.genre);
+    if (track.year > 0 && track.year <= 9999)
+        AppendElement(out, "dc:date", DateOfYear(track.year));
+    char number[32];
+    if (!track.artExtension.empty()) {
+        out += "<upnp:albumArtURI>";
+        out += mediaBase;
+        out += "art/";
+        out.append(number, static_cast<std::size_t>(std::snprintf(
+                               number, sizeof number, "%lld", static_cast<long long>(track.id))));
+        out += '.';
+        out += track.artExtension;
+        out += "</upnp:albumArtURI>";
+    }
+    AppendNumberElement(out, "upnp:originalTrackNumber", track.trackNo);
+    if (track.id < 0)
+        return;  // no stream name: no res
+    out += "<res protocolInfo=\"";
+    out += track.protocolInfo;
+    out += '"';
+    if (track.size >= 0) {
+        out += " size=\"";
+        out.append(number, static_cast<std::size_t>(std::snprintf(
+                               number, sizeof number, "%lld", static_cast<long long>(track.size))));
+        out += '"';
+    }
+    if (track.durationMs > 0) {
+        out += " duration=\"";
+        out += FormatDuration(track.durationMs);
+        out += '"';
+    }
+    out += '>';
+    out += mediaBase;
+    out.append(number, static_cast<std::size_t>(std::snprintf(number, sizeof number, "%lld",
+                                                              static_cast<long long>(track.id))));
+    if (!track.streamExtension.empty()) {
+        out += '.';
+        out += track.streamExtension;
+    }
+    out += "</res>";
+}
+
+std::string DateOfYear(int64_t year) {
+    if (year <= 0 || year > 9999)
+        return {};
+    char text[16];
+    std::snprintf(text, sizeof(text), "%04d-01-01", static_cast<int>(year));
+    return text;
+}
+
+void AppendItemStart(std::string& out, std::string_view id, std::string_view parentId,
+                     std::string_view refId) {
     out += "<item id=\"";
     out += id;
     out += "\" parentID=\"";
@@ -163,8 +221,13 @@ void AppendItem(std::string& out, std::string_view id, std::string_view parentId
         out += '"';
     }
     out += " restricted=\"1\">";
+}
+
+void AppendItem(std::string& out, std::string_view id, std::string_view parentId,
+                std::string_view refId, std::string_view body, const DidlPieces& pieces) {
+    AppendItemStart(out, id, parentId, refId);
     AppendExpanded(out, body, pieces);
-    out += "</item>";
+    out += kItemEnd;
 }
 
 std::string FormatDuration(int64_t milliseconds) {

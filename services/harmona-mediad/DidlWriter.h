@@ -50,6 +50,29 @@ struct DidlObject {
     int protocolInfoIndex = -1;
 };
 
+// A music track as a reply writes it (LibraryView keeps these values compact).
+struct TrackFields {
+    int64_t id = 0;  // names its res ("<id>[.<streamExtension>]") and its art
+    std::string_view title, artist, album, genre;
+    int64_t year = 0, trackNo = 0, durationMs = 0, size = -1;
+    std::string_view protocolInfo;     // escaped
+    std::string_view streamExtension;  // "" for a stream name of the id alone
+    std::string_view artExtension;     // "jpg" or "png"; "" when it has no art
+};
+
+// Appends a music track's children of <item>, from <dc:title> to </res>, its media URLs under
+// `mediaBase`.
+void AppendTrackItemBody(std::string& out, const TrackFields& track, std::string_view mediaBase);
+
+// Appends the start tag <item id=.. parentID=.. [refID=..] restricted="1">; the ids must be plain
+// (object ids are: see ObjectIds.h).
+void AppendItemStart(std::string& out, std::string_view id, std::string_view parentId,
+                     std::string_view refId);
+inline constexpr std::string_view kItemEnd = "</item>";
+
+// dc:date of a year: "YYYY-01-01"; "" for a year outside 1 to 9999.
+std::string DateOfYear(int64_t year);
+
 // The escaped protocolInfo of a res: "http-get:*:<mime>:<fourth field>".
 std::string ProtocolInfo(const std::string& mimeType, const std::string& dlnaFeatures);
 

@@ -4,6 +4,7 @@
 #include <atomic>
 #include <utility>
 
+#include "services/harmona-mediad/DidlWriter.h"
 #include "services/harmona-mediad/LibraryReader.h"
 #include "services/harmona-mediad/LibraryViewBuilder.h"
 
@@ -47,8 +48,31 @@ uint32_t LibraryView::ContainerIndex(const std::string& id) const {
 }
 
 const ViewTrack* LibraryView::FindTrack(int64_t id) const {
-    const auto found = trackIndex_.find(id);
-    return found == trackIndex_.end() ? nullptr : &tracks_[found->second];
+    const auto found =
+        std::lower_bound(tracks_.begin(), tracks_.end(), id,
+                         [](const ViewTrack& track, int64_t x) { return track.id < x; });
+    return found == tracks_.end() || found->id != id ? nullptr : &*found;
+}
+
+void LibraryView::AppendTrackBody(std::string& out, const ViewTrack& track,
+                                  std::string_view mediaBase) const {
+    TrackFields fields;
+    fields.id = track.id;
+    fields.title = Text(track.title);
+    fields.artist = Text(track.artist);
+    fields.album = Text(track.album);
+    fields.genre = Text(track.genre);
+    fields.year = track.year;
+    fields.trackNo = track.trackNo;
+    fields.durationMs = track.durationMs;
+    fields.size = track.size;
+    const ViewFileType& type = fileTypes_[track.fileType];
+    fields.protocolInfo = type.protocolInfo;
+    fields.streamExtension = type.streamExtension;
+    fields.artExtension = track.art == TrackArt::png   ? "png"
+                          : track.art == TrackArt::jpg ? "jpg"
+                                                       : "";
+    AppendTrackItemBody(out, fields, mediaBase);
 }
 
 bool LibraryView::Lists(uint32_t container, const ViewTrack& track) const {

@@ -56,25 +56,50 @@ void LibraryViewBuilder::Build() {
     view_.allMusic_ = category_[0];
     view_.random_ = category_[5];
     view_.tracks_.resize(rows_.size());
+    std::size_t titleBytes = 0;
+    for (const LibraryRow& row : rows_)
+        titleBytes += row.title.size();
+    view_.text_.reserve(titleBytes);
     for (std::size_t i = 0; i < rows_.size(); ++i) {
         const LibraryRow& row = rows_[i];
         ViewTrack& track = view_.tracks_[i];
         track.id = row.id;
-        track.title = row.title;
-        track.artist = row.artist;
-        track.album = row.album;
+        track.title = AddText(row.title);
+        track.artist = SharedText(row.artist);
+        track.album = SharedText(row.album);
+        track.genre = SharedText(row.genre);
         track.year = row.year;
         track.trackNo = row.trackNo;
-        view_.trackIndex_.emplace(row.id, static_cast<uint32_t>(i));
+        track.durationMs = row.durationMs;
+        track.size = row.size;
     }
     RankTitles();
     BuildFolders();
     BuildAlbums();
     BuildGenres();
     BuildAllMusicAndRandom();
-    RenderTracks();
+    TypeTracks();
     RenderContainers();
     HashContents();
+    sharedText_.clear();
+    view_.text_.shrink_to_fit();
+}
+
+TextRef LibraryViewBuilder::AddText(const std::string& text) {
+    TextRef ref{static_cast<uint32_t>(view_.text_.size()), static_cast<uint32_t>(text.size())};
+    view_.text_ += text;
+    return ref;
+}
+
+TextRef LibraryViewBuilder::SharedText(const std::string& text) {
+    if (text.empty())
+        return {};
+    const auto found = sharedText_.find(text);
+    if (found != sharedText_.end())
+        return found->second;
+    const TextRef ref = AddText(text);
+    sharedText_.emplace(text, ref);
+    return ref;
 }
 
 // --- Folders: the share's tree, each folder's subfolders (by name) before its tracks (by path).

@@ -54,8 +54,13 @@ class LibraryViewBuilder {
     void RankTitles();
     void SortTracks(std::vector<uint32_t>& tracks, bool byDisc) const;
     void AddTrackChildren(uint32_t container, const std::vector<uint32_t>& tracks);
-    // DIDL-Lite (LibraryViewDidl.cpp).
-    void RenderTracks();
+    // Text kept in the view's block: every title once, each distinct artist, album and genre once
+    // for all the tracks that share it.
+    TextRef AddText(const std::string& text);
+    TextRef SharedText(const std::string& text);
+    // DIDL-Lite (LibraryViewDidl.cpp): the file type and art of every track, the element of every
+    // container.
+    void TypeTracks();
     void RenderContainers();
     std::string AlbumArtPath(const LibraryAlbum& album) const;
     // Content hashes (LibraryViewChanges.cpp); after the rendering, which they cover.
@@ -71,6 +76,7 @@ class LibraryViewBuilder {
     std::vector<std::vector<std::pair<std::string, uint32_t>>> folderChildren_;  // per container
     std::vector<std::string> containerClass_;
     std::vector<LibraryAlbum> albums_;
+    std::unordered_map<std::string, TextRef> sharedText_;
 };
 
 }  // namespace harmona::mediad

@@ -20,9 +20,14 @@ uint64_t Combine(uint64_t hash, uint64_t part) {
 }  // namespace
 
 void LibraryViewBuilder::HashContents() {
+    // A track's hash covers its DIDL-Lite as a reply writes it.
     std::vector<uint64_t> trackHash(rows_.size());
-    for (std::size_t i = 0; i < rows_.size(); ++i)
-        trackHash[i] = Combine(HashOf(view_.tracks_[i].body), static_cast<uint64_t>(rows_[i].id));
+    std::string body;
+    for (std::size_t i = 0; i < rows_.size(); ++i) {
+        body.clear();
+        view_.AppendTrackBody(body, view_.tracks_[i], std::string_view());
+        trackHash[i] = Combine(HashOf(body), static_cast<uint64_t>(rows_[i].id));
+    }
     // Children before parents do not exist in every view, so hash in a second pass: a container's
     // hash covers its children's elements (their titles and counts) and its tracks.
     for (ViewContainer& container : view_.containers_) {
