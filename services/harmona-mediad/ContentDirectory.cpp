@@ -1,6 +1,7 @@
 #include "services/harmona-mediad/ContentDirectory.h"
 
 #include <fcntl.h>
+#include <malloc.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -338,15 +339,23 @@ std::shared_ptr<const LibraryView> ContentDirectory::CurrentView() const {
             return view_;
     }
     std::shared_ptr<const LibraryView> fresh = LibraryView::Load(dbPath_, sharePath_);
-    std::lock_guard<std::mutex> lock(mutex_);
-    if (!fresh)
-        return nullptr;  // tried again on the next call
-    if (loaded_ && view_ && fresh->updateId() != view_->updateId())
-        containerUpdateIds_ = fresh->ChangedContainers(view_.get(), kMaxContainerUpdates);
-    view_ = std::move(fresh);
-    stamp_ = now;
-    loaded_ = true;
-    return view_;
+    std::shared_ptr<const LibraryView> before;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (!fresh)
+            return nullptr;  // tried again on the next call
+        if (loaded_ && view_ && fresh->updateId() != view_->updateId())
+            containerUpdateIds_ = fresh->ChangedContainers(view_.get(), kMaxContainerUpdates);
+        before = std::move(view_);
+        view_ = fresh;
+        stamp_ = now;
+        loaded_ = true;
+    }
+    // What the load read and the view before (unless a request still holds it) go back to the
+    // system, not only to the allocator's free lists.
+    before.reset();
+    malloc_trim(0);
+    return fresh;
 }
 
 uint32_t ContentDirectory::SystemUpdateId() const {

@@ -2,6 +2,8 @@
 
 #include <sys/stat.h>
 
+#include <algorithm>
+
 #include "common/util/Utf8.h"
 #include "platform/lib/sqlite/Database.h"
 #include "platform/medialib/LibrarySchema.h"
@@ -45,6 +47,12 @@ bool ReadLibraryRows(const std::string& dbPath, LibraryRows& out) {
                               : static_cast<uint32_t>(st.st_mtime) & 0x7fffffffU;
     const std::string extra = std::string(HasColumn(db, "size") ? "size" : "NULL") + ", " +
                               (HasColumn(db, "art_path") ? "art_path" : "NULL");
+    // The rows are counted first: a vector grown row by row holds its old block and one twice
+    // as large at once while it moves them, the peak of a load.
+    Statement rowCount = db.Prepare("SELECT COUNT(*) FROM track");
+    if (!rowCount || rowCount.Step() != SQLITE_ROW)
+        return false;
+    out.rows.reserve(static_cast<std::size_t>(std::max<int64_t>(0, rowCount.ColumnInt64(0))));
     Statement stmt = db.Prepare(
         "SELECT id, path, title, artist, album, album_artist, genre, year, track_no, disc_no, "
         "duration_ms, added, " +
