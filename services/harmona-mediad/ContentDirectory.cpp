@@ -86,9 +86,8 @@ SortValues ValuesOf(const LibraryView& view, const ViewChild& child) {
                 track.trackNo, track.year};
     }
     const ViewContainer& container = view.containers()[child.index];
-    return {container.title, container.artist,
-            container.album ? std::string_view(container.title) : std::string_view(), 0,
-            container.year};
+    return {view.Text(container.title), view.Text(container.artist),
+            container.album() ? view.Text(container.title) : std::string_view(), 0, container.year};
 }
 
 int CompareBy(SortKey key, const SortValues& a, const SortValues& b) {
@@ -111,7 +110,8 @@ int CompareBy(SortKey key, const SortValues& a, const SortValues& b) {
 // the same on every page of a listing.
 std::vector<ViewChild> SortedChildren(const LibraryView& view, const ViewContainer& container,
                                       const std::vector<SortField>& fields) {
-    std::vector<ViewChild> children = container.children;
+    std::vector<ViewChild> children(view.ChildrenOf(container),
+                                    view.ChildrenOf(container) + container.childCount);
     if (fields.empty())
         return children;
     std::vector<SortValues> values(children.size());
@@ -137,7 +137,7 @@ std::vector<ViewChild> SortedChildren(const LibraryView& view, const ViewContain
 
 void AppendTrackIn(std::string& out, const LibraryView& view, uint32_t container,
                    const ViewTrack& track, const DidlPieces& pieces) {
-    const std::string& containerId = view.containers()[container].id;
+    const std::string containerId(view.Text(view.containers()[container].id));
     const bool own = container == view.allMusic();
     AppendItemStart(out, TrackIdIn(containerId, track.id), containerId,
                     own ? std::string() : TrackId(track.id));
@@ -150,7 +150,7 @@ void AppendChild(std::string& out, const LibraryView& view, uint32_t container,
     if (child.track)
         AppendTrackIn(out, view, container, view.tracks()[child.index], pieces);
     else
-        AppendExpanded(out, view.containers()[child.index].element, pieces);
+        view.AppendContainerElement(out, child.index, pieces.mediaBase);
 }
 
 BrowseResult Error(int code, const char* text) {
@@ -182,8 +182,8 @@ const ViewTrack* FindItem(const LibraryView& view, const std::string& id, uint32
 BrowseResult Metadata(const LibraryView& view, const std::string& id, const DidlPieces& pieces) {
     BrowseResult result;
     result.didl = kDidlBegin;
-    if (const ViewContainer* container = view.FindContainer(id)) {
-        AppendExpanded(result.didl, container->element, pieces);
+    if (const uint32_t container = view.ContainerIndex(id); container != kNoIndex) {
+        view.AppendContainerElement(result.didl, container, pieces.mediaBase);
     } else {
         uint32_t listing = kNoIndex;
         const ViewTrack* track = FindItem(view, id, &listing);
@@ -208,7 +208,7 @@ BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
                    : Error(kErrorNoSuchObject, "No such object");
     }
     const ViewContainer& container = view.containers()[index];
-    const std::size_t total = container.children.size();
+    const std::size_t total = container.childCount;
     const std::size_t first = std::min<std::size_t>(args.startingIndex, total);
     const std::size_t last = args.requestedCount == 0
                                  ? total
@@ -217,7 +217,7 @@ BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
     result.didl.reserve(
         std::min(kMaxResultBytes, kDidlBegin.size() + kDidlEnd.size() + (last - first) * 640));
     result.didl = kDidlBegin;
-    const std::vector<ViewChild>& children = sorted != nullptr ? *sorted : container.children;
+    const ViewChild* children = sorted != nullptr ? sorted->data() : view.ChildrenOf(container);
     std::size_t end = first;
     while (end < last && end - first < kMaxResultObjects) {
         const std::size_t before = result.didl.size();

@@ -200,6 +200,40 @@ void AppendTrackItemBody(std::string& out, const TrackFields& track, std::string
     out += "</res>";
 }
 
+void AppendContainer(std::string& out, const ContainerFields& container,
+                     std::string_view mediaBase) {
+    out += "<container id=\"";
+    AppendXmlText(out, container.id);
+    out += "\" parentID=\"";
+    AppendXmlText(out, container.parentId);
+    out += "\" restricted=\"1\" childCount=\"";
+    char number[32];
+    out.append(number,
+               static_cast<std::size_t>(std::snprintf(
+                   number, sizeof number, "%lld", static_cast<long long>(container.childCount))));
+    out += "\" searchable=\"0\"><dc:title>";
+    AppendXmlText(out, container.title);
+    out += "</dc:title><upnp:class>";
+    AppendXmlText(out, container.upnpClass);
+    out += "</upnp:class>";
+    AppendElement(out, "dc:creator", container.artist);
+    AppendElement(out, "upnp:artist", container.artist);
+    if (container.year > 0 && container.year <= 9999)
+        AppendElement(out, "dc:date", DateOfYear(container.year));
+    if (!container.artExtension.empty()) {
+        out += "<upnp:albumArtURI>";
+        out += mediaBase;
+        out += "art/";
+        out.append(number,
+                   static_cast<std::size_t>(std::snprintf(
+                       number, sizeof number, "%lld", static_cast<long long>(container.artTrack))));
+        out += '.';
+        out += container.artExtension;
+        out += "</upnp:albumArtURI>";
+    }
+    out += "</container>";
+}
+
 std::string DateOfYear(int64_t year) {
     if (year <= 0 || year > 9999)
         return {};

@@ -64,6 +64,18 @@ struct TrackFields {
 // `mediaBase`.
 void AppendTrackItemBody(std::string& out, const TrackFields& track, std::string_view mediaBase);
 
+// A container as a reply writes it.
+struct ContainerFields {
+    std::string_view id, parentId, title, upnpClass, artist;
+    int64_t childCount = 0, year = 0;
+    int64_t artTrack = 0;           // its art is the art of this track
+    std::string_view artExtension;  // "jpg" or "png"; "" when it has no art
+};
+
+// Appends the whole <container> element, childCount included, its art URL under `mediaBase`.
+void AppendContainer(std::string& out, const ContainerFields& container,
+                     std::string_view mediaBase);
+
 // Appends the start tag <item id=.. parentID=.. [refID=..] restricted="1">; the ids must be plain
 // (object ids are: see ObjectIds.h).
 void AppendItemStart(std::string& out, std::string_view id, std::string_view parentId,

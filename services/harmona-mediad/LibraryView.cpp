@@ -37,14 +37,40 @@ std::unique_ptr<LibraryView> LibraryView::Load(const std::string& dbPath,
     return view;
 }
 
-const ViewContainer* LibraryView::FindContainer(const std::string& id) const {
+const ViewContainer* LibraryView::FindContainer(std::string_view id) const {
     const uint32_t index = ContainerIndex(id);
     return index == kNoIndex ? nullptr : &containers_[index];
 }
 
-uint32_t LibraryView::ContainerIndex(const std::string& id) const {
-    const auto found = containerIndex_.find(id);
-    return found == containerIndex_.end() ? kNoIndex : found->second;
+uint32_t LibraryView::ContainerIndex(std::string_view id) const {
+    const auto found = std::lower_bound(
+        containersById_.begin(), containersById_.end(), id,
+        [&](uint32_t index, std::string_view x) { return Text(containers_[index].id) < x; });
+    return found == containersById_.end() || Text(containers_[*found].id) != id ? kNoIndex : *found;
+}
+
+void LibraryView::AppendContainerElement(std::string& out, uint32_t index,
+                                         std::string_view mediaBase) const {
+    static constexpr const char* kClasses[] = {
+        "object.container.storageFolder", "object.container.album.musicAlbum",
+        "object.container.person.musicArtist", "object.container.genre.musicGenre"};
+    const ViewContainer& container = containers_[index];
+    ContainerFields fields;
+    fields.id = Text(container.id);
+    fields.parentId = container.parent == kNoIndex ? std::string_view("-1")
+                                                   : Text(containers_[container.parent].id);
+    fields.title = Text(container.title);
+    fields.upnpClass = kClasses[static_cast<int>(container.kind)];
+    fields.childCount = container.childCount;
+    if (container.album()) {
+        fields.artist = Text(container.artist);
+        fields.year = container.year;
+    }
+    fields.artTrack = container.artTrack;
+    fields.artExtension = container.art == TrackArt::png   ? "png"
+                          : container.art == TrackArt::jpg ? "jpg"
+                                                           : "";
+    AppendContainer(out, fields, mediaBase);
 }
 
 const ViewTrack* LibraryView::FindTrack(int64_t id) const {
