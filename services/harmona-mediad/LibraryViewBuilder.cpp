@@ -81,7 +81,10 @@ void LibraryViewBuilder::Build() {
     std::size_t titleBytes = 0;
     for (const LibraryRow& row : rows_)
         titleBytes += row.title.size;
-    view_.text_.reserve(titleBytes);
+    // Room for the titles and, as far as the rows' text goes, the containers' ids and titles:
+    // a block grown by doubling would hold its old and its new copy at once. What stays unused is
+    // never touched, and so never resident.
+    view_.text_.reserve(titleBytes + rowText_.size());
     for (std::size_t i = 0; i < rows_.size(); ++i) {
         const LibraryRow& row = rows_[i];
         ViewTrack& track = view_.tracks_[i];
@@ -95,17 +98,25 @@ void LibraryViewBuilder::Build() {
         track.durationMs = row.durationMs;
         track.size = row.size;
     }
+    TypeTracks();
     RankTitles();
     BuildFolders();
     BuildAlbums();
     BuildGenres();
     BuildAllMusicAndRandom();
+    // The rows are not needed past here: given back before the children are gathered into one
+    // array and the hashes made, the most the load holds at once.
+    std::vector<LibraryRow>().swap(rows_);
+    std::string().swap(rowText_);
+    decltype(sharedText_)().swap(sharedText_);
+    decltype(folders_)().swap(folders_);
+    decltype(folderChildren_)().swap(folderChildren_);
+    decltype(albums_)().swap(albums_);
+    decltype(byTitle_)().swap(byTitle_);
+    decltype(titleRank_)().swap(titleRank_);
     FlattenChildren();
-    TypeTracks();
     IndexContainers();
     HashContents();
-    sharedText_.clear();
-    view_.text_.shrink_to_fit();
 }
 
 TextRef LibraryViewBuilder::AddText(std::string_view text) {

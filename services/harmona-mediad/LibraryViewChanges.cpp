@@ -21,12 +21,12 @@ uint64_t Combine(uint64_t hash, uint64_t part) {
 
 void LibraryViewBuilder::HashContents() {
     // A track's hash covers its DIDL-Lite as a reply writes it.
-    std::vector<uint64_t> trackHash(rows_.size());
+    std::vector<uint64_t> trackHash(view_.tracks_.size());
     std::string body;
-    for (std::size_t i = 0; i < rows_.size(); ++i) {
+    for (std::size_t i = 0; i < view_.tracks_.size(); ++i) {
         body.clear();
         view_.AppendTrackBody(body, view_.tracks_[i], std::string_view());
-        trackHash[i] = Combine(HashOf(body), static_cast<uint64_t>(rows_[i].id));
+        trackHash[i] = Combine(HashOf(body), static_cast<uint64_t>(view_.tracks_[i].id));
     }
     // Children before parents do not exist in every view, so hash in a second pass: a container's
     // hash covers its children's elements (their titles and counts) and its tracks.
