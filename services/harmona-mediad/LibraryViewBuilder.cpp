@@ -83,7 +83,7 @@ void LibraryViewBuilder::Build() {
         titleBytes += row.title.size;
     // Room for the titles and, as far as the rows' text goes, the containers' ids and titles:
     // a block grown by doubling would hold its old and its new copy at once. What stays unused is
-    // never touched, and so never resident.
+    // never touched, and so never resident, and is given back below.
     view_.text_.reserve(titleBytes + rowText_.size());
     for (std::size_t i = 0; i < rows_.size(); ++i) {
         const LibraryRow& row = rows_[i];
@@ -114,6 +114,8 @@ void LibraryViewBuilder::Build() {
     decltype(albums_)().swap(albums_);
     decltype(byTitle_)().swap(byTitle_);
     decltype(titleRank_)().swap(titleRank_);
+    // The text block to its size: the copy is made where the rows no longer take room.
+    view_.text_.shrink_to_fit();
     FlattenChildren();
     IndexContainers();
     HashContents();
