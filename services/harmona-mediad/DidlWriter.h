@@ -1,5 +1,5 @@
-// DIDL-Lite text (ContentDirectory:1 Result), written by hand for speed: every value is escaped
-// once, when the library is loaded, and a Browse only concatenates the pieces.
+// DIDL-Lite text (ContentDirectory:1 Result), written by hand for speed: a Browse writes each track
+// and container it returns straight from the library view's compact values.
 #pragma once
 
 #include <cstdint>
