@@ -136,21 +136,21 @@ std::vector<ViewChild> SortedChildren(const LibraryView& view, const ViewContain
 }
 
 void AppendTrackIn(std::string& out, const LibraryView& view, uint32_t container,
-                   const ViewTrack& track, const DidlPieces& pieces) {
+                   const ViewTrack& track, std::string_view mediaBase) {
     const std::string containerId(view.Text(view.containers()[container].id));
     const bool own = container == view.allMusic();
     AppendItemStart(out, TrackIdIn(containerId, track.id), containerId,
                     own ? std::string() : TrackId(track.id));
-    view.AppendTrackBody(out, track, pieces.mediaBase);
+    view.AppendTrackBody(out, track, mediaBase);
     out += kItemEnd;
 }
 
 void AppendChild(std::string& out, const LibraryView& view, uint32_t container,
-                 const ViewChild& child, const DidlPieces& pieces) {
+                 const ViewChild& child, std::string_view mediaBase) {
     if (child.track)
-        AppendTrackIn(out, view, container, view.tracks()[child.index], pieces);
+        AppendTrackIn(out, view, container, view.tracks()[child.index], mediaBase);
     else
-        view.AppendContainerElement(out, child.index, pieces.mediaBase);
+        view.AppendContainerElement(out, child.index, mediaBase);
 }
 
 BrowseResult Error(int code, const char* text) {
@@ -179,17 +179,17 @@ const ViewTrack* FindItem(const LibraryView& view, const std::string& id, uint32
     return track != nullptr && view.Lists(*container, *track) ? track : nullptr;
 }
 
-BrowseResult Metadata(const LibraryView& view, const std::string& id, const DidlPieces& pieces) {
+BrowseResult Metadata(const LibraryView& view, const std::string& id, std::string_view mediaBase) {
     BrowseResult result;
     result.didl = kDidlBegin;
     if (const uint32_t container = view.ContainerIndex(id); container != kNoIndex) {
-        view.AppendContainerElement(result.didl, container, pieces.mediaBase);
+        view.AppendContainerElement(result.didl, container, mediaBase);
     } else {
         uint32_t listing = kNoIndex;
         const ViewTrack* track = FindItem(view, id, &listing);
         if (track == nullptr)
             return Error(kErrorNoSuchObject, "No such object");
-        AppendTrackIn(result.didl, view, listing, *track, pieces);
+        AppendTrackIn(result.didl, view, listing, *track, mediaBase);
     }
     result.didl += kDidlEnd;
     result.numberReturned = 1;
@@ -199,7 +199,7 @@ BrowseResult Metadata(const LibraryView& view, const std::string& id, const Didl
 
 // `sorted`: the container's children in the requested order, nullptr for the default order.
 BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
-                      const std::vector<ViewChild>* sorted, const DidlPieces& pieces) {
+                      const std::vector<ViewChild>* sorted, std::string_view mediaBase) {
     const uint32_t index = view.ContainerIndex(args.objectId);
     if (index == kNoIndex) {
         uint32_t listing = kNoIndex;
@@ -221,7 +221,7 @@ BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
     std::size_t end = first;
     while (end < last && end - first < kMaxResultObjects) {
         const std::size_t before = result.didl.size();
-        AppendChild(result.didl, view, index, children[end], pieces);
+        AppendChild(result.didl, view, index, children[end], mediaBase);
         // An object that would take the reply past its byte budget is left for the next page,
         // unless it is the first.
         if (end > first && result.didl.size() + kDidlEnd.size() > kMaxResultBytes) {
@@ -386,13 +386,14 @@ BrowseResult ContentDirectory::Browse(const BrowseArgs& args) const {
     const std::shared_ptr<const LibraryView> view = CurrentView();
     if (!view)
         return Error(kErrorActionFailed, "The library database cannot be read");
-    const DidlPieces pieces{args.mediaBaseUrl.empty() ? mediaBaseUrl_ : args.mediaBaseUrl, nullptr};
+    const std::string_view mediaBase =
+        args.mediaBaseUrl.empty() ? mediaBaseUrl_ : args.mediaBaseUrl;
     std::shared_ptr<const std::vector<ViewChild>> sorted;
     const uint32_t container = view->ContainerIndex(args.objectId);
     if (!args.metadata && !sort.empty() && container != kNoIndex)
         sorted = sortedListings_->Get(*view, container, sort);
-    BrowseResult result = args.metadata ? Metadata(*view, args.objectId, pieces)
-                                        : Children(*view, args, sorted.get(), pieces);
+    BrowseResult result = args.metadata ? Metadata(*view, args.objectId, mediaBase)
+                                        : Children(*view, args, sorted.get(), mediaBase);
     if (result.error == 0)
         result.updateId = view->updateId();
     return result;
