@@ -2,9 +2,9 @@
 # The media server's resident size over repeated whole-list fetches: library.db with TRACKS tracks
 # written directly (the indexer's schema, no audio files), harmona-mediad on it, then PASSES passes
 # of the whole "music_all" list fetched as a client must (RequestedCount 0, then on from the next
-# index) and again in pages of PAGE_SIZE. Prints the server process's VmRSS after each pass, and
-# glibc's malloc_stats (in use against held from the system) at the start and end when gdb is
-# there. Runs in a private mount and network namespace.
+# index) and again in pages of PAGE_SIZE. Prints the server process's VmRSS and its peak (VmHWM)
+# after each pass, and glibc's malloc_stats (in use against held from the system) at the start and
+# end when gdb is there. Runs in a private mount and network namespace.
 #   bench/mediad/memory.sh [BUILD_DIR]      (as root; needs python3, curl; gdb for malloc_stats)
 set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd)
@@ -55,6 +55,7 @@ for p in $(pgrep -P "$mediad"); do
 done
 [[ -n "$server" ]] || { echo "no server process"; exit 1; }
 rss() { awk '/^VmRSS:/ {print $2}' /proc/$server/status; }
+hwm() { awk '/^VmHWM:/ {print $2}' /proc/$server/status; }
 malloc_stats() {  # glibc prints it on the server's standard error (/tmp/mediad.log)
     command -v gdb >/dev/null || return 0
     gdb -p "$server" -batch -ex 'call (void) malloc_stats()' >/dev/null 2>&1 || true
@@ -80,12 +81,12 @@ fetch_all() {  # page size (0: as many as the server gives) -> requests
     echo "$requests"
 }
 
-echo "server pid $server, VmRSS at start $(rss) KiB"
+echo "server pid $server, VmRSS at start $(rss) KiB (peak $(hwm) KiB)"
 malloc_stats start
 for pass in $(seq 1 "$passes"); do
     whole=$(fetch_all 0)
     paged=$(fetch_all "$page")
     total=$(grep -o 'TotalMatches>[0-9]*' /tmp/reply.xml | grep -o '[0-9]*$' || echo 0)
-    echo "pass $pass: $whole + $paged requests (TotalMatches $total), VmRSS $(rss) KiB"
+    echo "pass $pass: $whole + $paged requests (TotalMatches $total), VmRSS $(rss) KiB, peak (VmHWM) $(hwm) KiB"
 done
 malloc_stats end

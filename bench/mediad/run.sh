@@ -2,7 +2,10 @@
 # Benchmark of the indexer and the local media server: harmona-index over 10,000 tiny files (first run and unchanged re-run), and
 # Browse of a container of BROWSE_TRACKS (default 100,000) tracks, whole, fetched as a client must
 # (paged) and a page of 50, and BrowseMetadata of the root, against MiniDLNA and Gerbera serving the
-# same files in the same run. Runs in a private mount and network namespace.
+# same files in the same run; then one track streamed from each, and each server's memory (its
+# serving process's peak resident size, the Pss of all its processes before the first Browse and
+# after the last) and the on-disk size of its database. Runs in a private mount and network
+# namespace.
 #   bench/mediad/run.sh [BUILD_DIR]      (as root; needs sox, minidlna, gerbera, python3, curl)
 set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd)
@@ -94,6 +97,43 @@ done
 t2=$(seconds)
 [[ "$with_gerbera" == 1 ]] && echo "Gerbera import of $browse_tracks files: $(python3 -c "print('%.1f' % ($t2-$gerbera_start))") s (All Audio $gerbera_all, TotalMatches $(total))"
 
+# Memory of each server: the peak resident size (VmHWM) of its serving process, and the
+# proportional set size (Pss, /proc/<pid>/smaps_rollup) of all its processes added up, which
+# counts a page that processes share once between them.
+procs_of() {  # pid -> the pid and all its descendants
+    echo "$1"
+    local child
+    for child in $(pgrep -P "$1" || true); do procs_of "$child"; done
+}
+kib() { awk -v f="$1:" '$1 == f {print $2}' "$2" 2>/dev/null || true; }
+memory_of() {  # label root_pid serving_pid
+    local pss=0 hwm=0 count=0 p v
+    for p in $(procs_of "$2"); do
+        v=$(kib Pss "/proc/$p/smaps_rollup"); pss=$((pss + ${v:-0}))
+        v=$(kib VmHWM "/proc/$p/status"); hwm=$((hwm + ${v:-0}))
+        count=$((count + 1))
+    done
+    printf '%-34s serving process peak (VmHWM) %7s KiB; %s processes: Pss %7s KiB, peaks added %7s KiB\n' \
+        "$1" "$(kib VmHWM "/proc/$3/status")" "$count" "$pss" "$hwm"
+}
+# harmona-mediad's serving process is the supervisor's child that gave up root.
+mediad_server=""
+for p in $(pgrep -P "$mediad" || true); do
+    [[ "$(awk '/^Uid:/ {print $2}' /proc/$p/status)" != 0 ]] && mediad_server=$p
+done
+memory_report() {  # when
+    echo "-- memory $1"
+    memory_of "harmona-mediad" "$mediad" "${mediad_server:-$mediad}"
+    memory_of "MiniDLNA" "$minidlna" "$minidlna"
+    [[ "$with_gerbera" == 1 ]] && memory_of "Gerbera" "$gerbera" "$gerbera"
+    true
+}
+echo "-- database on disk"
+printf '%-34s %s bytes (library.db)\n' "harmona-mediad" "$(du -cb /var/packages/Harmona/var/library.db* | tail -1 | cut -f1)"
+printf '%-34s %s bytes (files.db and art cache)\n' "MiniDLNA" "$(du -sb /tmp/minidlna | cut -f1)"
+[[ "$with_gerbera" == 1 ]] && printf '%-34s %s bytes\n' "Gerbera" "$(du -sb /tmp/gerbera | cut -f1)"
+memory_report "before the first Browse"
+
 median() { sort -n | awk '{a[NR]=$1} END {print a[int((NR+1)/2)]}'; }
 measure() {  # label url object start count [flag [repeats]]
     local times=() t
@@ -140,4 +180,21 @@ measure "MiniDLNA page of 50" "$theirs" '1$4' "$half" 50
 measure "harmona-mediad BrowseMetadata 0" "$ours" 0 0 0 BrowseMetadata
 measure "MiniDLNA BrowseMetadata 0" "$theirs" 0 0 0 BrowseMetadata
 [[ "$with_gerbera" == 1 ]] && measure "Gerbera BrowseMetadata 0" "$gerbera_url" 0 0 0 BrowseMetadata 1
+# One track streamed whole from each (the first of a page of the list).
+stream() {  # label url object
+    soap "$2" "$3" 0 1 >/dev/null
+    local res
+    res=$(python3 - <<'PY'
+import re, xml.etree.ElementTree as ET
+body = open("/tmp/reply.xml", encoding="utf-8", errors="replace").read()
+result = next((e.text for e in ET.fromstring(body).iter() if e.tag.endswith("Result")), "") or ""
+found = re.search(r"<res[^>]*>([^<]+)</res>", result)
+print(found.group(1).replace("&amp;", "&") if found else "")
+PY
+)
+    printf '%-34s %s\n' "$1" "$(curl -s -m 60 -o /dev/null -w '%{http_code} %{size_download} bytes %{time_total} s' "$res")"
+}
+stream "harmona-mediad track streamed" "$ours" music_all
+stream "MiniDLNA track streamed" "$theirs" '1$4'
+memory_report "after the last Browse"
 true

@@ -1,6 +1,7 @@
 #include "services/harmona-mediad/ContentDirectory.h"
 
 #include <fcntl.h>
+#include <malloc.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -81,12 +82,12 @@ struct SortValues {
 SortValues ValuesOf(const LibraryView& view, const ViewChild& child) {
     if (child.track) {
         const ViewTrack& track = view.tracks()[child.index];
-        return {track.title, track.artist, track.album, track.trackNo, track.year};
+        return {view.Text(track.title), view.Text(track.artist), view.Text(track.album),
+                track.trackNo, track.year};
     }
     const ViewContainer& container = view.containers()[child.index];
-    return {container.title, container.artist,
-            container.album ? std::string_view(container.title) : std::string_view(), 0,
-            container.year};
+    return {view.Text(container.title), view.Text(container.artist),
+            container.album() ? view.Text(container.title) : std::string_view(), 0, container.year};
 }
 
 int CompareBy(SortKey key, const SortValues& a, const SortValues& b) {
@@ -109,7 +110,8 @@ int CompareBy(SortKey key, const SortValues& a, const SortValues& b) {
 // the same on every page of a listing.
 std::vector<ViewChild> SortedChildren(const LibraryView& view, const ViewContainer& container,
                                       const std::vector<SortField>& fields) {
-    std::vector<ViewChild> children = container.children;
+    std::vector<ViewChild> children(view.ChildrenOf(container),
+                                    view.ChildrenOf(container) + container.childCount);
     if (fields.empty())
         return children;
     std::vector<SortValues> values(children.size());
@@ -134,19 +136,21 @@ std::vector<ViewChild> SortedChildren(const LibraryView& view, const ViewContain
 }
 
 void AppendTrackIn(std::string& out, const LibraryView& view, uint32_t container,
-                   const ViewTrack& track, const DidlPieces& pieces) {
-    const std::string& containerId = view.containers()[container].id;
+                   const ViewTrack& track, std::string_view mediaBase) {
+    const std::string containerId(view.Text(view.containers()[container].id));
     const bool own = container == view.allMusic();
-    AppendItem(out, TrackIdIn(containerId, track.id), containerId,
-               own ? std::string() : TrackId(track.id), track.body, pieces);
+    AppendItemStart(out, TrackIdIn(containerId, track.id), containerId,
+                    own ? std::string() : TrackId(track.id));
+    view.AppendTrackBody(out, track, mediaBase);
+    out += kItemEnd;
 }
 
 void AppendChild(std::string& out, const LibraryView& view, uint32_t container,
-                 const ViewChild& child, const DidlPieces& pieces) {
+                 const ViewChild& child, std::string_view mediaBase) {
     if (child.track)
-        AppendTrackIn(out, view, container, view.tracks()[child.index], pieces);
+        AppendTrackIn(out, view, container, view.tracks()[child.index], mediaBase);
     else
-        AppendExpanded(out, view.containers()[child.index].element, pieces);
+        view.AppendContainerElement(out, child.index, mediaBase);
 }
 
 BrowseResult Error(int code, const char* text) {
@@ -175,17 +179,17 @@ const ViewTrack* FindItem(const LibraryView& view, const std::string& id, uint32
     return track != nullptr && view.Lists(*container, *track) ? track : nullptr;
 }
 
-BrowseResult Metadata(const LibraryView& view, const std::string& id, const DidlPieces& pieces) {
+BrowseResult Metadata(const LibraryView& view, const std::string& id, std::string_view mediaBase) {
     BrowseResult result;
     result.didl = kDidlBegin;
-    if (const ViewContainer* container = view.FindContainer(id)) {
-        AppendExpanded(result.didl, container->element, pieces);
+    if (const uint32_t container = view.ContainerIndex(id); container != kNoIndex) {
+        view.AppendContainerElement(result.didl, container, mediaBase);
     } else {
         uint32_t listing = kNoIndex;
         const ViewTrack* track = FindItem(view, id, &listing);
         if (track == nullptr)
             return Error(kErrorNoSuchObject, "No such object");
-        AppendTrackIn(result.didl, view, listing, *track, pieces);
+        AppendTrackIn(result.didl, view, listing, *track, mediaBase);
     }
     result.didl += kDidlEnd;
     result.numberReturned = 1;
@@ -195,7 +199,7 @@ BrowseResult Metadata(const LibraryView& view, const std::string& id, const Didl
 
 // `sorted`: the container's children in the requested order, nullptr for the default order.
 BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
-                      const std::vector<ViewChild>* sorted, const DidlPieces& pieces) {
+                      const std::vector<ViewChild>* sorted, std::string_view mediaBase) {
     const uint32_t index = view.ContainerIndex(args.objectId);
     if (index == kNoIndex) {
         uint32_t listing = kNoIndex;
@@ -204,18 +208,28 @@ BrowseResult Children(const LibraryView& view, const BrowseArgs& args,
                    : Error(kErrorNoSuchObject, "No such object");
     }
     const ViewContainer& container = view.containers()[index];
-    const std::size_t total = container.children.size();
+    const std::size_t total = container.childCount;
     const std::size_t first = std::min<std::size_t>(args.startingIndex, total);
     const std::size_t last = args.requestedCount == 0
                                  ? total
                                  : std::min<std::size_t>(total, first + args.requestedCount);
     BrowseResult result;
-    result.didl.reserve(kDidlBegin.size() + (last - first) * 640);
+    result.didl.reserve(
+        std::min(kMaxResultBytes, kDidlBegin.size() + kDidlEnd.size() + (last - first) * 640));
     result.didl = kDidlBegin;
-    const std::vector<ViewChild>& children = sorted != nullptr ? *sorted : container.children;
+    const ViewChild* children = sorted != nullptr ? sorted->data() : view.ChildrenOf(container);
     std::size_t end = first;
-    while (end < last && (end == first || result.didl.size() < kMaxResultBytes))
-        AppendChild(result.didl, view, index, children[end++], pieces);
+    while (end < last && end - first < kMaxResultObjects) {
+        const std::size_t before = result.didl.size();
+        AppendChild(result.didl, view, index, children[end], mediaBase);
+        // An object that would take the reply past its byte budget is left for the next page,
+        // unless it is the first.
+        if (end > first && result.didl.size() + kDidlEnd.size() > kMaxResultBytes) {
+            result.didl.resize(before);
+            break;
+        }
+        ++end;
+    }
     result.didl += kDidlEnd;
     result.numberReturned = ClampCount(end - first);
     result.totalMatches = ClampCount(total);
@@ -325,15 +339,23 @@ std::shared_ptr<const LibraryView> ContentDirectory::CurrentView() const {
             return view_;
     }
     std::shared_ptr<const LibraryView> fresh = LibraryView::Load(dbPath_, sharePath_);
-    std::lock_guard<std::mutex> lock(mutex_);
-    if (!fresh)
-        return nullptr;  // tried again on the next call
-    if (loaded_ && view_ && fresh->updateId() != view_->updateId())
-        containerUpdateIds_ = fresh->ChangedContainers(view_.get(), kMaxContainerUpdates);
-    view_ = std::move(fresh);
-    stamp_ = now;
-    loaded_ = true;
-    return view_;
+    std::shared_ptr<const LibraryView> before;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (!fresh)
+            return nullptr;  // tried again on the next call
+        if (loaded_ && view_ && fresh->updateId() != view_->updateId())
+            containerUpdateIds_ = fresh->ChangedContainers(view_.get(), kMaxContainerUpdates);
+        before = std::move(view_);
+        view_ = fresh;
+        stamp_ = now;
+        loaded_ = true;
+    }
+    // What the load read and the view before (unless a request still holds it) go back to the
+    // system, not only to the allocator's free lists.
+    before.reset();
+    malloc_trim(0);
+    return fresh;
 }
 
 uint32_t ContentDirectory::SystemUpdateId() const {
@@ -364,14 +386,14 @@ BrowseResult ContentDirectory::Browse(const BrowseArgs& args) const {
     const std::shared_ptr<const LibraryView> view = CurrentView();
     if (!view)
         return Error(kErrorActionFailed, "The library database cannot be read");
-    const DidlPieces pieces{args.mediaBaseUrl.empty() ? mediaBaseUrl_ : args.mediaBaseUrl,
-                            &view->protocolInfos()};
+    const std::string_view mediaBase =
+        args.mediaBaseUrl.empty() ? mediaBaseUrl_ : args.mediaBaseUrl;
     std::shared_ptr<const std::vector<ViewChild>> sorted;
     const uint32_t container = view->ContainerIndex(args.objectId);
     if (!args.metadata && !sort.empty() && container != kNoIndex)
         sorted = sortedListings_->Get(*view, container, sort);
-    BrowseResult result = args.metadata ? Metadata(*view, args.objectId, pieces)
-                                        : Children(*view, args, sorted.get(), pieces);
+    BrowseResult result = args.metadata ? Metadata(*view, args.objectId, mediaBase)
+                                        : Children(*view, args, sorted.get(), mediaBase);
     if (result.error == 0)
         result.updateId = view->updateId();
     return result;

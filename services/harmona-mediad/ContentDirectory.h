@@ -33,11 +33,14 @@ inline constexpr const char* kSearchCapabilities = "";
 // the tree first); a control point that misses a deeper one still sees SystemUpdateID move.
 inline constexpr std::size_t kMaxContainerUpdates = 100;
 
-// A Browse returns fewer objects than asked for once its DIDL-Lite reaches this size (always at
-// least one), as ContentDirectory:1 allows: a client pages on from NumberReturned, and no reply,
-// once escaped into its SOAP envelope, comes near the 64 MiB a client such as the tree's CGI
-// accepts, however large the container.
-inline constexpr std::size_t kMaxResultBytes = 16u * 1024u * 1024u;
+// A Browse returns fewer objects than asked for (always at least one) rather than DIDL-Lite of more
+// than this many bytes or more than this many objects, as ContentDirectory:1 allows: a client pages
+// on from NumberReturned. Control points built on libxml2 refuse a text node of more than
+// 10,000,000 bytes ("huge text node") and then see no NumberReturned at all, so a reply stays well
+// below that; and a smaller reply is a smaller share of the server's memory while it is sent
+// (the DIDL-Lite, its escaped SOAP envelope, the HTTP body).
+inline constexpr std::size_t kMaxResultBytes = 4u * 1024u * 1024u;
+inline constexpr std::size_t kMaxResultObjects = 10000;
 
 struct BrowseArgs {
     std::string objectId;

@@ -10,7 +10,6 @@ namespace {
 
 // Every value is written as well-formed XML text, whatever bytes the library holds.
 using util::AppendXmlText;
-using util::XmlText;
 
 constexpr std::string_view kTrackClassElement =
     "<upnp:class>object.item.audioItem.musicTrack</upnp:class>";
@@ -32,46 +31,6 @@ void AppendNumberElement(std::string& out, const char* name, int64_t value) {
         AppendElement(out, name, std::to_string(value));
 }
 
-void AppendMediaUrl(std::string& out, std::string_view path) {
-    out += kMediaBaseMark;
-    AppendXmlText(out, path);
-}
-
-// The elements an item and a container share, after dc:title and upnp:class.
-void AppendPeopleAndDate(std::string& out, const DidlObject& object) {
-    AppendElement(out, "dc:creator", object.artist);
-    AppendElement(out, "upnp:artist", object.artist);
-    AppendElement(out, "upnp:album", object.album);
-    AppendElement(out, "upnp:genre", object.genre);
-    AppendElement(out, "dc:date", object.date);
-    if (!object.artPath.empty()) {
-        out += "<upnp:albumArtURI>";
-        AppendMediaUrl(out, object.artPath);
-        out += "</upnp:albumArtURI>";
-    }
-}
-
-void AppendRes(std::string& out, const DidlObject& object) {
-    if (object.resPath.empty())
-        return;
-    out += "<res protocolInfo=\"";
-    if (object.protocolInfoIndex >= 0 &&
-        static_cast<std::size_t>(object.protocolInfoIndex) < kMaxSharedProtocolInfos) {
-        out += kProtocolInfoMark;
-        out += static_cast<char>(object.protocolInfoIndex + 1);
-    } else {
-        out += ProtocolInfo(object.mimeType, object.dlnaFeatures);
-    }
-    out += '"';
-    if (object.size >= 0)
-        out += " size=\"" + std::to_string(object.size) + '"';
-    if (object.durationMs > 0)
-        out += " duration=\"" + FormatDuration(object.durationMs) + '"';
-    out += '>';
-    AppendMediaUrl(out, object.resPath);
-    out += "</res>";
-}
-
 }  // namespace
 
 std::string ProtocolInfo(const std::string& mimeType, const std::string& dlnaFeatures) {
@@ -82,76 +41,100 @@ std::string ProtocolInfo(const std::string& mimeType, const std::string& dlnaFea
     return out;
 }
 
-std::string DidlItemBody(const DidlObject& object) {
-    std::string out;
-    out.reserve(256 + object.title.size() + object.artist.size() + object.album.size());
+void AppendTrackItemBody(std::string& out, const TrackFields& track, std::string_view mediaBase) {
     out += "<dc:title>";
-    AppendXmlText(out, object.title);
+    AppendXmlText(out, track.title);
     out += "</dc:title>";
-    if (object.upnpClass == kMusicTrackClass) {
-        out += kTrackClassMark;
-    } else {
-        out += "<upnp:class>";
-        AppendXmlText(out, object.upnpClass);
-        out += "</upnp:class>";
+    out += kTrackClassElement;
+    AppendElement(out, "dc:creator", track.artist);
+    AppendElement(out, "upnp:artist", track.artist);
+    AppendElement(out, "upnp:album", track.album);
+    AppendElement(out, "upnp:genre", track.genre);
+    if (track.year > 0 && track.year <= 9999)
+        AppendElement(out, "dc:date", DateOfYear(track.year));
+    char number[32];
+    if (!track.artExtension.empty()) {
+        out += "<upnp:albumArtURI>";
+        out += mediaBase;
+        out += "art/";
+        out.append(number, static_cast<std::size_t>(std::snprintf(
+                               number, sizeof number, "%lld", static_cast<long long>(track.id))));
+        out += '.';
+        out += track.artExtension;
+        out += "</upnp:albumArtURI>";
     }
-    AppendPeopleAndDate(out, object);
-    AppendNumberElement(out, "upnp:originalTrackNumber", object.trackNo);
-    AppendRes(out, object);
-    return out;
+    AppendNumberElement(out, "upnp:originalTrackNumber", track.trackNo);
+    if (track.id < 0)
+        return;  // no stream name: no res
+    out += "<res protocolInfo=\"";
+    out += track.protocolInfo;
+    out += '"';
+    if (track.size >= 0) {
+        out += " size=\"";
+        out.append(number, static_cast<std::size_t>(std::snprintf(
+                               number, sizeof number, "%lld", static_cast<long long>(track.size))));
+        out += '"';
+    }
+    if (track.durationMs > 0) {
+        out += " duration=\"";
+        out += FormatDuration(track.durationMs);
+        out += '"';
+    }
+    out += '>';
+    out += mediaBase;
+    out.append(number, static_cast<std::size_t>(std::snprintf(number, sizeof number, "%lld",
+                                                              static_cast<long long>(track.id))));
+    if (!track.streamExtension.empty()) {
+        out += '.';
+        out += track.streamExtension;
+    }
+    out += "</res>";
 }
 
-std::string DidlElement(const DidlObject& object) {
-    std::string out;
-    if (!object.container) {
-        // Only the media base stays marked: the item stands alone.
-        DidlObject alone = object;
-        alone.protocolInfoIndex = -1;
-        const DidlPieces keepBase{std::string_view(&kMediaBaseMark, 1), nullptr};
-        AppendItem(out, XmlText(object.id), XmlText(object.parentId), XmlText(object.refId),
-                   DidlItemBody(alone), keepBase);
-        return out;
-    }
+void AppendContainer(std::string& out, const ContainerFields& container,
+                     std::string_view mediaBase) {
     out += "<container id=\"";
-    AppendXmlText(out, object.id);
+    AppendXmlText(out, container.id);
     out += "\" parentID=\"";
-    AppendXmlText(out, object.parentId);
-    out += "\" restricted=\"1\"";
-    if (object.childCount >= 0)
-        out += " childCount=\"" + std::to_string(object.childCount) + '"';
-    out += " searchable=\"0\"><dc:title>";
-    AppendXmlText(out, object.title);
+    AppendXmlText(out, container.parentId);
+    out += "\" restricted=\"1\" childCount=\"";
+    char number[32];
+    out.append(number,
+               static_cast<std::size_t>(std::snprintf(
+                   number, sizeof number, "%lld", static_cast<long long>(container.childCount))));
+    out += "\" searchable=\"0\"><dc:title>";
+    AppendXmlText(out, container.title);
     out += "</dc:title><upnp:class>";
-    AppendXmlText(out, object.upnpClass);
+    AppendXmlText(out, container.upnpClass);
     out += "</upnp:class>";
-    AppendPeopleAndDate(out, object);
-    out += "</container>";
-    return out;
-}
-
-void AppendExpanded(std::string& out, std::string_view piece, const DidlPieces& pieces) {
-    std::size_t copied = 0;
-    for (std::size_t i = 0; i < piece.size(); ++i) {
-        const char c = piece[i];
-        if (c != kMediaBaseMark && c != kTrackClassMark && c != kProtocolInfoMark)
-            continue;
-        out.append(piece.data() + copied, i - copied);
-        if (c == kMediaBaseMark) {
-            out.append(pieces.mediaBase);
-        } else if (c == kTrackClassMark) {
-            out.append(kTrackClassElement);
-        } else if (i + 1 < piece.size()) {
-            const std::size_t index = static_cast<unsigned char>(piece[++i]) - 1u;
-            if (pieces.protocolInfos != nullptr && index < pieces.protocolInfos->size())
-                out.append((*pieces.protocolInfos)[index]);
-        }
-        copied = i + 1;
+    AppendElement(out, "dc:creator", container.artist);
+    AppendElement(out, "upnp:artist", container.artist);
+    if (container.year > 0 && container.year <= 9999)
+        AppendElement(out, "dc:date", DateOfYear(container.year));
+    if (!container.artExtension.empty()) {
+        out += "<upnp:albumArtURI>";
+        out += mediaBase;
+        out += "art/";
+        out.append(number,
+                   static_cast<std::size_t>(std::snprintf(
+                       number, sizeof number, "%lld", static_cast<long long>(container.artTrack))));
+        out += '.';
+        out += container.artExtension;
+        out += "</upnp:albumArtURI>";
     }
-    out.append(piece.data() + copied, piece.size() - copied);
+    out += "</container>";
 }
 
-void AppendItem(std::string& out, std::string_view id, std::string_view parentId,
-                std::string_view refId, std::string_view body, const DidlPieces& pieces) {
+std::string DateOfYear(int64_t year) {
+    if (year <= 0 || year > 9999)
+        return {};
+    char text[16];
+    std::snprintf(text, sizeof(text), "%04d-01-01", static_cast<int>(year));
+    return text;
+}
+
+void AppendItemStart(std::string& out, std::string_view id, std::string_view parentId,
+                     std::string_view refId) {
     out += "<item id=\"";
     out += id;
     out += "\" parentID=\"";
@@ -163,8 +146,6 @@ void AppendItem(std::string& out, std::string_view id, std::string_view parentId
         out += '"';
     }
     out += " restricted=\"1\">";
-    AppendExpanded(out, body, pieces);
-    out += "</item>";
 }
 
 std::string FormatDuration(int64_t milliseconds) {

@@ -1,11 +1,10 @@
-// DIDL-Lite text (ContentDirectory:1 Result), written by hand for speed: every value is escaped
-// once, when the library is loaded, and a Browse only concatenates the pieces.
+// DIDL-Lite text (ContentDirectory:1 Result), written by hand for speed: a Browse writes each track
+// and container it returns straight from the library view's compact values.
 #pragma once
 
 #include <cstdint>
 #include <string>
 #include <string_view>
-#include <vector>
 
 namespace harmona::mediad {
 
@@ -19,55 +18,43 @@ inline constexpr std::string_view kDidlBegin =
     "xmlns:dlna=\"urn:schemas-dlna-org:metadata-1-0/\">";
 inline constexpr std::string_view kDidlEnd = "</DIDL-Lite>";
 
-// Pre-written pieces hold control bytes (which escaped text never does) where a reply puts text
-// that is the same for many objects and so is stored once: the media base URL of the request
-// ("http://host:port/media/", so that one piece serves every address the server answers on),
-// a track's upnp:class element, and the res protocolInfo of one file type (the mark is followed
-// by one byte, 1 + the type's index in DidlPieces::protocolInfos).
-inline constexpr char kMediaBaseMark = '\x01';
-inline constexpr char kTrackClassMark = '\x02';
-inline constexpr char kProtocolInfoMark = '\x03';
-inline constexpr std::size_t kMaxSharedProtocolInfos = 255;
-
-struct DidlPieces {
-    std::string_view mediaBase;
-    const std::vector<std::string>* protocolInfos = nullptr;  // escaped
+// A music track as a reply writes it (LibraryView keeps these values compact).
+struct TrackFields {
+    int64_t id = 0;  // names its res ("<id>[.<streamExtension>]") and its art
+    std::string_view title, artist, album, genre;
+    int64_t year = 0, trackNo = 0, durationMs = 0, size = -1;
+    std::string_view protocolInfo;     // escaped
+    std::string_view streamExtension;  // "" for a stream name of the id alone
+    std::string_view artExtension;     // "jpg" or "png"; "" when it has no art
 };
 
-struct DidlObject {
-    bool container = false;
-    std::string id, parentId, refId, title, upnpClass;
-    int64_t childCount = -1;  // containers: written when >= 0
-    std::string artist, album, genre, date;
-    // Items only.
-    int64_t trackNo = 0, durationMs = 0, size = -1;
-    std::string resPath;       // the res URL after the media base
-    std::string artPath;       // the album art URL after the media base, "" when none
-    std::string mimeType;      // of the res
-    std::string dlnaFeatures;  // the protocolInfo's fourth field, "*" when empty    // >= 0: the
-                               // protocolInfo is DidlPieces::protocolInfos[protocolInfoIndex],
-                               // written as a mark.
-    int protocolInfoIndex = -1;
+// Appends a music track's children of <item>, from <dc:title> to </res>, its media URLs under
+// `mediaBase`.
+void AppendTrackItemBody(std::string& out, const TrackFields& track, std::string_view mediaBase);
+
+// A container as a reply writes it.
+struct ContainerFields {
+    std::string_view id, parentId, title, upnpClass, artist;
+    int64_t childCount = 0, year = 0;
+    int64_t artTrack = 0;           // its art is the art of this track
+    std::string_view artExtension;  // "jpg" or "png"; "" when it has no art
 };
+
+// Appends the whole <container> element, childCount included, its art URL under `mediaBase`.
+void AppendContainer(std::string& out, const ContainerFields& container,
+                     std::string_view mediaBase);
+
+// Appends the start tag <item id=.. parentID=.. [refID=..] restricted="1">; the ids must be plain
+// (object ids are: see ObjectIds.h).
+void AppendItemStart(std::string& out, std::string_view id, std::string_view parentId,
+                     std::string_view refId);
+inline constexpr std::string_view kItemEnd = "</item>";
+
+// dc:date of a year: "YYYY-01-01"; "" for a year outside 1 to 9999.
+std::string DateOfYear(int64_t year);
 
 // The escaped protocolInfo of a res: "http-get:*:<mime>:<fourth field>".
 std::string ProtocolInfo(const std::string& mimeType, const std::string& dlnaFeatures);
-
-// The whole element of `object` (<container> or <item>), media URLs marked with kMediaBaseMark.
-std::string DidlElement(const DidlObject& object);
-
-// An item's children, from <dc:title> to </res>, with marks for the shared pieces (a
-// musicTrack's class, a shared protocolInfo, the media base); the start tag, which names the
-// item's id and parent, is written per listing (AppendItem).
-std::string DidlItemBody(const DidlObject& object);
-
-// Appends <item id=.. parentID=.. [refID=..] restricted="1">body</item>; the ids must be plain
-// (object ids are: see ObjectIds.h); the marks in `body` are expanded from `pieces`.
-void AppendItem(std::string& out, std::string_view id, std::string_view parentId,
-                std::string_view refId, std::string_view body, const DidlPieces& pieces);
-
-// Appends `piece` with every mark replaced by what it stands for.
-void AppendExpanded(std::string& out, std::string_view piece, const DidlPieces& pieces);
 
 // "H:MM:SS.mmm" as res@duration wants it.
 std::string FormatDuration(int64_t milliseconds);

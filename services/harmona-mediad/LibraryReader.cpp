@@ -2,6 +2,8 @@
 
 #include <sys/stat.h>
 
+#include <algorithm>
+
 #include "common/util/Utf8.h"
 #include "platform/lib/sqlite/Database.h"
 #include "platform/medialib/LibrarySchema.h"
@@ -17,8 +19,14 @@ constexpr int kBusyTimeoutMs = 5000;
 // Values written before tags were cut when indexed are cut here too: no reply carries more.
 constexpr std::size_t kMaxValueBytes = 1024;
 
-std::string Cut(std::string_view text) {
-    return std::string(util::CutUtf8(text, kMaxValueBytes));
+TextRef Add(std::string& text, std::string_view value) {
+    const TextRef ref{static_cast<uint32_t>(text.size()), static_cast<uint32_t>(value.size())};
+    text += value;
+    return ref;
+}
+
+TextRef Cut(std::string& text, std::string_view value) {
+    return Add(text, util::CutUtf8(value, kMaxValueBytes));
 }
 
 bool HasColumn(Database& db, const char* column) {
@@ -45,6 +53,16 @@ bool ReadLibraryRows(const std::string& dbPath, LibraryRows& out) {
                               : static_cast<uint32_t>(st.st_mtime) & 0x7fffffffU;
     const std::string extra = std::string(HasColumn(db, "size") ? "size" : "NULL") + ", " +
                               (HasColumn(db, "art_path") ? "art_path" : "NULL");
+    // The rows are counted first: a vector grown row by row holds its old block and one twice
+    // as large at once while it moves them, the peak of a load.
+    Statement rowCount = db.Prepare(
+        "SELECT COUNT(*), SUM(LENGTH(CAST(path AS BLOB)) + LENGTH(CAST(title AS BLOB)) + "
+        "LENGTH(CAST(artist AS BLOB)) + LENGTH(CAST(album AS BLOB)) + "
+        "LENGTH(CAST(album_artist AS BLOB)) + LENGTH(CAST(genre AS BLOB))) FROM track");
+    if (!rowCount || rowCount.Step() != SQLITE_ROW)
+        return false;
+    out.rows.reserve(static_cast<std::size_t>(std::max<int64_t>(0, rowCount.ColumnInt64(0))));
+    out.text.reserve(static_cast<std::size_t>(std::max<int64_t>(0, rowCount.ColumnInt64(1))));
     Statement stmt = db.Prepare(
         "SELECT id, path, title, artist, album, album_artist, genre, year, track_no, disc_no, "
         "duration_ms, added, " +
@@ -55,20 +73,20 @@ bool ReadLibraryRows(const std::string& dbPath, LibraryRows& out) {
     while ((step = stmt.Step()) == SQLITE_ROW) {
         LibraryRow row;
         row.id = stmt.ColumnInt64(0);
-        row.path = std::string(stmt.ColumnText(1));
-        row.title = Cut(stmt.ColumnText(2));
-        row.artist = Cut(stmt.ColumnText(3));
-        row.album = Cut(stmt.ColumnText(4));
-        row.albumArtist = Cut(stmt.ColumnText(5));
-        row.genre = Cut(stmt.ColumnText(6));
+        row.path = Add(out.text, stmt.ColumnText(1));
+        row.title = Cut(out.text, stmt.ColumnText(2));
+        row.artist = Cut(out.text, stmt.ColumnText(3));
+        row.album = Cut(out.text, stmt.ColumnText(4));
+        row.albumArtist = Cut(out.text, stmt.ColumnText(5));
+        row.genre = Cut(out.text, stmt.ColumnText(6));
         row.year = stmt.ColumnInt64(7);
         row.trackNo = stmt.ColumnInt64(8);
         row.discNo = stmt.ColumnInt64(9);
         row.durationMs = stmt.ColumnInt64(10);
         row.added = stmt.ColumnInt64(11);
         row.size = stmt.ColumnType(12) == SQLITE_NULL ? -1 : stmt.ColumnInt64(12);
-        row.artPath = std::string(stmt.ColumnText(13));
-        out.rows.push_back(std::move(row));
+        row.artPath = Add(out.text, stmt.ColumnText(13));
+        out.rows.push_back(row);
     }
     return step == SQLITE_DONE && db.Execute("COMMIT") == SQLITE_OK;
 }

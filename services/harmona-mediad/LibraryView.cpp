@@ -4,6 +4,7 @@
 #include <atomic>
 #include <utility>
 
+#include "services/harmona-mediad/DidlWriter.h"
 #include "services/harmona-mediad/LibraryReader.h"
 #include "services/harmona-mediad/LibraryViewBuilder.h"
 
@@ -36,19 +37,68 @@ std::unique_ptr<LibraryView> LibraryView::Load(const std::string& dbPath,
     return view;
 }
 
-const ViewContainer* LibraryView::FindContainer(const std::string& id) const {
+const ViewContainer* LibraryView::FindContainer(std::string_view id) const {
     const uint32_t index = ContainerIndex(id);
     return index == kNoIndex ? nullptr : &containers_[index];
 }
 
-uint32_t LibraryView::ContainerIndex(const std::string& id) const {
-    const auto found = containerIndex_.find(id);
-    return found == containerIndex_.end() ? kNoIndex : found->second;
+uint32_t LibraryView::ContainerIndex(std::string_view id) const {
+    const auto found = std::lower_bound(
+        containersById_.begin(), containersById_.end(), id,
+        [&](uint32_t index, std::string_view x) { return Text(containers_[index].id) < x; });
+    return found == containersById_.end() || Text(containers_[*found].id) != id ? kNoIndex : *found;
+}
+
+void LibraryView::AppendContainerElement(std::string& out, uint32_t index,
+                                         std::string_view mediaBase) const {
+    static constexpr const char* kClasses[] = {
+        "object.container.storageFolder", "object.container.album.musicAlbum",
+        "object.container.person.musicArtist", "object.container.genre.musicGenre"};
+    const ViewContainer& container = containers_[index];
+    ContainerFields fields;
+    fields.id = Text(container.id);
+    fields.parentId = container.parent == kNoIndex ? std::string_view("-1")
+                                                   : Text(containers_[container.parent].id);
+    fields.title = Text(container.title);
+    fields.upnpClass = kClasses[static_cast<int>(container.kind)];
+    fields.childCount = container.childCount;
+    if (container.album()) {
+        fields.artist = Text(container.artist);
+        fields.year = container.year;
+    }
+    fields.artTrack = container.artTrack;
+    fields.artExtension = container.art == TrackArt::png   ? "png"
+                          : container.art == TrackArt::jpg ? "jpg"
+                                                           : "";
+    AppendContainer(out, fields, mediaBase);
 }
 
 const ViewTrack* LibraryView::FindTrack(int64_t id) const {
-    const auto found = trackIndex_.find(id);
-    return found == trackIndex_.end() ? nullptr : &tracks_[found->second];
+    const auto found =
+        std::lower_bound(tracks_.begin(), tracks_.end(), id,
+                         [](const ViewTrack& track, int64_t x) { return track.id < x; });
+    return found == tracks_.end() || found->id != id ? nullptr : &*found;
+}
+
+void LibraryView::AppendTrackBody(std::string& out, const ViewTrack& track,
+                                  std::string_view mediaBase) const {
+    TrackFields fields;
+    fields.id = track.id;
+    fields.title = Text(track.title);
+    fields.artist = Text(track.artist);
+    fields.album = Text(track.album);
+    fields.genre = Text(track.genre);
+    fields.year = track.year;
+    fields.trackNo = track.trackNo;
+    fields.durationMs = track.durationMs;
+    fields.size = track.size;
+    const ViewFileType& type = fileTypes_[track.fileType];
+    fields.protocolInfo = type.protocolInfo;
+    fields.streamExtension = type.streamExtension;
+    fields.artExtension = track.art == TrackArt::png   ? "png"
+                          : track.art == TrackArt::jpg ? "jpg"
+                                                       : "";
+    AppendTrackItemBody(out, fields, mediaBase);
 }
 
 bool LibraryView::Lists(uint32_t container, const ViewTrack& track) const {

@@ -6,6 +6,7 @@
 #include <numeric>
 #include <tuple>
 
+#include "platform/medialib/MediaFiles.h"
 #include "services/harmona-mediad/ObjectIds.h"
 
 namespace harmona::mediad {
@@ -33,48 +34,108 @@ uint64_t SplitMix(uint64_t& state) {
 
 }  // namespace
 
-uint32_t LibraryViewBuilder::AddContainer(const std::string& id, const std::string& parentId,
-                                          const std::string& title, const char* upnpClass) {
+uint32_t LibraryViewBuilder::AddContainer(const std::string& id, uint32_t parent,
+                                          const std::string& title, ContainerKind kind) {
     const auto index = static_cast<uint32_t>(view_.containers_.size());
     ViewContainer container;
-    container.id = id;
-    container.parentId = parentId;
-    container.title = title;
-    view_.containers_.push_back(std::move(container));
-    containerClass_.push_back(upnpClass);
-    view_.containerIndex_.emplace(id, index);
+    container.id = AddText(id);
+    container.parent = parent;
+    container.title = SharedText(title);
+    container.kind = kind;
+    view_.containers_.push_back(container);
+    children_.emplace_back();
     return index;
 }
 
+void LibraryViewBuilder::AddChild(uint32_t container, ViewChild child) {
+    children_[container].push_back(child);
+}
+
+void LibraryViewBuilder::FlattenChildren() {
+    std::size_t total = 0;
+    for (const auto& children : children_)
+        total += children.size();
+    view_.children_.reserve(total);
+    for (uint32_t c = 0; c < children_.size(); ++c) {
+        ViewContainer& container = view_.containers_[c];
+        container.firstChild = static_cast<uint32_t>(view_.children_.size());
+        container.childCount = static_cast<uint32_t>(children_[c].size());
+        view_.children_.insert(view_.children_.end(), children_[c].begin(), children_[c].end());
+        std::vector<ViewChild>().swap(children_[c]);
+    }
+    children_.clear();
+    children_.shrink_to_fit();
+    view_.containers_.shrink_to_fit();
+}
+
 void LibraryViewBuilder::Build() {
-    AddContainer(kRootId, "-1", "Music", kFolderClass);
+    AddContainer(kRootId, kNoIndex, "Music", ContainerKind::folder);
     for (const Category& category : kCategories) {
-        const uint32_t index = AddContainer(category.id, kRootId, category.title, kFolderClass);
+        const uint32_t index = AddContainer(category.id, 0, category.title, ContainerKind::folder);
         category_.push_back(index);
-        view_.containers_[0].children.push_back({index, false});
+        AddChild(0, {index, false});
     }
     view_.allMusic_ = category_[0];
     view_.random_ = category_[5];
     view_.tracks_.resize(rows_.size());
+    std::size_t titleBytes = 0;
+    for (const LibraryRow& row : rows_)
+        titleBytes += row.title.size;
+    // Room for the titles and, as far as the rows' text goes, the containers' ids and titles:
+    // a block grown by doubling would hold its old and its new copy at once. What stays unused is
+    // never touched, and so never resident, and is given back below.
+    view_.text_.reserve(titleBytes + rowText_.size());
     for (std::size_t i = 0; i < rows_.size(); ++i) {
         const LibraryRow& row = rows_[i];
         ViewTrack& track = view_.tracks_[i];
         track.id = row.id;
-        track.title = row.title;
-        track.artist = row.artist;
-        track.album = row.album;
+        track.title = AddText(R(row.title));
+        track.artist = SharedText(R(row.artist));
+        track.album = SharedText(R(row.album));
+        track.genre = SharedText(R(row.genre));
         track.year = row.year;
         track.trackNo = row.trackNo;
-        view_.trackIndex_.emplace(row.id, static_cast<uint32_t>(i));
+        track.durationMs = row.durationMs;
+        track.size = row.size;
     }
+    TypeTracks();
     RankTitles();
     BuildFolders();
     BuildAlbums();
     BuildGenres();
     BuildAllMusicAndRandom();
-    RenderTracks();
-    RenderContainers();
+    // The rows are not needed past here: given back before the children are gathered into one
+    // array and the hashes made, the most the load holds at once.
+    std::vector<LibraryRow>().swap(rows_);
+    std::string().swap(rowText_);
+    decltype(sharedText_)().swap(sharedText_);
+    decltype(folders_)().swap(folders_);
+    decltype(folderChildren_)().swap(folderChildren_);
+    decltype(albums_)().swap(albums_);
+    decltype(byTitle_)().swap(byTitle_);
+    decltype(titleRank_)().swap(titleRank_);
+    // The text block to its size: the copy is made where the rows no longer take room.
+    view_.text_.shrink_to_fit();
+    FlattenChildren();
+    IndexContainers();
     HashContents();
+}
+
+TextRef LibraryViewBuilder::AddText(std::string_view text) {
+    TextRef ref{static_cast<uint32_t>(view_.text_.size()), static_cast<uint32_t>(text.size())};
+    view_.text_ += text;
+    return ref;
+}
+
+TextRef LibraryViewBuilder::SharedText(std::string_view text) {
+    if (text.empty())
+        return {};
+    const auto found = sharedText_.find(std::string(text));
+    if (found != sharedText_.end())
+        return found->second;
+    const TextRef ref = AddText(text);
+    sharedText_.emplace(std::string(text), ref);
+    return ref;
 }
 
 // --- Folders: the share's tree, each folder's subfolders (by name) before its tracks (by path).
@@ -88,8 +149,7 @@ uint32_t LibraryViewBuilder::Folder(const std::string& relative) {
     const std::size_t slash = relative.rfind('/');
     const uint32_t parent = Folder(slash == std::string::npos ? "" : relative.substr(0, slash));
     const std::string name = slash == std::string::npos ? relative : relative.substr(slash + 1);
-    const uint32_t index =
-        AddContainer(FolderId(relative), view_.containers_[parent].id, name, kFolderClass);
+    const uint32_t index = AddContainer(FolderId(relative), parent, name, ContainerKind::folder);
     folders_.emplace(relative, index);
     folderChildren_.resize(view_.containers_.size());
     folderChildren_[parent].emplace_back(name, index);
@@ -98,11 +158,11 @@ uint32_t LibraryViewBuilder::Folder(const std::string& relative) {
 
 // The folder container of a track's path; kNoIndex for a path outside the share or one that is
 // not a plain relative path (those show in the other views only).
-uint32_t LibraryViewBuilder::FolderOf(const std::string& path) {
+uint32_t LibraryViewBuilder::FolderOf(std::string_view path) {
     const std::string prefix = share_ + "/";
     if (path.compare(0, prefix.size(), prefix) != 0)
         return kNoIndex;
-    const std::string relative = path.substr(prefix.size());
+    const std::string relative(path.substr(prefix.size()));
     const std::size_t slash = relative.rfind('/');
     const std::string folder = slash == std::string::npos ? "" : relative.substr(0, slash);
     std::size_t start = 0;
@@ -123,10 +183,10 @@ void LibraryViewBuilder::BuildFolders() {
     std::vector<uint32_t> byPath(rows_.size());
     std::iota(byPath.begin(), byPath.end(), 0);
     std::sort(byPath.begin(), byPath.end(),
-              [&](uint32_t a, uint32_t b) { return rows_[a].path < rows_[b].path; });
+              [&](uint32_t a, uint32_t b) { return R(rows_[a].path) < R(rows_[b].path); });
     std::vector<std::vector<uint32_t>> tracksOf;
     for (const uint32_t i : byPath) {
-        const uint32_t folder = FolderOf(rows_[i].path);
+        const uint32_t folder = FolderOf(R(rows_[i].path));
         if (folder == kNoIndex)
             continue;
         view_.tracks_[i].folderIn = folder;
@@ -142,7 +202,7 @@ void LibraryViewBuilder::BuildFolders() {
             continue;
         std::sort(subfolders.begin(), subfolders.end());
         for (const auto& [name, index] : subfolders)
-            view_.containers_[folder].children.push_back({index, false});
+            AddChild(folder, {index, false});
         AddTrackChildren(folder, tracksOf[folder]);
     }
 }
@@ -154,7 +214,7 @@ void LibraryViewBuilder::RankTitles() {
     byTitle_.resize(rows_.size());
     std::iota(byTitle_.begin(), byTitle_.end(), 0);
     std::sort(byTitle_.begin(), byTitle_.end(), [&](uint32_t a, uint32_t b) {
-        const int order = CompareNoCase(rows_[a].title, rows_[b].title);
+        const int order = CompareNoCase(R(rows_[a].title), R(rows_[b].title));
         return order != 0 ? order < 0 : rows_[a].id < rows_[b].id;
     });
     titleRank_.resize(rows_.size());
@@ -173,7 +233,7 @@ void LibraryViewBuilder::SortTracks(std::vector<uint32_t>& tracks, bool byDisc) 
 }
 
 void LibraryViewBuilder::AddTrackChildren(uint32_t container, const std::vector<uint32_t>& tracks) {
-    auto& children = view_.containers_[container].children;
+    auto& children = children_[container];
     children.reserve(children.size() + tracks.size());
     for (const uint32_t track : tracks)
         children.push_back({track, true});
@@ -183,19 +243,19 @@ void LibraryViewBuilder::BuildAlbums() {
     std::map<std::pair<std::string, std::string>, uint32_t> byKey;
     for (uint32_t i = 0; i < rows_.size(); ++i) {
         const LibraryRow& row = rows_[i];
-        if (row.album.empty())
+        if (row.album.size == 0)
             continue;
-        const std::string& albumArtist = !row.albumArtist.empty() ? row.albumArtist : row.artist;
-        const auto [it, added] =
-            byKey.emplace(std::make_pair(row.album, albumArtist), albums_.size());
+        const std::string name(R(row.album));
+        const std::string albumArtist(R(row.albumArtist.size != 0 ? row.albumArtist : row.artist));
+        const auto [it, added] = byKey.emplace(std::make_pair(name, albumArtist), albums_.size());
         if (added)
-            albums_.push_back(LibraryAlbum{row.album, albumArtist, {}, 0, 0, {}, 0});
+            albums_.push_back(LibraryAlbum{name, albumArtist, {}, 0, 0, {}, 0});
         LibraryAlbum& album = albums_[it->second];
         album.tracks.push_back(i);
         album.year = std::max(album.year, row.year);
         album.latestAdded = std::max(album.latestAdded, row.added);
-        if (album.artPath.empty() && !row.artPath.empty()) {
-            album.artPath = row.artPath;
+        if (album.artPath.empty() && row.artPath.size != 0) {
+            album.artPath = std::string(R(row.artPath));
             album.artTrack = row.id;
         }
     }
@@ -211,13 +271,16 @@ void LibraryViewBuilder::BuildAlbums() {
 
     const auto addAlbum = [&](const LibraryAlbum& album, const std::string& id, uint32_t parent,
                               uint32_t ViewTrack::*in) {
-        const uint32_t index =
-            AddContainer(id, view_.containers_[parent].id, album.name, kAlbumClass);
+        const uint32_t index = AddContainer(id, parent, album.name, ContainerKind::album);
         ViewContainer& container = view_.containers_[index];
-        container.album = true;
-        container.artist = album.albumArtist;
+        container.artist = SharedText(album.albumArtist);
         container.year = album.year;
-        view_.containers_[parent].children.push_back({index, false});
+        if (!album.artPath.empty()) {
+            container.art =
+                medialib::LowerExtension(album.artPath) == "png" ? TrackArt::png : TrackArt::jpg;
+            container.artTrack = album.artTrack;
+        }
+        AddChild(parent, {index, false});
         AddTrackChildren(index, album.tracks);
         for (const uint32_t track : album.tracks)
             view_.tracks_[track].*in = index;
@@ -240,9 +303,9 @@ void LibraryViewBuilder::BuildAlbums() {
         return names != 0 ? names < 0 : a->first < b->first;
     });
     for (const auto* artist : artists) {
-        const uint32_t index =
-            AddContainer(ArtistId(artist->first), kAlbumArtistsId, artist->first, kArtistClass);
-        view_.containers_[category_[3]].children.push_back({index, false});
+        const uint32_t index = AddContainer(ArtistId(artist->first), category_[3], artist->first,
+                                            ContainerKind::artist);
+        AddChild(category_[3], {index, false});
         for (const uint32_t a : artist->second)
             addAlbum(albums_[a], ArtistAlbumId(albums_[a].albumArtist, albums_[a].name), index,
                      &ViewTrack::artistAlbumIn);
@@ -261,8 +324,8 @@ void LibraryViewBuilder::BuildAlbums() {
 void LibraryViewBuilder::BuildGenres() {
     std::map<std::string, std::vector<uint32_t>> byGenre;
     for (uint32_t i = 0; i < rows_.size(); ++i) {
-        if (!rows_[i].genre.empty())
-            byGenre[rows_[i].genre].push_back(i);
+        if (rows_[i].genre.size != 0)
+            byGenre[std::string(R(rows_[i].genre))].push_back(i);
     }
     std::vector<std::pair<const std::string, std::vector<uint32_t>>*> genres;
     for (auto& entry : byGenre)
@@ -273,8 +336,8 @@ void LibraryViewBuilder::BuildGenres() {
     });
     for (auto* genre : genres) {
         const uint32_t index =
-            AddContainer(GenreId(genre->first), kGenresId, genre->first, kGenreClass);
-        view_.containers_[category_[4]].children.push_back({index, false});
+            AddContainer(GenreId(genre->first), category_[4], genre->first, ContainerKind::genre);
+        AddChild(category_[4], {index, false});
         SortTracks(genre->second, false);
         AddTrackChildren(index, genre->second);
         for (const uint32_t track : genre->second)

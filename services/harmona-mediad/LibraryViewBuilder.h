@@ -1,8 +1,8 @@
 // How a LibraryView is made from the rows of library.db, one job per file: the container builders
 // (LibraryViewBuilder.cpp: the root and its categories, folders, albums with album artists and
-// latest albums, genres, all music and the random draw), the DIDL-Lite rendering of every track and
-// container (LibraryViewDidl.cpp), and the content hashes that tell which containers changed
-// (LibraryViewChanges.cpp). Used by LibraryView::Load only.
+// latest albums, genres, all music and the random draw), what the DIDL-Lite of every track and
+// container is written from (LibraryViewDidl.cpp), and the content hashes that tell which
+// containers changed (LibraryViewChanges.cpp). Used by LibraryView::Load only.
 #pragma once
 
 #include <cstdint>
@@ -16,12 +16,6 @@
 
 namespace harmona::mediad {
 
-// The upnp:class of each kind of container; the rendering tells albums by theirs.
-inline constexpr const char* kFolderClass = "object.container.storageFolder";
-inline constexpr const char* kAlbumClass = "object.container.album.musicAlbum";
-inline constexpr const char* kArtistClass = "object.container.person.musicArtist";
-inline constexpr const char* kGenreClass = "object.container.genre.musicGenre";
-
 // An album as the rows make it: by album name and album artist.
 struct LibraryAlbum {
     std::string name, albumArtist;
@@ -34,7 +28,10 @@ struct LibraryAlbum {
 class LibraryViewBuilder {
   public:
     LibraryViewBuilder(LibraryView& view, std::string share, LibraryRows rows)
-        : view_(view), share_(std::move(share)), rows_(std::move(rows.rows)) {
+        : view_(view),
+          share_(std::move(share)),
+          rows_(std::move(rows.rows)),
+          rowText_(std::move(rows.text)) {
         view_.updateId_ = rows.updateId;
     }
 
@@ -43,9 +40,12 @@ class LibraryViewBuilder {
 
   private:
     // Containers (LibraryViewBuilder.cpp).
-    uint32_t AddContainer(const std::string& id, const std::string& parentId,
-                          const std::string& title, const char* upnpClass);
-    uint32_t FolderOf(const std::string& path);
+    uint32_t AddContainer(const std::string& id, uint32_t parent, const std::string& title,
+                          ContainerKind kind);
+    void AddChild(uint32_t container, ViewChild child);
+    // The children gathered per container, moved into the view's one array.
+    void FlattenChildren();
+    uint32_t FolderOf(std::string_view path);
     uint32_t Folder(const std::string& relative);
     void BuildFolders();
     void BuildAlbums();
@@ -54,23 +54,32 @@ class LibraryViewBuilder {
     void RankTitles();
     void SortTracks(std::vector<uint32_t>& tracks, bool byDisc) const;
     void AddTrackChildren(uint32_t container, const std::vector<uint32_t>& tracks);
-    // DIDL-Lite (LibraryViewDidl.cpp).
-    void RenderTracks();
-    void RenderContainers();
-    std::string AlbumArtPath(const LibraryAlbum& album) const;
+    // Text kept in the view's block: every title once, each distinct artist, album and genre once
+    // for all the tracks that share it.
+    TextRef AddText(std::string_view text);
+    TextRef SharedText(std::string_view text);
+    // DIDL-Lite (LibraryViewDidl.cpp): the file type and art of every track, and the containers
+    // in the order of their ids.
+    void TypeTracks();
+    void IndexContainers();
     // Content hashes (LibraryViewChanges.cpp); after the rendering, which they cover.
     void HashContents();
 
     LibraryView& view_;
     std::string share_;
     std::vector<LibraryRow> rows_;
+    std::string rowText_;
+    std::string_view R(TextRef ref) const {
+        return std::string_view(rowText_).substr(ref.offset, ref.size);
+    }
     std::vector<uint32_t> byTitle_;    // every track, by title (NOCASE) and id
     std::vector<uint32_t> titleRank_;  // each track's place in byTitle_
     std::vector<uint32_t> category_;   // container index of each category row
     std::unordered_map<std::string, uint32_t> folders_;
     std::vector<std::vector<std::pair<std::string, uint32_t>>> folderChildren_;  // per container
-    std::vector<std::string> containerClass_;
+    std::vector<std::vector<ViewChild>> children_;  // per container, while building
     std::vector<LibraryAlbum> albums_;
+    std::unordered_map<std::string, TextRef> sharedText_;
 };
 
 }  // namespace harmona::mediad

@@ -20,17 +20,29 @@ uint64_t Combine(uint64_t hash, uint64_t part) {
 }  // namespace
 
 void LibraryViewBuilder::HashContents() {
-    std::vector<uint64_t> trackHash(rows_.size());
-    for (std::size_t i = 0; i < rows_.size(); ++i)
-        trackHash[i] = Combine(HashOf(view_.tracks_[i].body), static_cast<uint64_t>(rows_[i].id));
+    // A track's hash covers its DIDL-Lite as a reply writes it.
+    std::vector<uint64_t> trackHash(view_.tracks_.size());
+    std::string body;
+    for (std::size_t i = 0; i < view_.tracks_.size(); ++i) {
+        body.clear();
+        view_.AppendTrackBody(body, view_.tracks_[i], std::string_view());
+        trackHash[i] = Combine(HashOf(body), static_cast<uint64_t>(view_.tracks_[i].id));
+    }
     // Children before parents do not exist in every view, so hash in a second pass: a container's
     // hash covers its children's elements (their titles and counts) and its tracks.
-    for (ViewContainer& container : view_.containers_) {
-        uint64_t hash = HashOf(container.element);
-        for (const ViewChild& child : container.children) {
-            const uint64_t part = child.track ? trackHash[child.index]
-                                              : HashOf(view_.containers_[child.index].element);
-            hash = Combine(hash, part);
+    std::vector<uint64_t> elementHash(view_.containers_.size());
+    for (uint32_t c = 0; c < view_.containers_.size(); ++c) {
+        body.clear();
+        view_.AppendContainerElement(body, c, std::string_view());
+        elementHash[c] = HashOf(body);
+    }
+    for (uint32_t c = 0; c < view_.containers_.size(); ++c) {
+        ViewContainer& container = view_.containers_[c];
+        uint64_t hash = elementHash[c];
+        const ViewChild* children = view_.ChildrenOf(container);
+        for (uint32_t i = 0; i < container.childCount; ++i) {
+            const ViewChild& child = children[i];
+            hash = Combine(hash, child.track ? trackHash[child.index] : elementHash[child.index]);
         }
         container.contentHash = hash;
     }
@@ -42,12 +54,14 @@ std::string LibraryView::ChangedContainers(const LibraryView* previous, std::siz
     for (const ViewContainer& container : containers_) {
         if (listed == limit)
             break;
-        const ViewContainer* before = previous ? previous->FindContainer(container.id) : nullptr;
+        const std::string_view id = Text(container.id);
+        const ViewContainer* before = previous ? previous->FindContainer(id) : nullptr;
         if (before != nullptr && before->contentHash == container.contentHash)
             continue;
         if (!changed.empty())
             changed += ',';
-        changed += container.id + "," + std::to_string(updateId_);
+        changed += id;
+        changed += "," + std::to_string(updateId_);
         ++listed;
     }
     return changed;

@@ -365,6 +365,47 @@ TEST(Paging, AReplyEndsNearItsByteBudgetAndTheNextPagesBringTheRest) {
     EXPECT_GE(pages, 2);
 }
 
+TEST(Paging, AReplyHoldsAtMostItsObjectCountAndNeverPassesItsByteBudget) {
+    // Small objects (a title and a res): 12,000 of them stay within the byte budget.
+    std::vector<HandTrack> tracks = ManyTracks(12000);
+    for (HandTrack& track : tracks) {
+        track.artist.clear();
+        track.album.clear();
+        track.genre.clear();
+        track.year = 0;
+        track.trackNo = 0;
+    }
+    WriteLibrary(tracks);
+    const ContentDirectory directory = Directory();
+    const BrowseResult whole = Browse(directory, "music_all");
+    ASSERT_EQ(whole.error, 0);
+    EXPECT_EQ(whole.totalMatches, 12000u);
+    EXPECT_EQ(whole.numberReturned, harmona::mediad::kMaxResultObjects);
+    EXPECT_EQ(Objects(whole).size(), harmona::mediad::kMaxResultObjects);
+    EXPECT_LE(whole.didl.size(), harmona::mediad::kMaxResultBytes);
+    // A count asked for past the cut is cut the same way; the rest comes on the next page.
+    const BrowseResult asked = Browse(directory, "music_all", false, 0, 11000);
+    EXPECT_EQ(asked.numberReturned, harmona::mediad::kMaxResultObjects);
+    const BrowseResult rest = Browse(directory, "music_all", false, asked.numberReturned, 0);
+    EXPECT_EQ(rest.numberReturned, 12000u - harmona::mediad::kMaxResultObjects);
+    EXPECT_EQ(Objects(rest).size(), rest.numberReturned);
+}
+
+TEST(Paging, ObjectsOfLongTitlesFillAReplyUpToItsByteBudgetAndNoFurther) {
+    std::vector<HandTrack> tracks = ManyTracks(6000);
+    for (HandTrack& track : tracks)
+        track.title += " " + std::string(2000, 'y');
+    WriteLibrary(tracks);
+    const ContentDirectory directory = Directory();
+    const BrowseResult first = Browse(directory, "music_all");
+    ASSERT_EQ(first.error, 0);
+    EXPECT_LE(first.didl.size(), harmona::mediad::kMaxResultBytes);
+    // Nearly full: less than one more object would have fitted.
+    EXPECT_GT(first.didl.size() + 2 * 2100, harmona::mediad::kMaxResultBytes);
+    EXPECT_LT(first.numberReturned, 6000u);
+    EXPECT_EQ(Objects(first).size(), first.numberReturned);
+}
+
 TEST(RandomContainer, PagesOfOneListingShowEveryDrawnTrackOnceInOneOrder) {
     WriteLibrary(ManyTracks(300));
     const ContentDirectory directory = Directory();
