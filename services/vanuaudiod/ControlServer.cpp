@@ -48,6 +48,14 @@ ControlServer::~ControlServer() {
     }
 }
 
+bool ControlServer::ListenAsCurrentUser(std::string& error) {
+    if (listen(listenFd_.Get(), SOMAXCONN) != 0) {
+        error = std::string("listen: ") + std::strerror(errno);
+        return false;
+    }
+    return true;
+}
+
 bool ControlServer::Open(std::string& error) {
     sockaddr_un address;
     if (!FillAddress(options_.socketPath, address)) {
