@@ -3,12 +3,23 @@
 #include <syslog.h>
 
 #include <cstdio>
+#include <cstring>
 
 #include "platform/medialib/MediaFiles.h"
 #include "platform/paths/PlatformPaths.h"
 #include "services/harmona-index/Indexer.h"
 
-int main() {
+int main(int argc, char** argv) {
+    if (argc == 2 && std::strcmp(argv[1], "--help") == 0) {
+        std::printf(
+            "usage: harmona-index\n"
+            "One scan of the audio share (audio_share_path of audio.conf, else %s) into the\n"
+            "music library, %s. Prints one summary line and exits 0, or 1 on failure.\n"
+            "Run it as the library's account (harmona), which owns the library; the media\n"
+            "server keeps the library in step with the share on its own.\n",
+            harmona::paths::kDefaultAudioShare, harmona::paths::kLibraryDb);
+        return 0;
+    }
     openlog("harmona-index", LOG_PID, LOG_DAEMON);
     const std::string share = harmona::medialib::AudioSharePath();
     const harmona::index::IndexReport report =

@@ -1,13 +1,14 @@
 // The server's change of user: it answers no request as root.
 #pragma once
 
+#include <string>
+
 namespace harmona::mediad {
 
-inline constexpr const char* kUnprivilegedUser = "nobody";
-
-// Gives up root for good: supplementary groups, group, user (kUnprivilegedUser, or uid and gid
-// 65534 when the system has no such user). True at once when the process is not root (a
-// developer's run); false when a step fails, and the process must not go on serving then.
-bool DropRoot();
+// Gives up root for good: supplementary groups, group, user (the library's account, "harmona").
+// True at once when the process is not root (a developer's run, or a service manager that started
+// it as the account already). False with `error` set when the account does not exist or a step
+// fails; the process must not go on serving then, and never falls back to another account.
+bool DropRoot(std::string& error);
 
 }  // namespace harmona::mediad

@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include <cstdlib>
+#include <string>
 
 #include "platform/lib/gupnp/MainLoop.h"
 #include "services/harmona-mediad/Privileges.h"
@@ -35,8 +36,9 @@ int RunServer(const MediaServerOptions& options, int readyFd) {
     // No user session here: keep GIO from looking for dconf in root's home after the drop.
     setenv("GSETTINGS_BACKEND", "memory", 1);
     setenv("GIO_USE_VFS", "local", 1);
-    if (!DropRoot()) {
-        syslog(LOG_ERR, "cannot change to user %s; not serving as root", kUnprivilegedUser);
+    std::string error;
+    if (!DropRoot(error)) {
+        syslog(LOG_ERR, "cannot start: %s", error.c_str());
         return 1;
     }
     // The server ends with the process that keeps its pid file, however that one ends. Set after

@@ -48,6 +48,14 @@ ControlServer::~ControlServer() {
     }
 }
 
+bool ControlServer::ListenAsCurrentUser(std::string& error) {
+    if (listen(listenFd_.Get(), SOMAXCONN) != 0) {
+        error = std::string("listen: ") + std::strerror(errno);
+        return false;
+    }
+    return true;
+}
+
 bool ControlServer::Open(std::string& error) {
     sockaddr_un address;
     if (!FillAddress(options_.socketPath, address)) {
@@ -77,7 +85,12 @@ bool ControlServer::Open(std::string& error) {
         socketIno_ = own.st_ino;
     }
     // Owned by the daemon's account (which removes it at exit), in the web server's group.
-    if (lchown(options_.socketPath.c_str(), options_.socketOwner, options_.socketGroup) != 0 ||
+    // Nothing to change when both are "as created" (a daemon started as its account, whose
+    // confinement may refuse the chown calls altogether).
+    const bool keepOwner = options_.socketOwner == static_cast<uid_t>(-1) &&
+                           options_.socketGroup == static_cast<gid_t>(-1);
+    if ((!keepOwner &&
+         lchown(options_.socketPath.c_str(), options_.socketOwner, options_.socketGroup) != 0) ||
         chmod(options_.socketPath.c_str(), options_.socketMode) != 0 ||
         listen(listenFd_.Get(), SOMAXCONN) != 0) {
         error = std::string("chown/chmod/listen: ") + std::strerror(errno);

@@ -41,6 +41,11 @@ class ControlServer {
     // False with `error` set.
     bool Open(std::string& error);
 
+    // Listens again, so that the credentials a client reads from the socket (SO_PEERCRED, which
+    // the kernel takes at listen time) are this process's current ones: called after a change of
+    // user, the clients see the daemon's account and not root. False with `error` set.
+    bool ListenAsCurrentUser(std::string& error);
+
     // Runs until SIGTERM or SIGINT arrives (the caller blocks them in every thread first) or
     // RequestStop() is called.
     void Run();

@@ -74,7 +74,9 @@ void RaiseDescriptorLimit() {
 
 // Started as root, the daemon opens its socket as root (for the group and the replacement of a
 // stale socket) and then runs as its own account: nothing it does afterwards needs privileges,
-// and what it reads comes from strangers on the network.
+// and what it reads comes from strangers on the network. Without that account it does not start.
+// Installed, the service manager starts it as the account already; the socket then keeps the
+// account's own group, of which the web server's user is a member.
 struct Account {
     bool dropPrivileges = false;
     uid_t uid = static_cast<uid_t>(-1);
@@ -86,8 +88,8 @@ bool ChooseAccount(Account& account, std::string& error) {
     if (geteuid() != 0)
         return true;  // unprivileged already: socket as created
     if (!harmona::paths::LookUpDaemonAccount(account.uid, account.gid)) {
-        error = std::string("neither account ") + harmona::paths::kDaemonUser + " nor " +
-                harmona::paths::kDaemonFallbackUser + " exists";
+        error = std::string("the account ") + harmona::paths::kDaemonUser +
+                " does not exist; not running as root or as any other account";
         return false;
     }
     account.dropPrivileges = true;
@@ -121,6 +123,19 @@ int Fail(const std::string& error) {
 
 int main(int argc, char** argv) {
     Arguments arguments;
+    if (argc == 2 && std::strcmp(argv[1], "--help") == 0) {
+        std::printf(
+            "usage: vanuaudiod [--interface NAME] [--socket PATH] [--verbose]\n"
+            "The audio daemon: finds the UPnP media servers on the network (SSDP) and answers the\n"
+            "CGI's requests for their list on its control socket (default %s).\n"
+            "  --interface NAME  search and listen on this interface only (default: every one)\n"
+            "  --socket PATH     the control socket\n"
+            "  --verbose         log to standard error too\n"
+            "Started as root it changes to the account %s once the socket is open, and does not\n"
+            "start when that account is missing. Runs in the foreground until SIGTERM or SIGINT.\n",
+            harmona::paths::kDaemonSocket, harmona::paths::kDaemonUser);
+        return 0;
+    }
     if (!ParseArguments(argc, argv, arguments)) {
         std::fprintf(stderr, "usage: vanuaudiod [--interface NAME] [--socket PATH] [--verbose]\n");
         return 2;
@@ -149,6 +164,10 @@ int main(int argc, char** argv) {
         return Fail("control socket: " + error);
     if (!DropPrivileges(account, error))
         return Fail(error);
+    // The kernel took the listener's credentials at listen time, as root: listen again as the
+    // account, which is the only one (with root) that the CGI's daemon client trusts.
+    if (!control.ListenAsCurrentUser(error))
+        return Fail("control socket: " + error);
     // Logged before discovery starts: from here on this thread logs nothing until it stops, so
     // that a slow system log can hold up discovery but never the answers on the socket.
     syslog(LOG_INFO, "listening on %s", arguments.socketPath.c_str());

@@ -102,6 +102,22 @@ bool OwnedByTheDaemon(const char* path) {
     return harmona::paths::LookUpDaemonAccount(daemonUid, daemonGid) && info.st_uid == daemonUid;
 }
 
+// The file's owner says who made the socket, not who listens on it now: between the look and the
+// connect another user may put a socket of their own in its place, or one may sit at the path
+// while its owner is not the listener. The kernel's word on the connected peer (the listener's
+// credentials, SO_PEERCRED) decides: root or the daemon's own account, and no other.
+bool ListenerIsTheDaemon(int fd) {
+    ucred peer{};
+    socklen_t size = sizeof(peer);
+    if (getsockopt(fd, SOL_SOCKET, SO_PEERCRED, &peer, &size) != 0 || size != sizeof(peer))
+        return false;
+    if (peer.uid == 0)
+        return true;
+    uid_t daemonUid = 0;
+    gid_t daemonGid = 0;
+    return harmona::paths::LookUpDaemonAccount(daemonUid, daemonGid) && peer.uid == daemonUid;
+}
+
 }  // namespace
 
 int AudioDaemonConnect() {
@@ -121,6 +137,12 @@ int AudioDaemonConnect() {
         return -1;
     }
     if (connect(fd.Get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)) != 0) {
+        syslog(LOG_ERR, "%s:%d Failed to connect to %s. [%m]", kUnit, kLineConnectFailed,
+               harmona::paths::kDaemonSocket);
+        return -1;
+    }
+    if (!ListenerIsTheDaemon(fd.Get())) {
+        errno = EACCES;
         syslog(LOG_ERR, "%s:%d Failed to connect to %s. [%m]", kUnit, kLineConnectFailed,
                harmona::paths::kDaemonSocket);
         return -1;

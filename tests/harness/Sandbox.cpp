@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <net/if.h>
+#include <pwd.h>
 #include <sched.h>
 #include <sys/ioctl.h>
 #include <sys/mount.h>
@@ -146,6 +147,53 @@ LogLine ParseDatagram(const std::string& raw) {
     return line;
 }
 
+// The services' own accounts, as a package installs them: "harmona" (the library's) and
+// "vanuaudiod" (the audio daemon's). The programs never fall back to another account, so where
+// this machine lacks them they are added to copies of the account files that only this mount
+// namespace sees: written to a tmpfs of its own (over /run, which every test covers anew) and
+// bound over /etc/passwd and /etc/group, which keeps them after that tmpfs is gone.
+void BindWithLines(const std::string& copy, const char* file, const std::string& lines) {
+    std::string text;
+    if (FILE* in = std::fopen(file, "re")) {
+        char buffer[4096];
+        std::size_t n = 0;
+        while ((n = std::fread(buffer, 1, sizeof(buffer), in)) > 0)
+            text.append(buffer, n);
+        std::fclose(in);
+    }
+    if (!text.empty() && text.back() != '\n')
+        text += '\n';
+    text += lines;
+    FILE* out = std::fopen(copy.c_str(), "we");
+    if (out == nullptr || std::fwrite(text.data(), 1, text.size(), out) != text.size() ||
+        std::fclose(out) != 0)
+        Die("copy of " + std::string(file));
+    chmod(copy.c_str(), 0644);
+    Check(mount(copy.c_str(), file, nullptr, MS_BIND, nullptr), std::string("bind ") + file);
+}
+
+void ServiceAccounts() {
+    struct Account {
+        const char* name;
+        unsigned id;
+    };
+    std::string passwd;
+    std::string group;
+    for (const Account& account : {Account{"harmona", 64980}, Account{"vanuaudiod", 64990}}) {
+        if (getpwnam(account.name) != nullptr)
+            continue;
+        const std::string id = std::to_string(account.id);
+        passwd += std::string(account.name) + ":x:" + id + ":" + id +
+                  "::/nonexistent:/usr/sbin/nologin\n";
+        group += std::string(account.name) + ":x:" + id + ":\n";
+    }
+    if (passwd.empty())
+        return;
+    Check(mount("tmpfs", "/run", "tmpfs", 0, "mode=755,size=1m"), "mount tmpfs for accounts");
+    BindWithLines("/run/passwd", "/etc/passwd", passwd);
+    BindWithLines("/run/group", "/etc/group", group);
+}
+
 }  // namespace
 
 const std::vector<std::string>& SandboxRoots() {
@@ -179,6 +227,7 @@ void EnterSandbox() {
     Check(mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr), "make / private");
     BringLoopbackUp();
     PrivateDev();
+    ServiceAccounts();
     entered = true;
     ResetSandbox();
 }

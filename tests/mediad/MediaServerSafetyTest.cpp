@@ -6,6 +6,7 @@
 #include <gtest/gtest.h>
 #include <netinet/in.h>
 #include <poll.h>
+#include <pwd.h>
 #include <signal.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
@@ -258,7 +259,13 @@ TEST_F(MediaServerSafety, TheServerNoLongerRunsAsRoot) {
         ReadFile("/proc/" + std::to_string(std::atol(children.c_str())) + "/status");
     const std::size_t uid = status.find("Uid:");
     ASSERT_NE(uid, std::string::npos);
-    EXPECT_EQ(status.substr(uid, status.find('\n', uid) - uid), "Uid:\t65534\t65534\t65534\t65534");
+    // The library's own account, never root and never a shared one such as "nobody".
+    const passwd* account = getpwnam("harmona");
+    ASSERT_NE(account, nullptr);
+    const std::string id = std::to_string(account->pw_uid);
+    EXPECT_EQ(status.substr(uid, status.find('\n', uid) - uid),
+              "Uid:\t" + id + "\t" + id + "\t" + id + "\t" + id);
+    EXPECT_NE(account->pw_uid, 65534u);
 }
 
 TEST_F(MediaServerSafety, TheServingProcessEndsWhenThePidFileKeeperIsKilled) {
