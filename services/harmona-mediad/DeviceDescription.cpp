@@ -11,6 +11,7 @@
 #include <cstring>
 
 #include "common/io/FileDescriptor.h"
+#include "common/util/CleanText.h"
 #include "common/util/XmlEscape.h"
 #include "platform/plugin/Plugin.h"
 
@@ -120,6 +121,16 @@ std::string DefaultFriendlyName() {
     return std::string("Harmona Music Library (") + name + ")";
 }
 
+std::string ChosenFriendlyName(const std::string& configured) {
+    std::string name = util::CleanText(configured, util::kPrintableUtf8);
+    const std::size_t first = name.find_first_not_of(' ');
+    if (first == std::string::npos)
+        return DefaultFriendlyName();
+    name = util::CleanText(name.substr(first, name.find_last_not_of(' ') + 1 - first),
+                           util::kPrintableUtf8, kMaxFriendlyNameBytes);
+    return name.substr(0, name.find_last_not_of(' ') + 1);
+}
+
 bool FillDescription(const std::string& templateText, const std::string& udn,
                      const std::string& friendlyName, std::string& description,
                      std::string& error) {
@@ -136,14 +147,15 @@ bool FillDescription(const std::string& templateText, const std::string& udn,
 }
 
 bool PrepareDescriptions(const std::string& dataFolder, const std::string& runFolder,
-                         const std::string& udn, DescriptionFiles& files, std::string& error) {
+                         const std::string& udn, const std::string& friendlyName,
+                         DescriptionFiles& files, std::string& error) {
     const std::string templatePath = dataFolder + "/" + kDescriptionTemplateFile;
     const std::string servicesFolder = dataFolder + "/" + kServicesFolder;
     std::string templateText, description, scpd;
     if (!ReadDataFile(templatePath, templateText, error) ||
         !IsWellFormed(templateText, templatePath, error))
         return false;
-    if (!FillDescription(templateText, udn, DefaultFriendlyName(), description, error)) {
+    if (!FillDescription(templateText, udn, friendlyName, description, error)) {
         error = templatePath + ": " + error;
         return false;
     }

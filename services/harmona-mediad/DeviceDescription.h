@@ -5,6 +5,7 @@
 // (SCPDs), which GUPnP serves as they are from their folder.
 #pragma once
 
+#include <cstddef>
 #include <string>
 
 namespace harmona::mediad {
@@ -35,6 +36,14 @@ std::string MakeUdn();
 // "Harmona Music Library (<host name>)".
 std::string DefaultFriendlyName();
 
+// The longest friendly name given to control points, in bytes: what they show in a list of devices.
+inline constexpr std::size_t kMaxFriendlyNameBytes = 64;
+
+// The name the owner chose (`--friendly-name`): printable UTF-8 (other bytes become spaces), blanks
+// at either end dropped, cut to kMaxFriendlyNameBytes without splitting a character; the default
+// name when nothing is left.
+std::string ChosenFriendlyName(const std::string& configured);
+
 // The device description of the template `templateText` for `udn` and `friendlyName` (escaped
 // here). False with `error` set when the template lacks a mark or holds one twice.
 bool FillDescription(const std::string& templateText, const std::string& udn,
@@ -51,7 +60,8 @@ struct DescriptionFiles {
 // fills in the template and writes it into `runFolder` (created 0755, the file 0644, so that the
 // service still reads it after it dropped root). False with `error` naming the file at fault.
 bool PrepareDescriptions(const std::string& dataFolder, const std::string& runFolder,
-                         const std::string& udn, DescriptionFiles& files, std::string& error);
+                         const std::string& udn, const std::string& friendlyName,
+                         DescriptionFiles& files, std::string& error);
 
 // Removes what PrepareDescriptions wrote, and the folder.
 void RemoveDescriptionFolder(const std::string& runFolder);

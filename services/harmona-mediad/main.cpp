@@ -1,5 +1,5 @@
 // harmona-mediad: the storage server's local UPnP media server over library.db.
-//   harmona-mediad [--interface NAME]
+//   harmona-mediad [--interface NAME] [--friendly-name NAME]
 // It serves ContentDirectory:1 on 127.0.0.1:50003 (the CGI's endpoint) and on the LAN (every
 // interface, or only NAME) on port 50003.
 //
@@ -47,10 +47,12 @@ std::string DescriptionRunFolder() {
 
 void PrintHelp() {
     std::printf(
-        "usage: harmona-mediad [--interface NAME]\n"
+        "usage: harmona-mediad [--interface NAME] [--friendly-name NAME]\n"
         "The storage server's local UPnP media server over the music library (library.db).\n"
         "Serves ContentDirectory:1 on 127.0.0.1:50003 and on the LAN (every interface, or only\n"
-        "NAME), keeps the library in step with the audio share and logs to the system log.\n"
+        "the one --interface names), keeps the library in step with the audio share and logs to\n"
+        "the system log. Control points list it by --friendly-name (at most 64 bytes of\n"
+        "printable UTF-8), by default \"Harmona Music Library (<host name>)\".\n"
         "Runs in the foreground until SIGTERM or SIGINT.\n");
 }
 
@@ -58,6 +60,7 @@ void PrintHelp() {
 
 int main(int argc, char** argv) {
     harmona::mediad::MediaServerOptions options;
+    std::string friendlyName;
     for (int i = 1; i < argc; ++i) {
         if (std::strcmp(argv[i], "--help") == 0) {
             PrintHelp();
@@ -65,8 +68,10 @@ int main(int argc, char** argv) {
         }
         if (std::strcmp(argv[i], "--interface") == 0 && i + 1 < argc) {
             options.interfaceName = argv[++i];
+        } else if (std::strcmp(argv[i], "--friendly-name") == 0 && i + 1 < argc) {
+            friendlyName = argv[++i];
         } else {
-            std::fprintf(stderr, "usage: %s [--interface NAME]\n", argv[0]);
+            std::fprintf(stderr, "usage: %s [--interface NAME] [--friendly-name NAME]\n", argv[0]);
             return 2;
         }
     }
@@ -94,9 +99,9 @@ int main(int argc, char** argv) {
         }
     }
     const std::string runFolder = DescriptionRunFolder();
-    if (!harmona::mediad::PrepareDescriptions(harmona::mediad::DescriptionDataFolder(), runFolder,
-                                              harmona::mediad::MakeUdn(), options.descriptions,
-                                              error)) {
+    if (!harmona::mediad::PrepareDescriptions(
+            harmona::mediad::DescriptionDataFolder(), runFolder, harmona::mediad::MakeUdn(),
+            harmona::mediad::ChosenFriendlyName(friendlyName), options.descriptions, error)) {
         harmona::mediad::RemoveDescriptionFolder(runFolder);
         syslog(LOG_ERR, "cannot start: %s", error.c_str());
         std::fprintf(stderr, "harmona-mediad: %s\n", error.c_str());

@@ -20,6 +20,7 @@
 
 #include "platform/dma/DMABrowse.h"
 #include "platform/dma/DMAParser.h"
+#include "services/harmona-mediad/DeviceDescription.h"
 #include "tests/harness/CgiRunner.h"
 #include "tests/harness/Fixtures.h"
 #include "tests/mediad/MediadTestKit.h"
@@ -331,6 +332,42 @@ TEST_F(LocalMediaServer, TheDeviceAnswersAnSsdpSearchOnTheNetwork) {
         answer = SearchForMediaServer(1000);
     EXPECT_NE(answer.find("location: http://192.0.2.1:50003/"), std::string::npos) << answer;
     EXPECT_NE(answer.find("urn:schemas-upnp-org:device:mediaserver:1"), std::string::npos);
+}
+
+// The description of the server at the location an SSDP search gives (empty when none answers).
+std::string DescriptionOnTheWire() {
+    std::string answer;
+    for (int attempt = 0; attempt < 10 && answer.empty(); ++attempt)
+        answer = SearchForMediaServer(1000);
+    const std::size_t at = answer.find("location: ");
+    if (at == std::string::npos)
+        return "";
+    return HttpGet(answer.substr(at + 10, answer.find("\r\n", at) - (at + 10))).body;
+}
+
+// The owner's name for the server is what control points list: cleaned to printable text, its
+// blanks at either end dropped, escaped in the description.
+TEST_F(LocalMediaServer, TheFriendlyNameGivenAtStartIsTheOneOnTheWire) {
+    server_.Stop();
+    ASSERT_TRUE(server_.Start({"--friendly-name", "  Kitchen & <Shelf>\x01 "}));
+    SetUpNetwork();
+    const std::string body = DescriptionOnTheWire();
+    pugi::xml_document description;
+    ASSERT_TRUE(description.load_string(body.c_str())) << body;
+    EXPECT_EQ(std::string(description.child("root").child("device").child_value("friendlyName")),
+              "Kitchen & <Shelf>");
+}
+
+TEST(FriendlyName, ALongNameIsCutToSixtyFourBytesBetweenCharactersAndABlankOneIsTheDefault) {
+    const std::string name =
+        harmona::mediad::ChosenFriendlyName(std::string(63, 'a') + "\xc3\xa9 and more");
+    EXPECT_EQ(name, std::string(63, 'a'));
+    EXPECT_EQ(harmona::mediad::ChosenFriendlyName(std::string(64, 'b') + "c"),
+              std::string(64, 'b'));
+    EXPECT_EQ(harmona::mediad::ChosenFriendlyName("Caf\xc3\xa9 \xff Sofa"), "Caf\xc3\xa9   Sofa");
+    EXPECT_EQ(harmona::mediad::ChosenFriendlyName(""), harmona::mediad::DefaultFriendlyName());
+    EXPECT_EQ(harmona::mediad::ChosenFriendlyName(" \t\n "),
+              harmona::mediad::DefaultFriendlyName());
 }
 
 // The device description at the location the SSDP answer gives: this machine's UDN and friendly

@@ -56,7 +56,8 @@ void SetUpNetwork();
 class ServerProcess {
   public:
     ~ServerProcess() { Stop(); }
-    bool Start();
+    // `extraArgs` follow the kit's own (--interface).
+    bool Start(const std::vector<std::string>& extraArgs = {});
     // SIGTERM and wait (up to 10 s, then SIGKILL); the exit status, or -1.
     int Stop();
     pid_t pid() const { return service_.pid(); }
