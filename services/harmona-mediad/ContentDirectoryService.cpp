@@ -145,8 +145,12 @@ void ContentDirectoryService::NotifyIfChanged() {
         return;
     announcedUpdateId_ = updateId;
     const std::string containers = directory_->LoadedContainerUpdateIds();
+    // GUPnP sends each variable in a NOTIFY of its own unless notifications are frozen: frozen,
+    // a subscriber hears one change as one event with both values.
+    gupnp_service_freeze_notify(service_.get());
     gupnp_service_notify(service_.get(), "SystemUpdateID", G_TYPE_UINT, updateId,
                          "ContainerUpdateIDs", G_TYPE_STRING, containers.c_str(), nullptr);
+    gupnp_service_thaw_notify(service_.get());
 }
 
 }  // namespace harmona::mediad

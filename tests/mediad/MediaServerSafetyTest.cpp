@@ -160,6 +160,28 @@ TEST_F(MediaServerSafety, ACallbackOnTheSubscribersOwnAddressHearsTheInitialStat
     EXPECT_NE(change.find("<SystemUpdateID>" + updated + "<"), std::string::npos) << change;
 }
 
+TEST_F(MediaServerSafety, ALibraryChangeReachesASubscriberAsOneNotifyWithBothVariables) {
+    CallbackListener listener("127.0.0.1");
+    const std::string callback =
+        "CALLBACK: <http://127.0.0.1:" + std::to_string(listener.port()) + "/>\r\n";
+    const std::string answer =
+        RawHttpExchange("127.0.0.1", 50003,
+                        GenaRequest("SUBSCRIBE", "127.0.0.1",
+                                    callback + "NT: upnp:event\r\nTIMEOUT: Second-300\r\n"));
+    ASSERT_EQ(StatusOf(answer), 200) << answer;
+    ASSERT_EQ(listener.WaitForRequest(5000).rfind("NOTIFY ", 0), 0u);  // the initial state
+    std::this_thread::sleep_for(std::chrono::milliseconds(1100));
+    MakeAudioFile(std::string(kShare) + "/New/added.flac",
+                  {"Added", "Band A", "", "", "", 0, 0, 0});
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    const std::string change = listener.WaitForRequest(10000);
+    EXPECT_EQ(change.rfind("NOTIFY ", 0), 0u) << change;
+    EXPECT_NE(change.find("SEQ: 1"), std::string::npos) << change;
+    EXPECT_NE(change.find("<SystemUpdateID>"), std::string::npos) << change;
+    EXPECT_NE(change.find("<ContainerUpdateIDs>"), std::string::npos) << change;
+    EXPECT_EQ(listener.WaitForRequest(2000), "") << "a second NOTIFY for the same change";
+}
+
 TEST_F(MediaServerSafety, ALoopbackCallbackFromALanAddressIsRefusedAndNothingIsSentThere) {
     SetUpNetwork();
     // Wait until the LAN side serves (the interface came after the server).
