@@ -112,6 +112,23 @@ class MediaServerSafety : public ::testing::Test {
         const BrowseReply root = SoapBrowse("0");
         return root.httpStatus == 200 && root.entries.size() == 7;
     }
+    // A subscription to ContentDirectory's events with `listener` (on 127.0.0.1) as the callback;
+    // the server's answer.
+    static std::string SubscribeOnLoopback(const CallbackListener& listener) {
+        const std::string callback =
+            "CALLBACK: <http://127.0.0.1:" + std::to_string(listener.port()) + "/>\r\n";
+        return RawHttpExchange("127.0.0.1", 50003,
+                               GenaRequest("SUBSCRIBE", "127.0.0.1",
+                                           callback + "NT: upnp:event\r\nTIMEOUT: Second-300\r\n"));
+    }
+    // The library changes: a new file (a second after the last change, so that its time differs),
+    // indexed.
+    static void AddATrackAndIndex() {
+        std::this_thread::sleep_for(std::chrono::milliseconds(1100));
+        MakeAudioFile(std::string(kShare) + "/New/added.flac",
+                      {"Added", "Band A", "", "", "", 0, 0, 0});
+        ASSERT_EQ(RunIndexer().exitStatus, 0);
+    }
     ServerProcess server_;
 };
 
@@ -136,23 +153,15 @@ TEST_F(MediaServerSafety, SubscribeAndUnsubscribeWithASidLeaveTheServerServing) 
 
 TEST_F(MediaServerSafety, ACallbackOnTheSubscribersOwnAddressHearsTheInitialStateAndEachChange) {
     CallbackListener listener("127.0.0.1");
-    const std::string callback =
-        "CALLBACK: <http://127.0.0.1:" + std::to_string(listener.port()) + "/>\r\n";
-    const std::string answer =
-        RawHttpExchange("127.0.0.1", 50003,
-                        GenaRequest("SUBSCRIBE", "127.0.0.1",
-                                    callback + "NT: upnp:event\r\nTIMEOUT: Second-300\r\n"));
+    const std::string answer = SubscribeOnLoopback(listener);
     EXPECT_EQ(StatusOf(answer), 200) << answer;
     EXPECT_NE(answer.find("SID: uuid:"), std::string::npos) << answer;
     const std::string notify = listener.WaitForRequest(5000);
     EXPECT_EQ(notify.rfind("NOTIFY ", 0), 0u) << notify;
     EXPECT_NE(notify.find("SEQ: 0"), std::string::npos) << notify;
     EXPECT_NE(notify.find("<SystemUpdateID>"), std::string::npos) << notify;
-    // The library changes: a new file, indexed. The subscriber hears of it.
-    std::this_thread::sleep_for(std::chrono::milliseconds(1100));
-    MakeAudioFile(std::string(kShare) + "/New/added.flac",
-                  {"Added", "Band A", "", "", "", 0, 0, 0});
-    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    // The library changes; the subscriber hears of it.
+    ASSERT_NO_FATAL_FAILURE(AddATrackAndIndex());
     const std::string updated = SoapSimpleAction("GetSystemUpdateID", "Id");
     const std::string change = listener.WaitForRequest(10000);
     EXPECT_EQ(change.rfind("NOTIFY ", 0), 0u) << change;
@@ -162,18 +171,10 @@ TEST_F(MediaServerSafety, ACallbackOnTheSubscribersOwnAddressHearsTheInitialStat
 
 TEST_F(MediaServerSafety, ALibraryChangeReachesASubscriberAsOneNotifyWithBothVariables) {
     CallbackListener listener("127.0.0.1");
-    const std::string callback =
-        "CALLBACK: <http://127.0.0.1:" + std::to_string(listener.port()) + "/>\r\n";
-    const std::string answer =
-        RawHttpExchange("127.0.0.1", 50003,
-                        GenaRequest("SUBSCRIBE", "127.0.0.1",
-                                    callback + "NT: upnp:event\r\nTIMEOUT: Second-300\r\n"));
+    const std::string answer = SubscribeOnLoopback(listener);
     ASSERT_EQ(StatusOf(answer), 200) << answer;
     ASSERT_EQ(listener.WaitForRequest(5000).rfind("NOTIFY ", 0), 0u);  // the initial state
-    std::this_thread::sleep_for(std::chrono::milliseconds(1100));
-    MakeAudioFile(std::string(kShare) + "/New/added.flac",
-                  {"Added", "Band A", "", "", "", 0, 0, 0});
-    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    ASSERT_NO_FATAL_FAILURE(AddATrackAndIndex());
     const std::string change = listener.WaitForRequest(10000);
     EXPECT_EQ(change.rfind("NOTIFY ", 0), 0u) << change;
     EXPECT_NE(change.find("SEQ: 1"), std::string::npos) << change;
