@@ -4,6 +4,7 @@
 #include <atomic>
 #include <utility>
 
+#include "platform/medialib/MediaFiles.h"
 #include "services/harmona-mediad/DidlWriter.h"
 #include "services/harmona-mediad/LibraryReader.h"
 #include "services/harmona-mediad/LibraryViewBuilder.h"
@@ -23,6 +24,22 @@ int CompareNoCase(std::string_view a, std::string_view b) {
             return x < y ? -1 : 1;
     }
     return a.size() == b.size() ? 0 : a.size() < b.size() ? -1 : 1;
+}
+
+TrackArt ArtOfImagePath(const std::string& path) {
+    return medialib::LowerExtension(path) == "png" ? TrackArt::png : TrackArt::jpg;
+}
+
+std::string_view ArtExtension(TrackArt art) {
+    switch (art) {
+        case TrackArt::png:
+            return "png";
+        case TrackArt::jpg:
+            return "jpg";
+        case TrackArt::none:
+            break;
+    }
+    return "";
 }
 
 std::unique_ptr<LibraryView> LibraryView::Load(const std::string& dbPath,
@@ -67,9 +84,7 @@ void LibraryView::AppendContainerElement(std::string& out, uint32_t index,
         fields.year = container.year;
     }
     fields.artTrack = container.artTrack;
-    fields.artExtension = container.art == TrackArt::png   ? "png"
-                          : container.art == TrackArt::jpg ? "jpg"
-                                                           : "";
+    fields.artExtension = ArtExtension(container.art);
     AppendContainer(out, fields, mediaBase);
 }
 
@@ -95,9 +110,7 @@ void LibraryView::AppendTrackBody(std::string& out, const ViewTrack& track,
     const ViewFileType& type = fileTypes_[track.fileType];
     fields.protocolInfo = type.protocolInfo;
     fields.streamExtension = type.streamExtension;
-    fields.artExtension = track.art == TrackArt::png   ? "png"
-                          : track.art == TrackArt::jpg ? "jpg"
-                                                       : "";
+    fields.artExtension = ArtExtension(track.art);
     AppendTrackItemBody(out, fields, mediaBase);
 }
 

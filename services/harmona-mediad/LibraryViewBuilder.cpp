@@ -276,8 +276,7 @@ void LibraryViewBuilder::BuildAlbums() {
         container.artist = SharedText(album.albumArtist);
         container.year = album.year;
         if (!album.artPath.empty()) {
-            container.art =
-                medialib::LowerExtension(album.artPath) == "png" ? TrackArt::png : TrackArt::jpg;
+            container.art = ArtOfImagePath(album.artPath);
             container.artTrack = album.artTrack;
         }
         AddChild(parent, {index, false});

@@ -17,9 +17,7 @@ void LibraryViewBuilder::TypeTracks() {
         ViewTrack& track = view_.tracks_[i];
         const std::string path(R(row.path));
         if (row.artPath.size != 0)
-            track.art = medialib::LowerExtension(std::string(R(row.artPath))) == "png"
-                            ? TrackArt::png
-                            : TrackArt::jpg;
+            track.art = ArtOfImagePath(std::string(R(row.artPath)));
         const std::string extension = medialib::LowerExtension(path);
         auto type = typeOf.find(extension);
         if (type == typeOf.end()) {

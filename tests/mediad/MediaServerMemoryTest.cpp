@@ -12,6 +12,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <fstream>
+#include <functional>
 #include <set>
 #include <string>
 
@@ -107,8 +108,10 @@ pid_t ServerChildOf(pid_t supervisor) {
 }
 
 // The whole list as a client fetches it: RequestedCount 0, then on from the objects that came,
-// until TotalMatches have come. The number of requests it took.
-int BrowseAllAsAClientDoes() {
+// until TotalMatches have come; `onReply` sees each reply and its number (from 1). The number of
+// requests it took.
+int BrowseAllAsAClientDoes(const std::function<void(const BrowseReply&, int)>& onReply =
+                               [](const BrowseReply&, int) {}) {
     int requests = 0;
     long got = 0;
     while (got < kTracks && requests < 100) {
@@ -121,6 +124,7 @@ int BrowseAllAsAClientDoes() {
         EXPECT_EQ(static_cast<long>(reply.entries.size()), reply.numberReturned);
         if (reply.httpStatus != 200 || reply.numberReturned <= 0)
             break;
+        onReply(reply, requests);
         got += reply.numberReturned;
     }
     EXPECT_EQ(got, kTracks);
@@ -156,26 +160,15 @@ TEST(MediaServerMemory, AWholeListPastTenMillionBytesIsCutAndPagingOnBringsEvery
     ServerProcess server;
     ASSERT_TRUE(server.Start()) << "harmona-mediad did not come up";
     std::set<std::string> ids;
-    long got = 0;
-    int requests = 0;
-    while (got < kTracks && requests < 100) {
-        const BrowseReply reply =
-            SoapBrowse("music_all", "BrowseDirectChildren", static_cast<unsigned>(got), 0);
-        ++requests;
-        ASSERT_EQ(reply.httpStatus, 200);
-        ASSERT_EQ(reply.totalMatches, kTracks);
-        ASSERT_GT(reply.numberReturned, 0);
-        ASSERT_EQ(static_cast<long>(reply.entries.size()), reply.numberReturned);
+    const int requests = BrowseAllAsAClientDoes([&](const BrowseReply& reply, int request) {
         EXPECT_LT(ResultTextSize(reply.raw), 10000000u);
-        if (requests == 1) {
+        if (request == 1) {
             EXPECT_LT(reply.numberReturned, reply.totalMatches);
         }
         for (const DidlEntry& entry : reply.entries)
             EXPECT_TRUE(ids.insert(entry.id).second) << "twice: " << entry.id;
-        got += reply.numberReturned;
-    }
+    });
     EXPECT_GE(requests, 2);
-    EXPECT_EQ(got, kTracks);
     EXPECT_EQ(ids.size(), static_cast<std::size_t>(kTracks));
     EXPECT_EQ(server.Stop(), 0);
 }
