@@ -13,6 +13,8 @@
 #include <deque>
 #include <map>
 #include <memory>
+#include <set>
+#include <utility>
 
 #include "common/io/FileDescriptor.h"
 #include "platform/lib/gupnp/ContextManager.h"
@@ -50,6 +52,9 @@ constexpr std::size_t kMaxQueuedFetches = 64;
 // not flood the log.
 constexpr int kRefusalLinesPerWindow = 10;
 constexpr auto kRefusalWindow = std::chrono::seconds(10);
+// Devices that said byebye since the last search, remembered so that their late answers to that
+// search are not taken for a return; bounded, as forged byebyes cost nothing to send.
+constexpr std::size_t kMaxDepartedRemembered = 256;
 
 std::string AddressText(GInetAddress* address) {
     return harmona::gupnp::Chars(g_inet_address_to_string(address)).c_str();
@@ -195,6 +200,7 @@ class Discovery::Worker {
 
     void Search(Address& address) {
         lastSearch_ = Clock::now();
+        departedSinceSearch_.clear();
         CheckMulticastRoute(address);
         // A fresh browser sends the search burst on activation; it lives for the answer window.
         address.browser = ObjectRef<GSSDPResourceBrowser>::Adopt(
@@ -264,15 +270,30 @@ class Discovery::Worker {
                              soup_message_headers_get_one(headers, "CACHE-CONTROL"));
         if (announcement.kind == AnnouncementKind::byebye)
             Byebye(announcement.udn, fromIp);
-        else if (announcement.kind == AnnouncementKind::alive)
+        else if (announcement.kind == AnnouncementKind::alive &&
+                 !(type == kSearchAnswer && DepartedSinceSearch(announcement.udn, fromIp)))
             Alive(address, announcement, fromIp);
     }
 
     void Byebye(const std::string& udn, const std::string& fromIp) {
+        RememberDeparture(udn, fromIp);
         MediaServer gone;
         if (servers_.Remove(udn, fromIp, gone))
             syslog(LOG_INFO, "media server gone (byebye): \"%s\" %s at %s",
                    gone.friendlyName.c_str(), udn.c_str(), gone.ip.c_str());
+    }
+
+    // A server answers a search after a random delay of up to its MX, and GSSDP-based servers
+    // still send answers they owed when they leave: such an answer can follow the byebye. Only a
+    // NOTIFY alive or an answer to a later search brings the device back.
+    void RememberDeparture(const std::string& udn, const std::string& fromIp) {
+        if (departedSinceSearch_.size() >= kMaxDepartedRemembered)
+            departedSinceSearch_.erase(departedSinceSearch_.begin());
+        departedSinceSearch_.insert({udn, fromIp});
+    }
+
+    bool DepartedSinceSearch(const std::string& udn, const std::string& fromIp) const {
+        return departedSinceSearch_.count({udn, fromIp}) != 0;
     }
 
     void Alive(const Address& address, const Announcement& announcement,
@@ -377,6 +398,7 @@ class Discovery::Worker {
     std::deque<FetchJob> queue_;
     std::map<GUPnPContext*, std::unique_ptr<Address>> addresses_;
     Clock::time_point lastSearch_{};
+    std::set<std::pair<std::string, std::string>> departedSinceSearch_;
     bool routeMissing_ = false;
     Clock::time_point refusalWindowStart_{};
     int refusalLines_ = 0;

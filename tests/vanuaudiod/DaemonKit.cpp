@@ -28,11 +28,13 @@ namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
+// The device type every fake announces, searches look for and answers name.
+const std::string kType = "urn:schemas-upnp-org:device:MediaServer:1";
+
 }  // namespace
 
 void SendNotify(const std::string& fromAddress, const std::string& udn, const std::string& location,
                 int maxAgeSeconds) {
-    static const std::string kType = "urn:schemas-upnp-org:device:MediaServer:1";
     const std::string message =
         "NOTIFY * HTTP/1.1\r\nHOST: 239.255.255.250:1900\r\nCACHE-CONTROL: "
         "max-age=" +
@@ -304,7 +306,6 @@ void FakeMediaServers::AnswerSearches(const std::string& udn, int maxAgeSeconds)
 }
 
 void FakeMediaServers::AnswerSearch() {
-    static const std::string kType = "urn:schemas-upnp-org:device:MediaServer:1";
     char buffer[2048];
     sockaddr_in from{};
     socklen_t fromLength = sizeof(from);
@@ -321,16 +322,31 @@ void FakeMediaServers::AnswerSearch() {
     {
         std::lock_guard<std::mutex> lock(mutex_);
         answers = searchAnswers_;
+        lastSearcher_ = from;
     }
-    for (const auto& [udn, maxAge] : answers) {
-        const std::string reply =
-            "HTTP/1.1 200 OK\r\nCACHE-CONTROL: max-age=" + std::to_string(maxAge) +
-            "\r\nEXT:\r\nLOCATION: " + Location(udn) +
-            "\r\nSERVER: Linux/6 UPnP/1.0 fake/1\r\nST: " + kType + "\r\nUSN: " + udn +
-            "::" + kType + "\r\n\r\n";
-        sendto(SocketFrom(AddressOf(udn)), reply.data(), reply.size(), 0,
-               reinterpret_cast<sockaddr*>(&from), fromLength);
+    for (const auto& [udn, maxAge] : answers)
+        SendSearchAnswer(udn, maxAge, from);
+}
+
+void FakeMediaServers::AnswerLastSearch(const std::string& udn, int maxAgeSeconds) {
+    sockaddr_in to{};
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        to = lastSearcher_;
     }
+    ASSERT_NE(to.sin_port, 0) << "no search has arrived yet";
+    SendSearchAnswer(udn, maxAgeSeconds, to);
+}
+
+void FakeMediaServers::SendSearchAnswer(const std::string& udn, int maxAgeSeconds,
+                                        const sockaddr_in& to) {
+    const std::string reply =
+        "HTTP/1.1 200 OK\r\nCACHE-CONTROL: max-age=" + std::to_string(maxAgeSeconds) +
+        "\r\nEXT:\r\nLOCATION: " + Location(udn) +
+        "\r\nSERVER: Linux/6 UPnP/1.0 fake/1\r\nST: " + kType + "\r\nUSN: " + udn + "::" + kType +
+        "\r\n\r\n";
+    sendto(SocketFrom(AddressOf(udn)), reply.data(), reply.size(), 0,
+           reinterpret_cast<const sockaddr*>(&to), sizeof(to));
 }
 
 std::string FakeMediaServers::DescriptionXml(const std::string& udn,
@@ -377,7 +393,6 @@ void FakeMediaServers::Byebye(const std::string& udn) {
 }
 
 void FakeMediaServers::Notify(const std::string& udn, const char* nts, int maxAgeSeconds) {
-    static const std::string kType = "urn:schemas-upnp-org:device:MediaServer:1";
     std::string message = "NOTIFY * HTTP/1.1\r\nHOST: 239.255.255.250:1900\r\n";
     if (std::strcmp(nts, "ssdp:alive") == 0) {
         message += "CACHE-CONTROL: max-age=" + std::to_string(maxAgeSeconds) +

@@ -4,6 +4,7 @@
 // description server) for the cases no real server can be made to produce.
 #pragma once
 
+#include <netinet/in.h>
 #include <sys/types.h>
 
 #include <atomic>
@@ -121,6 +122,8 @@ class FakeMediaServers {
     // Answers M-SEARCH requests (for the MediaServer:1 type or ssdp:all) for `udn` from now on,
     // as a device does: a unicast HTTP/1.1 200 reply to the searcher with its location.
     void AnswerSearches(const std::string& udn, int maxAgeSeconds);
+    // Answers the last M-SEARCH that arrived for `udn`, now: an answer a device owed when it left.
+    void AnswerLastSearch(const std::string& udn, int maxAgeSeconds);
     // How many M-SEARCH datagrams for media servers have arrived so far.
     int SearchesSeen() const { return searchesSeen_; }
 
@@ -128,6 +131,7 @@ class FakeMediaServers {
     void Serve();
     void Notify(const std::string& udn, const char* nts, int maxAgeSeconds);
     void AnswerSearch();
+    void SendSearchAnswer(const std::string& udn, int maxAgeSeconds, const sockaddr_in& to);
 
     static constexpr std::size_t kDevicesPerAddress = 16;
     // The datagram socket that sends from `address` (made on first use).
@@ -137,6 +141,7 @@ class FakeMediaServers {
     int ssdpFd_ = -1;  // bound to port 1900, member of the SSDP group on va
     std::atomic<int> searchesSeen_{0};
     std::map<std::string, int> searchAnswers_;  // udn -> max-age
+    sockaddr_in lastSearcher_{};
 
     int listenFd_ = -1;
     std::map<std::string, int> udpFds_;  // source address -> socket

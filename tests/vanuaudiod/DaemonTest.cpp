@@ -10,10 +10,12 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <cstdlib>
 #include <cstring>
 #include <future>
 #include <iostream>
+#include <thread>
 
 #include "platform/dma/DMABrowse.h"
 #include "platform/dma/DMAParser.h"
@@ -350,6 +352,36 @@ TEST_F(AudioDaemon, ByebyeOfOneServerLeavesTheOthers) {
         ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 3000), reply));
     ASSERT_EQ(reply["list"].size(), 1u);
     EXPECT_EQ(reply["list"][0]["udn"], "uuid:stay");
+}
+
+// GSSDP-based servers (harmona-mediad, Rygel) still send the search answers they owed when they
+// leave, so one can arrive after the byebye; it must not bring the device back for its max-age.
+TEST_F(AudioDaemon, ASearchAnswerThatFollowsTheByebyeDoesNotBringTheServerBack) {
+    daemon_ = StartDaemon();
+    FakeMediaServers fake;
+    fake.Add("uuid:leaving", FakeMediaServers::DescriptionXml("uuid:leaving", "Leaving", "/cd"));
+    fake.Alive("uuid:leaving", 1800);
+    WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000);
+    const int searchesBefore = fake.SearchesSeen();
+    EXPECT_TRUE(Call(14).answered);
+    for (int waited = 0; fake.SearchesSeen() == searchesBefore && waited < 5000; waited += 50)
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    ASSERT_GT(fake.SearchesSeen(), searchesBefore);
+    fake.Byebye("uuid:leaving");
+    WaitForList([](const Json::Value& l) { return l.empty(); }, 5000);
+    fake.AnswerLastSearch("uuid:leaving", 1800);
+    // Listed again within a few hundred milliseconds when the answer is taken for a return.
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return !l.empty(); }, 3000), reply));
+    EXPECT_EQ(reply["list"].size(), 0u) << reply;
+    // An answer to a search sent after the byebye is a return.
+    fake.AnswerSearches("uuid:leaving", 1800);
+    EXPECT_TRUE(Call(14).answered);
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
+    ASSERT_EQ(reply["list"].size(), 1u);
+    EXPECT_EQ(reply["list"][0]["udn"], "uuid:leaving");
 }
 
 TEST_F(AudioDaemon, DevicesWithoutAUsableDescriptionAreNotListed) {
