@@ -307,8 +307,15 @@ class Discovery::Worker {
             Refused(announcement.udn, fromIp, refusal);
             return;
         }
-        switch (servers_.Seen(announcement.udn, announcement.location, fromIp,
-                              announcement.maxAgeSeconds, Clock::now())) {
+        const SeenOutcome outcome = servers_.Seen(announcement.udn, announcement.location, fromIp,
+                                                  announcement.maxAgeSeconds, Clock::now());
+        for (const MediaServer& gone : servers_.TakeEvicted())
+            syslog(LOG_WARNING,
+                   "media server dropped: \"%s\" %s at %s gave its place to %s at %s (the device "
+                   "table is full and its address announces the most devices)",
+                   gone.friendlyName.c_str(), gone.udn.c_str(), gone.ip.c_str(),
+                   announcement.udn.c_str(), fromIp.c_str());
+        switch (outcome) {
             case SeenOutcome::fetch:
                 Enqueue({announcement.udn, announcement.location, fromIp});
                 return;

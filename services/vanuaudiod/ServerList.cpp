@@ -32,7 +32,8 @@ SeenOutcome ServerList::Seen(const std::string& udn, const std::string& location
     if (found == entries_.end()) {
         if (CountFromLocked(announcer) >= kMaxDevicesPerAnnouncer)
             return SeenOutcome::announcerFull;
-        if (entries_.size() >= kMaxKnownDevices && !EvictUndescribedLocked())
+        if (entries_.size() >= kMaxKnownDevices && !EvictUndescribedLocked() &&
+            !EvictFromBusiestAnnouncerLocked(announcer))
             return SeenOutcome::tableFull;
         Entry entry;
         entry.location = location;
@@ -171,6 +172,47 @@ bool ServerList::EvictUndescribedLocked() {
         return false;
     entries_.erase(victim);
     return true;
+}
+
+bool ServerList::EvictFromBusiestAnnouncerLocked(const std::string& newcomer) {
+    std::map<std::string, std::size_t> counts;
+    for (const auto& [udn, entry] : entries_)
+        ++counts[entry.announcer];
+    auto busiest = counts.begin();
+    for (auto it = counts.begin(); it != counts.end(); ++it) {
+        if (it->second > busiest->second)
+            busiest = it;
+    }
+    // Only when the newcomer's address, with the newcomer, still announces fewer devices than the
+    // busiest one did: otherwise equals would push each other out in turn.
+    if (busiest == counts.end() || busiest->second <= counts[newcomer] + 1)
+        return false;
+    // Of the busiest address's devices, the one whose announcement runs out first.
+    auto victim = entries_.end();
+    for (auto it = entries_.begin(); it != entries_.end(); ++it) {
+        if (it->second.announcer != busiest->first || it->second.fetchPending)
+            continue;
+        if (victim == entries_.end() || it->second.expiresAt < victim->second.expiresAt)
+            victim = it;
+    }
+    if (victim == entries_.end())
+        return false;
+    const bool wasListed = victim->second.described;
+    if (wasListed && evicted_.size() < kMaxEvictedKept) {
+        evicted_.push_back(victim->second.server);
+        evicted_.back().udn = victim->first;
+    }
+    entries_.erase(victim);
+    if (wasListed)
+        RebuildSnapshotLocked();
+    return true;
+}
+
+std::vector<MediaServer> ServerList::TakeEvicted() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    std::vector<MediaServer> taken;
+    taken.swap(evicted_);
+    return taken;
 }
 
 void ServerList::RebuildSnapshotLocked() {

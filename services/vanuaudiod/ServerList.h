@@ -48,7 +48,9 @@ class ServerList {
     // should fetch the description: the device is new, moved to another location, or its last
     // fetch failed long enough ago. A new device needs a free slot: at most
     // kMaxDevicesPerAnnouncer per announcer, kMaxKnownDevices in all, where a device without a
-    // description gives its slot up to a newcomer.
+    // description gives its slot up to a newcomer first, then a device of the address that
+    // announces the most, when that address would still announce more than the newcomer's
+    // (many addresses of one forger cannot keep a server of another host out).
     SeenOutcome Seen(const std::string& udn, const std::string& location,
                      const std::string& announcer, int maxAgeSeconds, Clock::time_point now);
 
@@ -77,6 +79,9 @@ class ServerList {
     // Every known device (described or not).
     std::size_t KnownCount() const;
 
+    // The listed servers that gave their slot up to a newcomer since the last call.
+    std::vector<MediaServer> TakeEvicted();
+
   private:
     struct Entry {
         std::string location;
@@ -92,10 +97,15 @@ class ServerList {
     void RebuildSnapshotLocked();
     std::size_t CountFromLocked(const std::string& announcer) const;
     bool EvictUndescribedLocked();
+    bool EvictFromBusiestAnnouncerLocked(const std::string& newcomer);
+
+    // How many listed servers TakeEvicted keeps for the log between two calls.
+    static constexpr std::size_t kMaxEvictedKept = 16;
 
     mutable std::mutex mutex_;
     std::map<std::string, Entry> entries_;
     ServerSnapshot snapshot_;
+    std::vector<MediaServer> evicted_;
 };
 
 }  // namespace harmona::vanuaudiod

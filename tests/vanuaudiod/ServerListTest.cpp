@@ -1,6 +1,8 @@
 // vanuaudiod's list of found servers: order, byebye, expiry, moved devices, failed descriptions.
 #include <gtest/gtest.h>
 
+#include <algorithm>
+
 #include "services/vanuaudiod/ServerList.h"
 
 using namespace harmona::vanuaudiod;
@@ -170,4 +172,53 @@ TEST(DaemonServerList, AByebyeFromAnotherAddressIsIgnored) {
     EXPECT_EQ(Names(list), (std::vector<std::string>{"A/uuid:a"}));
     EXPECT_TRUE(list.Remove("uuid:a", kAnnouncer, gone));
     EXPECT_EQ(gone.friendlyName, "A");
+}
+
+TEST(DaemonServerList, ATableFullOfOneForgersServersMakesRoomForAServerOfAnotherHost) {
+    ServerList list;
+    const auto now = Clock::now();
+    // 64 addresses announcing 16 described servers each: the whole table.
+    for (std::size_t i = 0; i < kMaxKnownDevices; ++i) {
+        const std::string host = "10.1." + std::to_string(i / kMaxDevicesPerAnnouncer) + ".1";
+        const std::string udn = "uuid:forged-" + std::to_string(i);
+        const std::string location = "http://" + host + "/" + udn;
+        ASSERT_EQ(list.Seen(udn, location, host, 86400, now + std::chrono::seconds(i)),
+                  SeenOutcome::fetch);
+        list.Described(udn, location, true, Described("Forged"), now);
+    }
+    ASSERT_EQ(list.Snapshot()->size(), kMaxKnownDevices);
+    EXPECT_TRUE(Seen(list, "uuid:real", "http://10.0.0.1/real", 1800, now));
+    list.Described("uuid:real", "http://10.0.0.1/real", true, Described("Real"), now);
+    EXPECT_EQ(list.KnownCount(), kMaxKnownDevices);
+    EXPECT_TRUE(list.Knows("uuid:real"));
+    const auto listed = list.Snapshot();
+    EXPECT_TRUE(std::any_of(listed->begin(), listed->end(),
+                            [](const MediaServer& s) { return s.friendlyName == "Real"; }));
+    // The one dropped is the first to run out of the busiest address's devices, and it is told.
+    EXPECT_FALSE(list.Knows("uuid:forged-0"));
+    const std::vector<MediaServer> evicted = list.TakeEvicted();
+    ASSERT_EQ(evicted.size(), 1u);
+    EXPECT_EQ(evicted[0].udn, "uuid:forged-0");
+    EXPECT_TRUE(list.TakeEvicted().empty());
+    // The forger announcing it again pushes out no one: not the real server, whose address
+    // announces fewer, nor another of its own addresses, which announce as many.
+    EXPECT_EQ(list.Seen("uuid:forged-0", "http://10.1.0.1/uuid:forged-0", "10.1.0.1", 86400, now),
+              SeenOutcome::tableFull);
+    EXPECT_TRUE(list.Knows("uuid:real"));
+    EXPECT_EQ(list.KnownCount(), kMaxKnownDevices);
+}
+
+TEST(DaemonServerList, ATableFullOfOneDevicePerAddressRefusesANewcomer) {
+    ServerList list;
+    const auto now = Clock::now();
+    for (std::size_t i = 0; i < kMaxKnownDevices; ++i) {
+        const std::string host = "10.2." + std::to_string(i / 250) + "." + std::to_string(i % 250);
+        const std::string udn = "uuid:single-" + std::to_string(i);
+        ASSERT_EQ(list.Seen(udn, "http://" + host + "/d", host, 86400, now), SeenOutcome::fetch);
+        list.Described(udn, "http://" + host + "/d", true, Described("Single"), now);
+    }
+    EXPECT_EQ(list.Seen("uuid:late", "http://10.0.0.1/late", kAnnouncer, 1800, now),
+              SeenOutcome::tableFull);
+    EXPECT_EQ(list.KnownCount(), kMaxKnownDevices);
+    EXPECT_TRUE(list.TakeEvicted().empty());
 }
