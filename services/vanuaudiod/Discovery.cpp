@@ -13,7 +13,6 @@
 #include <deque>
 #include <map>
 #include <memory>
-#include <set>
 #include <utility>
 
 #include "common/io/FileDescriptor.h"
@@ -52,9 +51,11 @@ constexpr std::size_t kMaxQueuedFetches = 64;
 // not flood the log.
 constexpr int kRefusalLinesPerWindow = 10;
 constexpr auto kRefusalWindow = std::chrono::seconds(10);
-// Devices that said byebye since the last search, remembered so that their late answers to that
-// search are not taken for a return; bounded, as forged byebyes cost nothing to send.
+// Devices that said byebye are remembered for their search answers' window (the MX of a search
+// sent just before, and this margin), so that a late answer is not taken for a return; bounded,
+// as forged byebyes cost nothing to send.
 constexpr std::size_t kMaxDepartedRemembered = 256;
+constexpr auto kLateAnswerMargin = std::chrono::seconds(1);
 
 std::string AddressText(GInetAddress* address) {
     return harmona::gupnp::Chars(g_inet_address_to_string(address)).c_str();
@@ -200,7 +201,6 @@ class Discovery::Worker {
 
     void Search(Address& address) {
         lastSearch_ = Clock::now();
-        departedSinceSearch_.clear();
         CheckMulticastRoute(address);
         // A fresh browser sends the search burst on activation; it lives for the answer window.
         address.browser = ObjectRef<GSSDPResourceBrowser>::Adopt(
@@ -271,7 +271,7 @@ class Discovery::Worker {
         if (announcement.kind == AnnouncementKind::byebye)
             Byebye(announcement.udn, fromIp);
         else if (announcement.kind == AnnouncementKind::alive &&
-                 !(type == kSearchAnswer && DepartedSinceSearch(announcement.udn, fromIp)))
+                 !(type == kSearchAnswer && RecentlyDeparted(announcement.udn, fromIp)))
             Alive(address, announcement, fromIp);
     }
 
@@ -284,16 +284,28 @@ class Discovery::Worker {
     }
 
     // A server answers a search after a random delay of up to its MX, and GSSDP-based servers
-    // still send answers they owed when they leave: such an answer can follow the byebye. Only a
-    // NOTIFY alive or an answer to a later search brings the device back.
+    // still send answers they owed when they leave: such an answer can follow the byebye. Within
+    // that window only a NOTIFY alive brings the device back.
     void RememberDeparture(const std::string& udn, const std::string& fromIp) {
-        if (departedSinceSearch_.size() >= kMaxDepartedRemembered)
-            departedSinceSearch_.erase(departedSinceSearch_.begin());
-        departedSinceSearch_.insert({udn, fromIp});
+        const Clock::time_point now = Clock::now();
+        for (auto it = departed_.begin(); it != departed_.end();) {
+            if (now - it->second > LateAnswerWindow())
+                it = departed_.erase(it);
+            else
+                ++it;
+        }
+        if (departed_.size() >= kMaxDepartedRemembered)
+            departed_.erase(departed_.begin());
+        departed_[{udn, fromIp}] = now;
     }
 
-    bool DepartedSinceSearch(const std::string& udn, const std::string& fromIp) const {
-        return departedSinceSearch_.count({udn, fromIp}) != 0;
+    bool RecentlyDeparted(const std::string& udn, const std::string& fromIp) const {
+        const auto found = departed_.find({udn, fromIp});
+        return found != departed_.end() && Clock::now() - found->second <= LateAnswerWindow();
+    }
+
+    Clock::duration LateAnswerWindow() const {
+        return std::chrono::seconds(options_.searchMxSeconds) + kLateAnswerMargin;
     }
 
     void Alive(const Address& address, const Announcement& announcement,
@@ -405,7 +417,7 @@ class Discovery::Worker {
     std::deque<FetchJob> queue_;
     std::map<GUPnPContext*, std::unique_ptr<Address>> addresses_;
     Clock::time_point lastSearch_{};
-    std::set<std::pair<std::string, std::string>> departedSinceSearch_;
+    std::map<std::pair<std::string, std::string>, Clock::time_point> departed_;
     bool routeMissing_ = false;
     Clock::time_point refusalWindowStart_{};
     int refusalLines_ = 0;
