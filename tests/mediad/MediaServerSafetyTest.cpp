@@ -221,7 +221,8 @@ TEST_F(MediaServerSafety, SubscriptionsAreBoundedInNumber) {
     int accepted = 0;
     int refused = 0;
     for (int i = 0; i < 40; ++i) {
-        const int status = StatusOf(RawHttpExchange("127.0.0.1", 50003, request));
+        // A generous wait: under a sanitizer and a parallel run one reply once took over 3 s.
+        const int status = StatusOf(RawHttpExchange("127.0.0.1", 50003, request, 15000));
         accepted += status == 200;
         refused += status == 503;
     }
