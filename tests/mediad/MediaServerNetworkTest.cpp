@@ -328,6 +328,26 @@ TEST_F(MediaServerOnAChangingNetwork, AnInterfaceThatWasDownAtStartIsAnnouncedWh
                     "the interface down at start, then up");
 }
 
+// SSDP leaves by the interface's address, which needs no multicast route: a host whose multicast
+// route goes away (a network manager rewriting the table) and comes back keeps the server
+// found, with no byebye and no warning.
+TEST_F(MediaServerOnAChangingNetwork, AMulticastRouteLostAndBackKeepsTheServerFound) {
+    SetUpNetwork();  // with a route for 239.0.0.0/8 through hm0
+    SsdpRecorder recorder;
+    ASSERT_TRUE(StartOnTheNetwork(recorder)) << Describe(recorder.Notices());
+    std::this_thread::sleep_for(std::chrono::seconds(1));
+    const long quietFrom = MsSince(recorder.start());
+    ASSERT_TRUE(Shell("ip route del 239.0.0.0/8 dev hm0"));
+    ASSERT_FALSE(Shell("ip route get 239.255.255.250 >/dev/null 2>&1"));
+    ExpectRecovered(recorder, "192.0.2.1", MsSince(recorder.start()), quietFrom,
+                    "the multicast route removed");
+    ASSERT_TRUE(Shell("ip route add 239.0.0.0/8 dev hm0"));
+    EXPECT_TRUE(SearchFinds("192.0.2.1", kRecoveryBoundMs)) << "after the route came back";
+    const std::string log = ReadFile("/tmp/harmona-mediad.log");
+    EXPECT_EQ(log.find("cannot leave"), std::string::npos) << log;
+    EXPECT_EQ(SoapBrowse("0").entries.size(), 7u);
+}
+
 // A start on a healthy host prints nothing that reads like a fault: no GLib warning about a port
 // in use (the server's own loopback port, tried twice).
 TEST_F(MediaServerOnAChangingNetwork, AStartPrintsNoWarningAboutItsOwnPort) {
