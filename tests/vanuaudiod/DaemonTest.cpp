@@ -890,6 +890,39 @@ TEST_F(AudioDaemon, AMulticastRouteThatFollowsItsAddressIsNotReportedMissing) {
     EXPECT_EQ(log.find("no multicast route"), std::string::npos) << log;
 }
 
+// The route goes while the daemon runs (a network manager rewriting the table) and comes back: the
+// scan button finds servers all along, and the log says once that it went and once that it is back.
+TEST_F(AudioDaemon, AMulticastRouteLostAndBackKeepsTheScanFindingServers) {
+    FakeMediaServers fake;
+    fake.Add("uuid:before", FakeMediaServers::DescriptionXml("uuid:before", "Before", "/cd"));
+    fake.Add("uuid:during", FakeMediaServers::DescriptionXml("uuid:during", "During", "/cd"));
+    fake.Add("uuid:after", FakeMediaServers::DescriptionXml("uuid:after", "After", "/cd"));
+    fake.AnswerSearches("uuid:before", 600);
+    daemon_ = StartDaemon();
+    WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000);
+    ASSERT_TRUE(RunCommand("ip route del 224.0.0.0/4 dev va"));
+    fake.AnswerSearches("uuid:during", 600);
+    EXPECT_TRUE(Call(14).answered);
+    Json::Value reply;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 2; }, 5000), reply))
+        << ReadFile("/tmp/vanuaudiod.log");
+    ASSERT_TRUE(WaitForLog("no multicast route", 6000)) << ReadFile("/tmp/vanuaudiod.log");
+    ASSERT_TRUE(RunCommand("ip route replace 224.0.0.0/4 dev va"));
+    fake.AnswerSearches("uuid:after", 600);
+    std::this_thread::sleep_for(std::chrono::milliseconds(1100));  // past the search interval
+    EXPECT_TRUE(Call(14).answered);
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 3; }, 5000), reply))
+        << ReadFile("/tmp/vanuaudiod.log");
+    ASSERT_TRUE(WaitForLog("multicast route present again", 5000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    DrainSyslog();
+    const std::string log = ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(CountOf(log, "no multicast route"), 1) << log;
+    EXPECT_EQ(CountOf(log, "multicast route present again"), 1) << log;
+}
+
 // The media servers users have beside ours, found through the real CGI and gone when they stop.
 namespace {
 
