@@ -189,6 +189,7 @@ TEST_F(MiniDlnaInterop, BrowsesFromTheRootDownToEveryTrack) {
     // MiniDLNA scans the 6,000 files in about 3 s on an idle machine; under a parallel build and
     // test run it once took over 40 s, so the wait leaves room below the test's 300 s limit.
     ASSERT_TRUE(WaitForScan(200)) << ReadFile(kRoot + "/minidlnad.out");
+    std::printf("LOG<<%s>>\n", ReadFile(kRoot + "/minidlna.log").c_str());
 
     // Root: the standard containers, Music among them.
     const Browsed root = Browse("0");
