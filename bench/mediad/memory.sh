@@ -20,6 +20,8 @@ page=${PAGE_SIZE:-500}
 ip link set lo up
 mount --make-rprivate /
 for d in /volume1 /var/packages /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
+. "$here/account.sh"
+library_account
 mkdir -p /volume1/music
 
 echo "== library.db of $tracks tracks"
