@@ -4,7 +4,8 @@
 # of the whole "music_all" list fetched as a client must (RequestedCount 0, then on from the next
 # index) and again in pages of PAGE_SIZE. Prints the server process's VmRSS and its peak (VmHWM)
 # after each pass, and glibc's malloc_stats (in use against held from the system) at the start and
-# end when gdb is there. Runs in a private mount and network namespace.
+# end when gdb is there; then the same after a library change (one title changed), whose load
+# holds the old tree beside the new one for a moment. Runs in a private mount and network namespace.
 #   bench/mediad/memory.sh [BUILD_DIR]      (as root; needs python3, curl; gdb for malloc_stats)
 set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd)
@@ -90,5 +91,19 @@ for pass in $(seq 1 "$passes"); do
     paged=$(fetch_all "$page")
     total=$(grep -o 'TotalMatches>[0-9]*' /tmp/reply.xml | grep -o '[0-9]*$' || echo 0)
     echo "pass $pass: $whole + $paged requests (TotalMatches $total), VmRSS $(rss) KiB, peak (VmHWM) $(hwm) KiB"
+    [[ -s /tmp/reply.xml ]] || { echo "no reply; the server's output:"; tail -5 /tmp/mediad.log; }
 done
 malloc_stats end
+
+# A library change: one title changed and the update count moved, as the indexer does; the next
+# request loads the changed library while the old tree is still held, then gives the old one back.
+python3 - <<'PY'
+import sqlite3
+db = sqlite3.connect("/var/packages/Harmona/var/library.db")
+db.execute("UPDATE track SET title = title || ' (changed)' WHERE id = (SELECT MIN(id) FROM track)")
+db.execute("INSERT INTO library_update (id) SELECT COALESCE(MAX(id), 0) + 1 FROM library_update")
+db.commit()
+PY
+before=$(hwm)
+soap 0 50
+echo "after a library change and a page of 50 (TotalMatches $(grep -o 'TotalMatches>[0-9]*' /tmp/reply.xml | grep -o '[0-9]*$' || echo 0)): VmRSS $(rss) KiB, peak (VmHWM) $(hwm) KiB (before the change $before KiB)"

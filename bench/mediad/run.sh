@@ -153,7 +153,7 @@ fetch_all() {  # url object [page size, 0: as many as the server gives] -> secon
     local got=0 requests=0 sum=0 t
     while :; do
         t=$(soap "$1" "$2" "$got" "${3:-0}"); requests=$((requests + 1))
-        sum=$(python3 -c "print($sum + $t)")
+        sum=$(awk -v a="$sum" -v b="$t" 'BEGIN {print a + b}')
         got=$((got + $(returned)))
         [[ "$(returned)" == 0 || "$got" -ge "$(total)" ]] && break
     done
