@@ -51,7 +51,10 @@ PY
 "$build/harmona-mediad" >/tmp/mediad.log 2>&1 &
 mediad=$!
 trap 'stop_process "$mediad"' EXIT
-for _ in $(seq 1 100); do [[ -s /run/vanu/service/3.pid ]] && break; sleep 0.1; done
+# The pid file is written once the server serves 127.0.0.1, after its first load (a minute or more
+# at 1,000,000 tracks on a busy machine).
+for _ in $(seq 1 6000); do [[ -s /run/vanu/service/3.pid ]] && break; sleep 0.1; done
+[[ -s /run/vanu/service/3.pid ]] || { echo "the server did not come up"; exit 1; }
 server=""
 for p in $(pgrep -P "$mediad"); do
     [[ "$(awk '/^Uid:/ {print $2}' /proc/$p/status)" != 0 ]] && server=$p
