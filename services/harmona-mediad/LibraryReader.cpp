@@ -31,6 +31,28 @@ TextRef Cut(std::string& text, std::string_view value) {
     return Add(text, util::CutUtf8(value, kMaxValueBytes));
 }
 
+// Artists, albums and genres repeat over many tracks: each distinct value (as cut) is kept once in
+// the text, the rows refer to it.
+class SharedValues {
+  public:
+    explicit SharedValues(std::string& text) : text_(text) {}
+    TextRef Cut(std::string_view value) {
+        const std::string_view cut = util::CutUtf8(value, kMaxValueBytes);
+        if (cut.empty())
+            return {};
+        const auto found = refs_.find(std::string(cut));
+        if (found != refs_.end())
+            return found->second;
+        const TextRef ref = Add(text_, cut);
+        refs_.emplace(std::string(cut), ref);
+        return ref;
+    }
+
+  private:
+    std::string& text_;
+    std::unordered_map<std::string, TextRef> refs_;
+};
+
 bool HasColumn(Database& db, const char* column) {
     Statement stmt = db.Prepare("PRAGMA table_info(track)");
     while (stmt && stmt.Step() == SQLITE_ROW) {
@@ -78,7 +100,8 @@ bool ReadLibraryRows(const std::string& dbPath, LibraryRows& out, const PathVisi
     const std::string extra = std::string(HasColumn(db, "size") ? "size" : "NULL") + ", " +
                               (HasColumn(db, "art_path") ? "art_path" : "NULL");
     // The rows are counted first: a vector grown row by row holds its old block and one twice
-    // as large at once while it moves them, the peak of a load.
+    // as large at once while it moves them, the peak of a load. The text takes at most all of
+    // their values; what the shared ones leave unused is never touched, so never resident.
     Statement rowCount = db.Prepare(
         "SELECT COUNT(*), SUM(LENGTH(CAST(title AS BLOB)) + "
         "LENGTH(CAST(artist AS BLOB)) + LENGTH(CAST(album AS BLOB)) + "
@@ -94,6 +117,7 @@ bool ReadLibraryRows(const std::string& dbPath, LibraryRows& out, const PathVisi
     if (!stmt)
         return false;
     std::unordered_map<std::string, uint32_t> typeOf;  // lower-case extension -> type
+    SharedValues shared(out.text);
     int step;
     while ((step = stmt.Step()) == SQLITE_ROW) {
         LibraryRow row;
@@ -107,10 +131,10 @@ bool ReadLibraryRows(const std::string& dbPath, LibraryRows& out, const PathVisi
         }
         row.fileType = type->second;
         row.title = Cut(out.text, stmt.ColumnText(2));
-        row.artist = Cut(out.text, stmt.ColumnText(3));
-        row.album = Cut(out.text, stmt.ColumnText(4));
-        row.albumArtist = Cut(out.text, stmt.ColumnText(5));
-        row.genre = Cut(out.text, stmt.ColumnText(6));
+        row.artist = shared.Cut(stmt.ColumnText(3));
+        row.album = shared.Cut(stmt.ColumnText(4));
+        row.albumArtist = shared.Cut(stmt.ColumnText(5));
+        row.genre = shared.Cut(stmt.ColumnText(6));
         row.year = stmt.ColumnInt64(7);
         row.trackNo = stmt.ColumnInt64(8);
         row.discNo = stmt.ColumnInt64(9);
