@@ -20,9 +20,10 @@ page=${PAGE_SIZE:-500}
 . "$here/../../tests/harness/stack.sh"
 ip link set lo up
 mount --make-rprivate /
-for d in /volume1 /var/packages /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
-. "$here/account.sh"
+for d in /volume1 /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
+. "$here/namespace.sh"
 library_account
+private_packages
 mkdir -p /volume1/music
 
 echo "== library.db of $tracks tracks"

@@ -23,9 +23,10 @@ repeats=${REPEATS:-5}
 ip link set lo up
 veth_pair hm0 192.0.2.1 hm1 192.0.2.2
 mount --make-rprivate /
-for d in /volume1 /var/packages /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
-. "$here/account.sh"
+for d in /volume1 /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
+. "$here/namespace.sh"
 library_account
+private_packages
 # MiniDLNA skips MP3 files under 8 KiB ("File too small"): 1.2 s at 44.1 kHz is about 10 KB.
 sox -q -n -r 44100 -c 1 /tmp/template.mp3 synth 1.2 sine 440
 
