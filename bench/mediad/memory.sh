@@ -4,7 +4,8 @@
 # of the whole "music_all" list fetched as a client must (RequestedCount 0, then on from the next
 # index) and again in pages of PAGE_SIZE. Prints the server process's VmRSS and its peak (VmHWM)
 # after each pass, and glibc's malloc_stats (in use against held from the system) at the start and
-# end when gdb is there. Runs in a private mount and network namespace.
+# end when gdb is there; then the same after a library change (one title changed), whose load
+# holds the old tree beside the new one for a moment. Runs in a private mount and network namespace.
 #   bench/mediad/memory.sh [BUILD_DIR]      (as root; needs python3, curl; gdb for malloc_stats)
 set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd)
@@ -19,7 +20,10 @@ page=${PAGE_SIZE:-500}
 . "$here/../../tests/harness/stack.sh"
 ip link set lo up
 mount --make-rprivate /
-for d in /volume1 /var/packages /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
+for d in /volume1 /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
+. "$here/namespace.sh"
+library_account
+private_packages
 mkdir -p /volume1/music
 
 echo "== library.db of $tracks tracks"
@@ -48,7 +52,10 @@ PY
 "$build/harmona-mediad" >/tmp/mediad.log 2>&1 &
 mediad=$!
 trap 'stop_process "$mediad"' EXIT
-for _ in $(seq 1 100); do [[ -s /run/vanu/service/3.pid ]] && break; sleep 0.1; done
+# The pid file is written once the server serves 127.0.0.1, after its first load (a minute or more
+# at 1,000,000 tracks on a busy machine).
+for _ in $(seq 1 6000); do [[ -s /run/vanu/service/3.pid ]] && break; sleep 0.1; done
+[[ -s /run/vanu/service/3.pid ]] || { echo "the server did not come up"; exit 1; }
 server=""
 for p in $(pgrep -P "$mediad"); do
     [[ "$(awk '/^Uid:/ {print $2}' /proc/$p/status)" != 0 ]] && server=$p
@@ -88,5 +95,19 @@ for pass in $(seq 1 "$passes"); do
     paged=$(fetch_all "$page")
     total=$(grep -o 'TotalMatches>[0-9]*' /tmp/reply.xml | grep -o '[0-9]*$' || echo 0)
     echo "pass $pass: $whole + $paged requests (TotalMatches $total), VmRSS $(rss) KiB, peak (VmHWM) $(hwm) KiB"
+    [[ -s /tmp/reply.xml ]] || { echo "no reply; the server's output:"; tail -5 /tmp/mediad.log; }
 done
 malloc_stats end
+
+# A library change: one title changed and the update count moved, as the indexer does; the next
+# request loads the changed library while the old tree is still held, then gives the old one back.
+python3 - <<'PY'
+import sqlite3
+db = sqlite3.connect("/var/packages/Harmona/var/library.db")
+db.execute("UPDATE track SET title = title || ' (changed)' WHERE id = (SELECT MIN(id) FROM track)")
+db.execute("INSERT INTO library_update (id) SELECT COALESCE(MAX(id), 0) + 1 FROM library_update")
+db.commit()
+PY
+before=$(hwm)
+soap 0 50
+echo "after a library change and a page of 50 (TotalMatches $(grep -o 'TotalMatches>[0-9]*' /tmp/reply.xml | grep -o '[0-9]*$' || echo 0)): VmRSS $(rss) KiB, peak (VmHWM) $(hwm) KiB (before the change $before KiB)"

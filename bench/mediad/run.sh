@@ -4,8 +4,9 @@
 # (paged) and a page of 50, and BrowseMetadata of the root, against MiniDLNA and Gerbera serving the
 # same files in the same run; then one track streamed from each, and each server's memory (its
 # serving process's peak resident size, the Pss of all its processes before the first Browse and
-# after the last) and the on-disk size of its database. Runs in a private mount and network
-# namespace.
+# after the last, and each process's share of that) and the on-disk size of its database. Runs in a
+# private mount and network namespace, with the library's account added there when the system has
+# none (harmona-mediad does not serve without it).
 #   bench/mediad/run.sh [BUILD_DIR]      (as root; needs sox, minidlna, gerbera, python3, curl)
 set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd)
@@ -22,7 +23,10 @@ repeats=${REPEATS:-5}
 ip link set lo up
 veth_pair hm0 192.0.2.1 hm1 192.0.2.2
 mount --make-rprivate /
-for d in /volume1 /var/packages /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
+for d in /volume1 /run /tmp; do mkdir -p $d; mount -t tmpfs -o size=4g tmpfs $d; done
+. "$here/namespace.sh"
+library_account
+private_packages
 # MiniDLNA skips MP3 files under 8 KiB ("File too small"): 1.2 s at 44.1 kHz is about 10 KB.
 sox -q -n -r 44100 -c 1 /tmp/template.mp3 synth 1.2 sine 440
 
@@ -107,14 +111,17 @@ procs_of() {  # pid -> the pid and all its descendants
 }
 kib() { awk -v f="$1:" '$1 == f {print $2}' "$2" 2>/dev/null || true; }
 memory_of() {  # label root_pid serving_pid
-    local pss=0 hwm=0 count=0 p v
+    local pss=0 hwm=0 count=0 each="" p v
     for p in $(procs_of "$2"); do
         v=$(kib Pss "/proc/$p/smaps_rollup"); pss=$((pss + ${v:-0}))
+        if [[ "$p" == "$3" ]]; then each="$each serving ${v:-0}"
+        elif [[ "$p" == "$2" ]]; then each="$each first ${v:-0}"
+        else each="$each other ${v:-0}"; fi
         v=$(kib VmHWM "/proc/$p/status"); hwm=$((hwm + ${v:-0}))
         count=$((count + 1))
     done
-    printf '%-34s serving process peak (VmHWM) %7s KiB; %s processes: Pss %7s KiB, peaks added %7s KiB\n' \
-        "$1" "$(kib VmHWM "/proc/$3/status")" "$count" "$pss" "$hwm"
+    printf '%-34s serving process peak (VmHWM) %7s KiB; %s processes: Pss %7s KiB (each:%s), peaks added %7s KiB\n' \
+        "$1" "$(kib VmHWM "/proc/$3/status")" "$count" "$pss" "$each" "$hwm"
 }
 # harmona-mediad's serving process is the supervisor's child that gave up root.
 mediad_server=""
@@ -147,7 +154,7 @@ fetch_all() {  # url object [page size, 0: as many as the server gives] -> secon
     local got=0 requests=0 sum=0 t
     while :; do
         t=$(soap "$1" "$2" "$got" "${3:-0}"); requests=$((requests + 1))
-        sum=$(python3 -c "print($sum + $t)")
+        sum=$(awk -v a="$sum" -v b="$t" 'BEGIN {print a + b}')
         got=$((got + $(returned)))
         [[ "$(returned)" == 0 || "$got" -ge "$(total)" ]] && break
     done

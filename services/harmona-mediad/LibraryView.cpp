@@ -4,7 +4,6 @@
 #include <atomic>
 #include <utility>
 
-#include "platform/medialib/MediaFiles.h"
 #include "services/harmona-mediad/DidlWriter.h"
 #include "services/harmona-mediad/LibraryReader.h"
 #include "services/harmona-mediad/LibraryViewBuilder.h"
@@ -26,10 +25,6 @@ int CompareNoCase(std::string_view a, std::string_view b) {
     return a.size() == b.size() ? 0 : a.size() < b.size() ? -1 : 1;
 }
 
-TrackArt ArtOfImagePath(const std::string& path) {
-    return medialib::LowerExtension(path) == "png" ? TrackArt::png : TrackArt::jpg;
-}
-
 std::string_view ArtExtension(TrackArt art) {
     switch (art) {
         case TrackArt::png:
@@ -48,9 +43,12 @@ std::unique_ptr<LibraryView> LibraryView::Load(const std::string& dbPath,
     auto view = std::unique_ptr<LibraryView>(new LibraryView());
     view->serial_ = ++loads;
     LibraryRows rows;
-    if (!ReadLibraryRows(dbPath, rows))
+    TrackFolders folders(share);
+    if (!ReadLibraryRows(dbPath, rows, [&folders](uint32_t row, std::string_view path) {
+            folders.Add(row, path);
+        }))
         return nullptr;
-    LibraryViewBuilder(*view, share, std::move(rows)).Build();
+    LibraryViewBuilder(*view, std::move(rows), std::move(folders)).Build();
     return view;
 }
 

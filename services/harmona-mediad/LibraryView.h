@@ -30,11 +30,6 @@ struct ViewFileType {
     std::string streamExtension;  // what the stream name ends in ("" for none)
 };
 
-// The art of a track: its cover image, served as "art/<id>.jpg" or ".png".
-enum class TrackArt : uint8_t { none, jpg, png };
-
-// The art of the cover image at `path`: png by its extension, else jpg.
-TrackArt ArtOfImagePath(const std::string& path);
 // The extension of art's URL ("png", "jpg"; "" for none).
 std::string_view ArtExtension(TrackArt art);
 

@@ -108,6 +108,7 @@ void LibraryViewBuilder::Build() {
     // array and the hashes made, the most the load holds at once.
     std::vector<LibraryRow>().swap(rows_);
     std::string().swap(rowText_);
+    trackFolders_ = TrackFolders("");
     decltype(sharedText_)().swap(sharedText_);
     decltype(folders_)().swap(folders_);
     decltype(folderChildren_)().swap(folderChildren_);
@@ -156,15 +157,12 @@ uint32_t LibraryViewBuilder::Folder(const std::string& relative) {
     return index;
 }
 
-// The folder container of a track's path; kNoIndex for a path outside the share or one that is
-// not a plain relative path (those show in the other views only).
-uint32_t LibraryViewBuilder::FolderOf(std::string_view path) {
-    const std::string prefix = share_ + "/";
-    if (path.compare(0, prefix.size(), prefix) != 0)
-        return kNoIndex;
-    const std::string relative(path.substr(prefix.size()));
+void TrackFolders::Add(uint32_t row, std::string_view path) {
+    if (path.compare(0, prefix_.size(), prefix_) != 0)
+        return;
+    const std::string_view relative = path.substr(prefix_.size());
     const std::size_t slash = relative.rfind('/');
-    const std::string folder = slash == std::string::npos ? "" : relative.substr(0, slash);
+    const std::string folder(slash == std::string_view::npos ? "" : relative.substr(0, slash));
     std::size_t start = 0;
     while (!folder.empty() && start <= folder.size()) {
         std::size_t end = folder.find('/', start);
@@ -172,23 +170,21 @@ uint32_t LibraryViewBuilder::FolderOf(std::string_view path) {
             end = folder.size();
         const std::string part = folder.substr(start, end - start);
         if (part.empty() || part == "." || part == "..")
-            return kNoIndex;
+            return;
         start = end + 1;
     }
-    return Folder(folder);
+    const auto [found, added] = numbers_.emplace(folder, static_cast<uint32_t>(folders_.size()));
+    if (added)
+        folders_.push_back(&found->first);
+    inPathOrder_.push_back({row, found->second});
 }
 
 void LibraryViewBuilder::BuildFolders() {
     folderChildren_.resize(view_.containers_.size());
-    std::vector<uint32_t> byPath(rows_.size());
-    std::iota(byPath.begin(), byPath.end(), 0);
-    std::sort(byPath.begin(), byPath.end(),
-              [&](uint32_t a, uint32_t b) { return R(rows_[a].path) < R(rows_[b].path); });
     std::vector<std::vector<uint32_t>> tracksOf;
-    for (const uint32_t i : byPath) {
-        const uint32_t folder = FolderOf(R(rows_[i].path));
-        if (folder == kNoIndex)
-            continue;
+    for (const TrackFolders::Entry& entry : trackFolders_.inPathOrder()) {
+        const uint32_t i = entry.row;
+        const uint32_t folder = Folder(trackFolders_.folder(entry.folder));
         view_.tracks_[i].folderIn = folder;
         if (tracksOf.size() <= folder)
             tracksOf.resize(folder + 1);
@@ -249,13 +245,13 @@ void LibraryViewBuilder::BuildAlbums() {
         const std::string albumArtist(R(row.albumArtist.size != 0 ? row.albumArtist : row.artist));
         const auto [it, added] = byKey.emplace(std::make_pair(name, albumArtist), albums_.size());
         if (added)
-            albums_.push_back(LibraryAlbum{name, albumArtist, {}, 0, 0, {}, 0});
+            albums_.push_back(LibraryAlbum{name, albumArtist, {}, 0, 0, TrackArt::none, 0});
         LibraryAlbum& album = albums_[it->second];
         album.tracks.push_back(i);
         album.year = std::max(album.year, row.year);
         album.latestAdded = std::max(album.latestAdded, row.added);
-        if (album.artPath.empty() && row.artPath.size != 0) {
-            album.artPath = std::string(R(row.artPath));
+        if (album.art == TrackArt::none && row.art != TrackArt::none) {
+            album.art = row.art;
             album.artTrack = row.id;
         }
     }
@@ -275,8 +271,8 @@ void LibraryViewBuilder::BuildAlbums() {
         ViewContainer& container = view_.containers_[index];
         container.artist = SharedText(album.albumArtist);
         container.year = album.year;
-        if (!album.artPath.empty()) {
-            container.art = ArtOfImagePath(album.artPath);
+        if (album.art != TrackArt::none) {
+            container.art = album.art;
             container.artTrack = album.artTrack;
         }
         AddChild(parent, {index, false});

@@ -7,6 +7,7 @@
 
 #include <cstdint>
 #include <string>
+#include <string_view>
 #include <unordered_map>
 #include <utility>
 #include <vector>
@@ -21,17 +22,42 @@ struct LibraryAlbum {
     std::string name, albumArtist;
     std::vector<uint32_t> tracks;
     int64_t year = 0, latestAdded = 0;
-    std::string artPath;  // of its first track that has one
+    TrackArt art = TrackArt::none;  // of its first track that has one
     int64_t artTrack = 0;
+};
+
+// The folder of every track in the share, gathered while library.db gives the paths in their
+// order (ReadLibraryRows): each folder's relative path once, and for each track, in path order,
+// only its row and the folder's number. No path is kept.
+class TrackFolders {
+  public:
+    explicit TrackFolders(std::string share) : prefix_(std::move(share) + "/") {}
+    // A track's path, in path order; one outside the share, or not a plain relative path below
+    // it, has no folder (it shows in the other views only).
+    void Add(uint32_t row, std::string_view path);
+
+    struct Entry {
+        uint32_t row, folder;  // into LibraryRows::rows, folders()
+    };
+    const std::vector<Entry>& inPathOrder() const { return inPathOrder_; }
+    // Relative to the share ("" for the share itself), by number.
+    const std::string& folder(uint32_t number) const { return *folders_[number]; }
+
+  private:
+    std::string prefix_;
+    std::vector<Entry> inPathOrder_;
+    std::unordered_map<std::string, uint32_t> numbers_;
+    std::vector<const std::string*> folders_;  // the keys of numbers_
 };
 
 class LibraryViewBuilder {
   public:
-    LibraryViewBuilder(LibraryView& view, std::string share, LibraryRows rows)
+    LibraryViewBuilder(LibraryView& view, LibraryRows rows, TrackFolders folders)
         : view_(view),
-          share_(std::move(share)),
           rows_(std::move(rows.rows)),
-          rowText_(std::move(rows.text)) {
+          rowText_(std::move(rows.text)),
+          typePaths_(std::move(rows.typePaths)),
+          trackFolders_(std::move(folders)) {
         view_.updateId_ = rows.updateId;
     }
 
@@ -45,7 +71,6 @@ class LibraryViewBuilder {
     void AddChild(uint32_t container, ViewChild child);
     // The children gathered per container, moved into the view's one array.
     void FlattenChildren();
-    uint32_t FolderOf(std::string_view path);
     uint32_t Folder(const std::string& relative);
     void BuildFolders();
     void BuildAlbums();
@@ -66,9 +91,10 @@ class LibraryViewBuilder {
     void HashContents();
 
     LibraryView& view_;
-    std::string share_;
     std::vector<LibraryRow> rows_;
     std::string rowText_;
+    std::vector<std::string> typePaths_;
+    TrackFolders trackFolders_;
     std::string_view R(TextRef ref) const {
         return std::string_view(rowText_).substr(ref.offset, ref.size);
     }

@@ -9,25 +9,17 @@
 
 namespace harmona::mediad {
 void LibraryViewBuilder::TypeTracks() {
-    // The type fields depend on the extension alone: worked out once per extension, and kept
-    // once in the view.
-    std::unordered_map<std::string, uint32_t> typeOf;
+    // The type fields depend on the extension alone: worked out once per extension (from the
+    // first path of each that the rows had), and kept once in the view.
+    for (const std::string& path : typePaths_) {
+        view_.fileTypes_.push_back(ViewFileType{
+            ProtocolInfo(medialib::MimeTypeOfPath(path), medialib::DlnaContentFeatures(path)),
+            medialib::StreamExtensionOf(path)});
+    }
+    std::vector<std::string>().swap(typePaths_);
     for (std::size_t i = 0; i < rows_.size(); ++i) {
-        const LibraryRow& row = rows_[i];
-        ViewTrack& track = view_.tracks_[i];
-        const std::string path(R(row.path));
-        if (row.artPath.size != 0)
-            track.art = ArtOfImagePath(std::string(R(row.artPath)));
-        const std::string extension = medialib::LowerExtension(path);
-        auto type = typeOf.find(extension);
-        if (type == typeOf.end()) {
-            view_.fileTypes_.push_back(ViewFileType{
-                ProtocolInfo(medialib::MimeTypeOfPath(path), medialib::DlnaContentFeatures(path)),
-                medialib::StreamExtensionOf(path)});
-            type =
-                typeOf.emplace(extension, static_cast<uint32_t>(view_.fileTypes_.size() - 1)).first;
-        }
-        track.fileType = type->second;
+        view_.tracks_[i].fileType = rows_[i].fileType;
+        view_.tracks_[i].art = rows_[i].art;
     }
 }
 

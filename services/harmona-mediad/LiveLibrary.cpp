@@ -2,6 +2,7 @@
 
 #include <dirent.h>
 #include <fcntl.h>
+#include <malloc.h>
 #include <poll.h>
 #include <sys/eventfd.h>
 #include <sys/inotify.h>
@@ -245,6 +246,10 @@ void LiveLibrary::IndexNow() {
     }
     const index::IndexReport report =
         index::IndexShare(options_.sharePath, options_.dbPath, &stopping_);
+    // A pass holds every file of the share and every row of library.db at once (about 40 MB at
+    // 100,000 tracks), all freed when it ends; the allocator would keep those pages for this
+    // thread's next pass, minutes or days away. Given back to the system instead.
+    malloc_trim(0);
     lastPass_ = Clock::now();
     ++passes_;
     if (!report.ok) {
