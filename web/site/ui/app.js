@@ -25,8 +25,18 @@ const page = {
   actions: 0,     // user actions so far: each gets the next number when it starts
   errorOf: 0,     // the action whose failure the status line shows (0: none)
 };
-// A user action starts: its number, by which its outcome is ordered among the others.
-const begin = () => ++page.actions;
+// A user action starts: its number, by which its outcome is ordered among the others. What one
+// gesture starts (a click lists a node and opens it) is one action: its parts share the number
+// until the gesture's handler has returned, so that one part's success does not clear another's
+// failure.
+let gesture = 0;
+function begin() {
+  if (gesture === 0) {
+    gesture = ++page.actions;
+    queueMicrotask(() => { gesture = 0; });
+  }
+  return gesture;
+}
 // An action succeeded: an error of an action that started before it is over.
 function succeeded(action) {
   if (page.errorOf !== 0 && page.errorOf < action) showStatus("");

@@ -4,7 +4,7 @@ import { test, before, after } from "node:test";
 import assert from "node:assert/strict";
 import { writeFileSync, unlinkSync } from "node:fs";
 import { FAILURE_WORDS } from "../../site/ui/words/failures.js";
-import { launch, close, openTree, item, childIds, screenshot, baseURL, password } from "./harness.js";
+import { launch, close, openTree, item, childIds, screenshot, password } from "./harness.js";
 import { open, select, listed, expectFailedPane, expectStatus, noPageErrors } from "./failure-checks.js";
 
 let browser;
@@ -14,17 +14,13 @@ after(async () => { await close(browser); });
 const playlists = "/usr/vanu/etc/preference/demo/playlists";
 
 test("an expired login: the pane and the status line say to log in again", async () => {
-  // The browser sends the login itself (no credentials to answer a challenge with), as a page does
-  // whose login the server stops accepting: lighttpd then answers every request with 401.
-  const basic = (secret) => ({ Authorization: "Basic " + Buffer.from(`demo:${secret}`).toString("base64") });
-  const context = await browser.newContext({ baseURL, extraHTTPHeaders: basic(password) });
-  const page = await context.newPage();
-  page.problems = [];
-  page.on("pageerror", (error) => page.problems.push(`page error: ${error.message}`));
-  await page.goto("./");
-  await page.waitForSelector("body[data-ready=true]", { timeout: 20000 });
+  const page = await openTree(browser, "demo");
   await listed(page, "musiclib_music_album");
-  await context.setExtraHTTPHeaders(basic(password + "-no-longer"));
+  // From now on the browser's login is one that the server does not accept: lighttpd answers every
+  // request with 401, also after the browser answered its challenge.
+  const stale = { username: "demo", password: password + "-no-longer" };
+  await page.context().setHTTPCredentials(stale);
+  await page.context().setExtraHTTPHeaders({ Authorization: "Basic " + Buffer.from(`${stale.username}:${stale.password}`).toString("base64") });
   await select(page, "musiclib_music_genre");
   await expectFailedPane(page, "login_expired");
   await expectStatus(page, "login_expired");
