@@ -26,6 +26,8 @@ const api = [];
 let treeBytes = 0;
 let apiBytes = 0;
 let apiTracks = 0;
+// library.cgi's probe of each service (the page asks it after an empty tree reply).
+const probes = { media_server: [], audio_daemon: [] };
 for (let i = 0; i < rounds; i++) {
   // Interleaved, so that both see the same machine load.
   const t = await timed(`webapi/audiotree.cgi?action=gettreenode&node=${encodeURIComponent(node)}`);
@@ -35,6 +37,8 @@ for (let i = 0; i < rounds; i++) {
   api.push(a.ms);
   apiBytes = a.bytes;
   apiTracks = JSON.parse(a.text).tracks.length;
+  for (const service of Object.keys(probes))
+    probes[service].push((await timed(`webapi/library.cgi?action=probe&service=${service}`)).ms);
 }
 
 const browser = await launch();
@@ -85,4 +89,5 @@ const line = (name, values) =>
 console.log(`container ${node}: ${apiTracks} tracks; tree CGI reply ${treeBytes} bytes, library.cgi reply ${apiBytes} bytes; ${rounds} rounds`);
 line("tree CGI browse (gettreenode), baseline", tree);
 line("library.cgi list", api);
+for (const [service, values] of Object.entries(probes)) line(`library.cgi probe ${service}`, values);
 line("page: click to first rows on screen", clicks);

@@ -1,5 +1,6 @@
 #include "src/webapi/LibraryApi.h"
 
+#include <chrono>
 #include <cmath>
 #include <cstdlib>
 #include <cstring>
@@ -16,6 +17,8 @@
 #include "platform/playlist/PlaylistList.h"
 #include "platform/texts/LocalizedStringParser.h"
 #include "src/daemonclient/MediaServerList.h"
+#include "src/webapi/Failure.h"
+#include "src/webapi/ServiceProbe.h"
 
 namespace harmona::webapi {
 
@@ -23,28 +26,12 @@ namespace {
 
 inline constexpr const char* kContentType = "application/json; charset=\"UTF-8\"";
 
-// The error replies: HTTP status, the UI text shown, and a fixed line number that log readers and
-// the page match on.
-inline constexpr const char* kBadRequest = "400 Bad Request";
-inline constexpr const char* kForbidden = "403 Forbidden";
-inline constexpr const char* kNotFound = "404 Not Found";
-inline constexpr const char* kTooLarge = "413 Payload Too Large";
-inline constexpr const char* kBadGateway = "502 Bad Gateway";
-inline constexpr const char* kUnavailable = "503 Service Unavailable";
+// The error replies: the kind of failure (its HTTP status and "error" code, Failure.h), the UI
+// text shown, and a fixed line number that log readers and the page match on.
 inline constexpr const char* kErrorSection = "error";
 inline constexpr const char* kNotFoundKey = "Could not get the entry";
 inline constexpr const char* kSystemSection = "common";
 inline constexpr const char* kSystemKey = "error_system";
-enum ErrorLine : int {
-    kNoPermissionLine = 101,
-    kUnknownActionLine = 102,
-    kUnknownNodeLine = 103,
-    kUnknownStreamLine = 104,
-    kBrowseFailedLine = 105,
-    kNoLibraryLine = 106,
-    kPlaylistUnreadableLine = 107,
-    kPlaylistTooLargeLine = 108,
-};
 
 // Tree node ids of what the page lists (the ids the tree CGI hands out).
 inline constexpr std::string_view kLibraryPrefix = "musiclib_";
@@ -92,13 +79,15 @@ int LibraryApi::Process() {
         return 0;  // the 401 reply is out
     permission_ = admitted.permission;
     if (admitted.admission == cgi::Admission::noPermission)
-        return Fail(kForbidden, kSystemSection, kSystemKey, kNoPermissionLine);
+        return Fail(Failure::requestRefused, kSystemSection, kSystemKey, kNoPermissionLine);
     const char* action = webMan.In("action", "");
     if (std::strcmp(action, "list") == 0)
         return List(webMan.In("node", ""));
     if (std::strcmp(action, "track") == 0)
         return DescribeTrack(webMan.In("stream", ""));
-    return Fail(kBadRequest, kErrorSection, kNotFoundKey, kUnknownActionLine);
+    if (std::strcmp(action, "probe") == 0)
+        return Probe(webMan.In("service", ""));
+    return Fail(Failure::requestInvalid, kErrorSection, kNotFoundKey, kUnknownActionLine);
 }
 
 int LibraryApi::List(const std::string& node) {
@@ -116,7 +105,7 @@ int LibraryApi::List(const std::string& node) {
              !StartsWith(node, kPersonalCategory) && !StartsWith(node, kSharedCategory))
         built = ListBrowsedContainer(node.substr(kLibraryPrefix.size()), reply);
     else
-        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
     if (built == 0)
         return 0;
     PrintResponse(std::move(reply), kContentType);
@@ -125,10 +114,10 @@ int LibraryApi::List(const std::string& node) {
 
 int LibraryApi::DescribeTrack(const char* stream) {
     if (!OpenCatalog())
-        return Fail(kUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
     const std::optional<Track> track = catalog_.ByStreamId(stream);
     if (!track)
-        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownStreamLine);
+        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownStreamLine);
     Json::Value reply(Json::objectValue);
     reply["success"] = true;
     reply["track"] = TrackRow(*track);
@@ -140,14 +129,32 @@ int LibraryApi::BrowseChildren(const std::string& controlUrl, const std::string&
                                DMAParser& parser) {
     DMABrowse browse(BrowseDirectChildren, controlUrl);
     browse.objectId = objectId;
-    if (browse.Prepare() != 0 || parser.Parse(&browse) != 0)
-        return Fail(kBadGateway, kSystemSection, kSystemKey, kBrowseFailedLine);
-    return 1;
+    if (browse.Prepare() != 0)
+        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+    const auto started = std::chrono::steady_clock::now();
+    if (parser.Parse(&browse) == 0)
+        return 1;
+    const long elapsedMs = static_cast<long>(std::chrono::duration_cast<std::chrono::milliseconds>(
+                                                 std::chrono::steady_clock::now() - started)
+                                                 .count());
+    switch (BrowseFailure(parser.Error(), elapsedMs)) {
+        case Failure::nodeGone:
+            return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kBrowsedObjectGoneLine);
+        case Failure::mediaServerTimeout:
+            return Fail(Failure::mediaServerTimeout, kSystemSection, kSystemKey,
+                        kBrowseTimedOutLine);
+        case Failure::tooLarge:
+            return Fail(Failure::tooLarge, kSystemSection, kSystemKey, kBrowseTooLargeLine);
+        case Failure::mediaServerInvalid:
+            return Fail(Failure::mediaServerInvalid, kSystemSection, kSystemKey, kBrowseFailedLine);
+        default:
+            return Fail(Failure::mediaServerDown, kSystemSection, kSystemKey, kBrowseFailedLine);
+    }
 }
 
 int LibraryApi::ListBrowsedContainer(const std::string& objectId, Json::Value& reply) {
     if (!OpenCatalog())
-        return Fail(kUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
     DMAParser parser;
     if (BrowseChildren(paths::kLocalMediaServerControlUrl, objectId, parser) == 0)
         return 0;
@@ -178,17 +185,31 @@ int LibraryApi::ListBrowsedContainer(const std::string& objectId, Json::Value& r
 int LibraryApi::ListMediaServer(const std::string& node, const std::string& objectId,
                                 Json::Value& reply) {
     if ((permission_ & cgi::kPermissionMediaServer) == 0)
-        return Fail(kForbidden, kSystemSection, kSystemKey, kNoPermissionLine);
+        return Fail(Failure::requestRefused, kSystemSection, kSystemKey, kNoPermissionLine);
     // Only a server that the audio daemon lists right now is browsed, by the control URL it gave:
     // a request never makes this program connect to an address of its own choosing.
     const std::string controlUrl = node.substr(kMediaServerPrefix.size());
+    // Nor one whose control URL names this machine or a link-local host, whoever listed it.
+    if (!dma::IsNetworkHostUrl(controlUrl))
+        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
     bool listed = false;
     daemonclient::ReadMediaServerList([&](const daemonclient::ListedMediaServer& server) {
         listed = listed || server.controlUrl == controlUrl;
     });
-    // Nor one whose control URL names this machine or a link-local host, whoever listed it.
-    if (!listed || !dma::IsNetworkHostUrl(controlUrl))
-        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+    if (!listed) {
+        // Not listed: gone from the network, or the daemon that lists servers cannot say.
+        switch (ProbeAudioDaemon()) {
+            case ServiceState::down:
+                return Fail(Failure::audioDaemonDown, kSystemSection, kSystemKey,
+                            kAudioDaemonDownLine);
+            case ServiceState::notAnswering:
+                return Fail(Failure::audioDaemonTimeout, kSystemSection, kSystemKey,
+                            kAudioDaemonTimedOutLine);
+            case ServiceState::running:
+                break;
+        }
+        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+    }
     DMAParser parser;
     if (BrowseChildren(controlUrl, objectId, parser) == 0)
         return 0;
@@ -216,28 +237,33 @@ int LibraryApi::ListPersonalPlaylist(const std::string& name, Json::Value& reply
     const playlist::PlaylistFileEntries entries = playlist::ReadPersonalPlaylist(
         webMan.GetPreferenceDir().c_str(), name, medialib::AudioSharePath());
     if (entries.status == playlist::PlaylistFileStatus::missing)
-        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
     return ListPlaylistEntries(entries, reply);
 }
 
 int LibraryApi::ListSharedPlaylist(const std::string& id, Json::Value& reply) {
     if (id.empty() || id.size() > 10 || id.find_first_not_of("0123456789") != std::string::npos)
-        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
     if (!OpenCatalog())
-        return Fail(kUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
     const auto paths = catalog_.SharedPlaylistPaths(std::strtoll(id.c_str(), nullptr, 10),
                                                     playlist::kMaxPlaylistEntries);
     if (!paths)
-        return Fail(kNotFound, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
     if (paths->tooLarge)
-        return Fail(kTooLarge, kSystemSection, kSystemKey, kPlaylistTooLargeLine);
+        return Fail(Failure::tooLarge, kSystemSection, kSystemKey, kPlaylistTooLargeLine);
     AppendPlaylistTracks(paths->paths, reply);
     return 1;
 }
 
 int LibraryApi::ListRandomPlaylist(Json::Value& reply) {
-    // The file that "New Random 100" drew for this user; none yet is an empty list.
-    return ListPlaylistFile(paths::kRandom100Prefix + webMan.GetLoginUserName(), reply, true);
+    // The file that "New Random 100" drew for this user; none yet is an empty list, marked as not
+    // drawn so that the page can draw one.
+    const std::string file = paths::kRandom100Prefix + webMan.GetLoginUserName();
+    const playlist::PlaylistFileEntries entries =
+        playlist::ReadPlaylistFile(file, medialib::AudioSharePath());
+    reply["drawn"] = entries.status != playlist::PlaylistFileStatus::missing;
+    return ListPlaylistEntries(entries, reply, true);
 }
 
 int LibraryApi::ListPlaylistFile(const std::string& file, Json::Value& reply, bool missingIsEmpty) {
@@ -250,11 +276,12 @@ int LibraryApi::ListPlaylistEntries(const playlist::PlaylistFileEntries& entries
     if (entries.status == playlist::PlaylistFileStatus::missing && missingIsEmpty)
         return 1;
     if (entries.status == playlist::PlaylistFileStatus::tooLarge)
-        return Fail(kTooLarge, kSystemSection, kSystemKey, kPlaylistTooLargeLine);
+        return Fail(Failure::tooLarge, kSystemSection, kSystemKey, kPlaylistTooLargeLine);
     if (entries.status != playlist::PlaylistFileStatus::ok)
-        return Fail(kNotFound, kErrorSection, kNotFoundKey, kPlaylistUnreadableLine);
+        return Fail(Failure::playlistUnreadable, kErrorSection, kNotFoundKey,
+                    kPlaylistUnreadableLine);
     if (!OpenCatalog())
-        return Fail(kUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
     AppendPlaylistTracks(entries.paths, reply);
     return 1;
 }
@@ -275,13 +302,14 @@ bool LibraryApi::OpenCatalog() {
     return catalog_.Open(paths::kLibraryDb);
 }
 
-int LibraryApi::Fail(const char* status, const char* section, const char* key, int line) {
+int LibraryApi::Fail(Failure failure, const char* section, const char* key, int line) {
     Json::Value reply(Json::objectValue);
     SetError(reply, section, key, line);
+    reply["error"] = FailureCode(failure);
     const Json::Value texts = VANU::ZET::LocalizedStringParser::ParseTexts(
         std::string(paths::kTextsPrefix) + webMan.GetUILanguage());
     reply["message"] = texts[section][key].asString();
-    PrintResponse(std::move(reply), kContentType, status);
+    PrintResponse(std::move(reply), kContentType, FailureStatus(failure));
     return 0;
 }
 

@@ -4,6 +4,8 @@
 //     [&object=<object id>]          for a media server on the network: that container of it
 //                                    (default its root, "0"); its containers only
 //   action=track&stream=<stream id>  one track's metadata (404 when the library has no such track)
+//   action=probe&service=<name>      whether the media server or the audio daemon answers
+// Every error reply carries a stable "error" code (Failure.h).
 // Tracks carry stream ids only (TrackCatalog.h); the page plays "/media/<stream id>", which the
 // web server passes on to the local media server behind the same login.
 #pragma once
@@ -15,6 +17,7 @@
 #include "platform/cgi/ActionHandler.h"
 #include "platform/dma/DMAParser.h"
 #include "platform/playlist/PlaylistFile.h"
+#include "src/webapi/Failure.h"
 #include "src/webapi/TrackCatalog.h"
 
 namespace harmona::webapi {
@@ -28,6 +31,8 @@ class LibraryApi : public ActionHandler {
   private:
     int List(const std::string& node);
     int DescribeTrack(const char* stream);
+    // Whether `service` ("media_server" or "audio_daemon") answers (ProbeAction.cpp).
+    int Probe(const std::string& service);
 
     // The builders of a list reply; each fills `reply` or answers an error itself and returns 0.
     int ListBrowsedContainer(const std::string& objectId, Json::Value& reply);
@@ -52,7 +57,7 @@ class LibraryApi : public ActionHandler {
     bool OpenCatalog();
 
     // An error reply: the HTTP status, the error envelope and its text in the user's language.
-    int Fail(const char* status, const char* section, const char* key, int line);
+    int Fail(Failure failure, const char* section, const char* key, int line);
 
     TrackCatalog catalog_;
     int permission_ = 0;  // the user's audio permission bits

@@ -8,6 +8,7 @@
 
 #include <string>
 
+#include "src/webapi/Failure.h"
 #include "tests/harness/CgiRunner.h"
 #include "tests/harness/Fixtures.h"
 #include "tests/harness/Network.h"
@@ -386,6 +387,171 @@ TEST_F(LibraryApi, UnknownActionsAndNodesGetClearErrors) {
         EXPECT_NE(r.Header("Status").find("404"), std::string::npos) << node << r.output;
         EXPECT_TRUE(r.jsonOk) << node;
     }
+}
+
+// --- the failure kinds: a stable "error" code beside the status and the errinfo -----------------
+
+std::string StatusOf(const CgiResult& r) {
+    return r.Header("Status");
+}
+
+CgiResult Probe(const std::string& service, const std::string& user = "admin") {
+    return Api({{"action", "probe"}, {"service", service}}, user);
+}
+
+TEST_F(LibraryApi, EveryErrorReplyCarriesTheStableCodeOfItsKind) {
+    MakeGeneratedLibrary(3);
+    const CgiResult noAction = Api({{"action", "nothing"}});
+    EXPECT_NE(StatusOf(noAction).find("400"), std::string::npos) << noAction.output;
+    EXPECT_EQ(noAction.json["error"].asString(), "request_invalid");
+    const CgiResult unknown = ListNode("musiclib_music_personal/playlist/Absent");
+    EXPECT_EQ(unknown.json["error"].asString(), "node_gone");
+    const CgiResult stream = Api({{"action", "track"}, {"stream", "99.mp3"}});
+    EXPECT_EQ(stream.json["error"].asString(), "node_gone");
+    EXPECT_EQ(stream.json["errinfo"]["line"].asInt(), 104);
+    AddUser("admin", 1 | 4 | 16);
+    const CgiResult refused = ListNode(std::string("mediaserver_") + kNetworkServerUrl);
+    EXPECT_NE(StatusOf(refused).find("403"), std::string::npos) << refused.output;
+    EXPECT_EQ(refused.json["error"].asString(), "request_refused");
+    AddUser("admin", 0);
+    const CgiResult noAudio = ListNode("musiclib_random");
+    EXPECT_EQ(noAudio.json["error"].asString(), "request_refused");
+}
+
+TEST_F(LibraryApi, AStoppedLocalMediaServerIsSaidToBeDown) {
+    MakeGeneratedLibrary(1);
+    const CgiResult r = ListNode("musiclib_music_album");  // nothing listens on 50003
+    EXPECT_NE(StatusOf(r).find("502"), std::string::npos) << r.output;
+    ASSERT_TRUE(r.jsonOk) << r.body;
+    EXPECT_EQ(r.json["error"].asString(), "media_server_down");
+    EXPECT_EQ(r.json["errinfo"]["line"].asInt(), 105);
+}
+
+TEST_F(LibraryApi, AContainerTheMediaServerNoLongerHoldsIsGoneNotAServerFault) {
+    MakeGeneratedLibrary(1);
+    ContentTree tree;
+    tree.AddContainer("music_album", "album:A/First", "First Album");
+    server.ServeTree(tree);
+    ASSERT_TRUE(server.Start());
+    const CgiResult r = ListNode("musiclib_album:A/Removed");  // UPnP error 701 from the server
+    EXPECT_NE(StatusOf(r).find("404"), std::string::npos) << r.output;
+    ASSERT_TRUE(r.jsonOk) << r.body;
+    EXPECT_EQ(r.json["error"].asString(), "node_gone");
+    EXPECT_EQ(r.json["errinfo"]["line"].asInt(), 110);
+    EXPECT_EQ(r.json["message"].asString(), "Could not get the entry.");
+}
+
+TEST_F(LibraryApi, AMediaServerAnsweringWithSomethingElseIsNotCalledGone) {
+    MakeGeneratedLibrary(1);
+    server.Enqueue(Reply("<html>not a browse reply</html>"));
+    ASSERT_TRUE(server.Start());
+    const CgiResult r = ListNode("musiclib_music_album");
+    EXPECT_NE(StatusOf(r).find("502"), std::string::npos) << r.output;
+    EXPECT_EQ(r.json["error"].asString(), "media_server_invalid");
+}
+
+TEST_F(LibraryApi, BrowseFailuresAreToldApartByWhatTheClientSaw) {
+    using harmona::webapi::BrowseFailure;
+    using harmona::webapi::Failure;
+    EXPECT_EQ(BrowseFailure("Couldn't connect to server", 3), Failure::mediaServerDown);
+    EXPECT_EQ(BrowseFailure("Server returned nothing (no headers, no data)", 5),
+              Failure::mediaServerDown);
+    EXPECT_EQ(BrowseFailure("Timeout was reached", 20000), Failure::mediaServerTimeout);
+    EXPECT_EQ(BrowseFailure("Timeout was reached", 2001), Failure::mediaServerTimeout);
+    EXPECT_EQ(BrowseFailure("no whole reply within the time limit", 20001),
+              Failure::mediaServerTimeout);
+    EXPECT_EQ(BrowseFailure("Failure when receiving data from the peer", 20000),
+              Failure::mediaServerTimeout);
+    EXPECT_EQ(BrowseFailure("HTTP status 500", 4), Failure::nodeGone);
+    EXPECT_EQ(BrowseFailure("SOAP fault", 4), Failure::nodeGone);
+    EXPECT_EQ(BrowseFailure("too large: more than 200000 objects", 4), Failure::tooLarge);
+    EXPECT_EQ(BrowseFailure("not a BrowseResponse", 4), Failure::mediaServerInvalid);
+    EXPECT_EQ(BrowseFailure("Result is not DIDL-Lite", 4), Failure::mediaServerInvalid);
+}
+
+TEST_F(LibraryApi, ProbeTellsARunningAStoppedAndAHungLocalMediaServerApart) {
+    const CgiResult down = Probe("media_server");
+    EXPECT_NE(StatusOf(down).find("502"), std::string::npos) << down.output;
+    EXPECT_EQ(down.json["error"].asString(), "media_server_down");
+    {
+        ScriptedHttpServer hung;
+        ScriptedReply late = Reply("late");
+        late.delayMs = 8000;
+        hung.Enqueue(late);
+        ASSERT_TRUE(hung.Start());
+        const CgiResult r = Probe("media_server");
+        EXPECT_FALSE(r.timedOut);
+        EXPECT_NE(StatusOf(r).find("504"), std::string::npos) << r.output;
+        EXPECT_EQ(r.json["error"].asString(), "media_server_timeout");
+        EXPECT_EQ(r.json["errinfo"]["line"].asInt(), 109);
+    }
+    ASSERT_TRUE(server.Start());  // answers 404 to anything: it answers
+    const CgiResult up = Probe("media_server");
+    ASSERT_TRUE(up.jsonOk) << up.output;
+    EXPECT_TRUE(up.json["success"].asBool());
+    EXPECT_EQ(up.json["service"].asString(), "media_server");
+}
+
+TEST_F(LibraryApi, ProbeTellsARunningAStoppedAndAHungAudioDaemonApart) {
+    const CgiResult down = Probe("audio_daemon");
+    EXPECT_NE(StatusOf(down).find("503"), std::string::npos) << down.output;
+    EXPECT_EQ(down.json["error"].asString(), "audio_daemon_down");
+    {
+        ScriptedDaemon silent([](const DaemonRequest&) { return DaemonAnswer::Never(); });
+        const CgiResult r = Probe("audio_daemon");
+        EXPECT_NE(StatusOf(r).find("504"), std::string::npos) << r.output;
+        EXPECT_EQ(r.json["error"].asString(), "audio_daemon_timeout");
+    }
+    {
+        DaemonOptions stopped;
+        stopped.accept = false;
+        stopped.backlog = 1;
+        ScriptedDaemon notAccepting(ServeMediaServers({}), stopped);
+        for (int i = 0; i < 3; ++i) {
+            const CgiResult r = Probe("audio_daemon");
+            EXPECT_EQ(r.json["error"].asString(), "audio_daemon_timeout") << i;
+        }
+    }
+    ScriptedDaemon daemon(ServeMediaServers({}));
+    const CgiResult up = Probe("audio_daemon");
+    ASSERT_TRUE(up.jsonOk) << up.output;
+    EXPECT_TRUE(up.json["success"].asBool());
+    const CgiResult unknown = Probe("elsewhere");
+    EXPECT_NE(StatusOf(unknown).find("400"), std::string::npos) << unknown.output;
+    EXPECT_EQ(unknown.json["error"].asString(), "request_invalid");
+    AddUser("admin", 1 | 4 | 16);
+    EXPECT_EQ(Probe("audio_daemon").json["error"].asString(), "request_refused");
+}
+
+TEST_F(LibraryApi, AMediaServerListingSaysWhenTheAudioDaemonIsDownOrHung) {
+    const std::string node = std::string("mediaserver_") + kNetworkServerUrl;
+    const CgiResult down = ListNode(node);
+    EXPECT_NE(StatusOf(down).find("503"), std::string::npos) << down.output;
+    EXPECT_EQ(down.json["error"].asString(), "audio_daemon_down");
+    {
+        ScriptedDaemon silent([](const DaemonRequest&) { return DaemonAnswer::Never(); });
+        const CgiResult hung = ListNode(node);
+        EXPECT_NE(StatusOf(hung).find("504"), std::string::npos) << hung.output;
+        EXPECT_EQ(hung.json["error"].asString(), "audio_daemon_timeout");
+    }
+    ScriptedDaemon daemon(ServeMediaServers({}));  // running, but the server left the network
+    const CgiResult gone = ListNode(node);
+    EXPECT_NE(StatusOf(gone).find("404"), std::string::npos) << gone.output;
+    EXPECT_EQ(gone.json["error"].asString(), "node_gone");
+}
+
+TEST_F(LibraryApi, RandomNodeSaysWhetherTheUserHasADrawYet) {
+    MakeGeneratedLibrary(5);
+    const CgiResult before = ListNode("musiclib_random");
+    ASSERT_TRUE(before.jsonOk) << before.body;
+    EXPECT_FALSE(before.json["drawn"].asBool());
+    CgiRequest draw;
+    draw.queryString = "action=rerandom100";
+    ASSERT_EQ(RunCgi(draw).exitStatus, 1);
+    const CgiResult after = ListNode("musiclib_random");
+    ASSERT_TRUE(after.jsonOk) << after.body;
+    EXPECT_TRUE(after.json["drawn"].asBool());
+    EXPECT_EQ(after.json["tracks"].size(), 5u);
 }
 
 }  // namespace

@@ -3,8 +3,10 @@
 import { parseReply, decodeEntities, languageFromTags, safeIcon, isLazyContainer, nodesOf, REFRESH_TARGETS, BUTTON_IDS } from "./reply.js";
 import { LABELS, HTML_LANG } from "./labels.js";
 import { createListener, isListable } from "./listen.js";
+import { failureCode, readApiReply, splitTracks, isBrowsedLibraryNode } from "./failures.js";
 
 const CGI = "webapi/audiotree.cgi";
+const API = "webapi/library.cgi";
 const UILANG = "webapi/uilang.cgi";
 const BLANK = "3rdparty/Harmona/images/s.gif";
 // The keep-alive period; ?keepalive=SECONDS overrides it (the browser tests use a short one).
@@ -20,7 +22,25 @@ const page = {
   labels: LABELS.enu,
   keepAlives: 0,
   listener: null, // the pane's listing and the player (listen.js)
+  actions: 0,     // user actions so far: each gets the next number when it starts
+  errorOf: 0,     // the action whose failure the status line shows (0: none)
 };
+// A user action starts: its number, by which its outcome is ordered among the others. What one
+// gesture starts (a click lists a node and opens it) is one action: its parts share the number
+// until the gesture's handler has returned, so that one part's success does not clear another's
+// failure.
+let gesture = 0;
+function begin() {
+  if (gesture === 0) {
+    gesture = ++page.actions;
+    queueMicrotask(() => { gesture = 0; });
+  }
+  return gesture;
+}
+// An action succeeded: an error of an action that started before it is over.
+function succeeded(action) {
+  if (page.errorOf !== 0 && page.errorOf < action) showStatus("");
+}
 const nodeData = new WeakMap(); // li -> the node object as the server sent it
 const $ = (id) => document.getElementById(id);
 
@@ -45,6 +65,25 @@ async function call(params) {
   return parseReply(text);
 }
 
+// Whether a service behind the lists answers (library.cgi's probe): {kind: "ok"} or a failure.
+async function probe(service) {
+  try {
+    const response = await fetch(`${API}?${new URLSearchParams({ action: "probe", service })}`, {
+      credentials: "same-origin",
+      cache: "no-store",
+    });
+    let body = null;
+    try {
+      body = await response.json();
+    } catch {
+      // below
+    }
+    return readApiReply(response.status, body);
+  } catch {
+    return { kind: "offline" };
+  }
+}
+
 // --- status line -----------------------------------------------------------------------------------
 function format(template, values) {
   return template.replace(/\{(\w+)\}/g, (_, name) => String(values[name] ?? ""));
@@ -56,14 +95,24 @@ function serverText(section, key) {
 function showStatus(message, isError = false) {
   const status = $("status");
   delete status.dataset.errinfo;
+  delete status.dataset.error;
+  page.errorOf = 0;
   status.textContent = message;
   status.classList.toggle("error", isError);
   status.setAttribute("role", isError ? "alert" : "status");
   status.title = "";
 }
-// Shows what went wrong with a reply that was not what the action expects.
-function showFailure(reply) {
-  if (reply.kind === "error") {
+// Shows what went wrong with a reply that was not what the action expects; `action` is the
+// number of the action that failed (a later success clears it).
+function showFailure(reply, action = begin()) {
+  const code = failureCode(reply);
+  if (code && page.labels.failures?.[code]) {
+    showStatus(page.labels.failures[code], true);
+    $("status").dataset.error = code;
+    if (reply.errinfo) $("status").title = `${reply.errinfo.sec} / ${reply.errinfo.key}${reply.errinfo.line != null ? " : " + reply.errinfo.line : ""}`;
+  } else if (reply.kind === "error" && typeof reply.message === "string" && reply.message !== "") {
+    showStatus(reply.message, true);
+  } else if (reply.kind === "error") {
     const { sec, key, line } = reply.errinfo;
     showStatus(serverText(sec, key) ?? format(page.labels.unknownError, { sec, key }), true);
     $("status").title = `${sec} / ${key}${line != null ? " : " + line : ""}`;
@@ -77,6 +126,7 @@ function showFailure(reply) {
   } else {
     showStatus(page.labels.badReply, true);
   }
+  page.errorOf = action;
 }
 
 // --- tree ------------------------------------------------------------------------------------------
@@ -125,11 +175,24 @@ function renderNode(node, depth) {
   return li;
 }
 
+// The tree holds containers only: the tracks among `nodes` are listed in the pane, never drawn
+// here; a container of tracks alone says so instead.
 function fillGroup(li, nodes) {
   const group = li.querySelector(":scope > ul");
   const depth = Number(li.dataset.depth) + 1;
-  group.replaceChildren(...nodes.map((node) => renderNode(node, depth)));
-  if (nodes.length === 0) showEmpty(li);
+  const { containers, tracks } = splitTracks(nodes);
+  group.replaceChildren(...containers.map((node) => renderNode(node, depth)));
+  li.dataset.tracks = String(tracks);
+  if (containers.length > 0) return;
+  if (tracks === 0) {
+    showEmpty(li);
+    return;
+  }
+  const note = document.createElement("li");
+  note.className = "note";
+  note.setAttribute("role", "none");
+  note.textContent = page.labels.tracksInList;
+  group.replaceChildren(note);
 }
 function showEmpty(li) {
   const group = li.querySelector(":scope > ul");
@@ -147,16 +210,25 @@ async function expand(li) {
     fillGroup(li, nodesOf(node.children));
     li.dataset.state = "loaded";
   } else if (li.dataset.state === "lazy" || li.dataset.state === "failed") {
+    const action = begin();
     li.dataset.state = "loading";
     li.setAttribute("aria-busy", "true");
-    const reply = await call({ action: "gettreenode", node: node.id });
+    let reply = await call({ action: "gettreenode", node: node.id });
+    // The tree CGI answers a failed browse of the library as an empty one: an empty container
+    // is shown empty only while the media server answers.
+    if (reply.kind === "nodes" && reply.nodes.length === 0 && isBrowsedLibraryNode(node.id)) {
+      const server = await probe("media_server");
+      if (server.kind !== "ok") reply = server;
+    }
     li.removeAttribute("aria-busy");
     if (reply.kind === "nodes") {
       fillGroup(li, reply.nodes);
       li.dataset.state = "loaded";
+      succeeded(action);
     } else {
       li.dataset.state = "failed";
-      showFailure(reply);
+      li.setAttribute("aria-expanded", "false");
+      showFailure(reply, action);
       return;
     }
   }
@@ -173,7 +245,8 @@ function toggle(li) {
   else expand(li);
 }
 
-function select(li) {
+// `keyboard`: moved to by the arrow keys, so the pane lists it only once the keys rest.
+function select(li, { keyboard = false } = {}) {
   for (const old of document.querySelectorAll('li[aria-selected="true"]')) old.setAttribute("aria-selected", "false");
   li.setAttribute("aria-selected", "true");
   const row = li.querySelector(":scope > .row");
@@ -185,7 +258,7 @@ function select(li) {
   $("selected-id").textContent = typeof node.id === "string" ? node.id : "";
   $("selected-icon").src = safeIcon(node.icon) ?? BLANK;
   if (page.listener) {
-    if (isListable(node.id)) page.listener.show(node.id, decodeEntities(node.text));
+    if (isListable(node.id)) page.listener.show(node.id, decodeEntities(node.text), undefined, { defer: keyboard ? 300 : 0 });
     else page.listener.hide();
   }
 }
@@ -195,11 +268,18 @@ async function refresh(buttonLi) {
   const target = REFRESH_TARGETS[buttonLi.dataset.id];
   const category = buttonLi.parentElement.closest("li[role=treeitem]");
   if (!category || category.getAttribute("aria-busy") === "true") return;
+  const action = begin();
   category.setAttribute("aria-busy", "true");
-  const reply = await call({ action: "refresh", target });
+  let reply = await call({ action: "refresh", target });
+  // The tree CGI answers a search that the audio daemon could not make as one that found no
+  // server: no server found counts only while the daemon answers; the old list stays otherwise.
+  if (reply.kind === "success" && target === "mediaserver" && reply.items.length === 0) {
+    const daemon = await probe("audio_daemon");
+    if (daemon.kind !== "ok") reply = daemon;
+  }
   category.removeAttribute("aria-busy");
   if (reply.kind !== "success") {
-    showFailure(reply);
+    showFailure(reply, action);
     return;
   }
   const group = category.querySelector(":scope > ul");
@@ -228,12 +308,12 @@ function onKey(event) {
   const expanded = li.getAttribute("aria-expanded");
   switch (event.key) {
     case "Enter": case " ": activate(li); break;
-    case "ArrowDown": if (rows[at + 1]) select(rows[at + 1]); break;
-    case "ArrowUp": if (at > 0) select(rows[at - 1]); break;
+    case "ArrowDown": if (rows[at + 1]) select(rows[at + 1], { keyboard: true }); break;
+    case "ArrowUp": if (at > 0) select(rows[at - 1], { keyboard: true }); break;
     case "ArrowRight": if (expanded === "false") expand(li); break;
     case "ArrowLeft":
       if (expanded === "true") collapse(li);
-      else { const parent = li.parentElement.closest("li[role=treeitem]"); if (parent) select(parent); }
+      else { const parent = li.parentElement.closest("li[role=treeitem]"); if (parent) select(parent, { keyboard: true }); }
       break;
     default: return;
   }
@@ -241,24 +321,27 @@ function onKey(event) {
 }
 
 // --- actions ---------------------------------------------------------------------------------------
+// One Random 100: the user's own draw, which this button makes afresh and which the tree's
+// Random 100 node lists in the pane (the tree shows no tracks of it). `quiet`: drawn because the
+// node was opened before any draw, said nowhere.
+const RANDOM_NODE = "musiclib_random";
+async function draw(quiet) {
+  const action = begin();
+  const reply = await call({ action: "rerandom100" });
+  if (reply.kind !== "success") {
+    showFailure(reply, action);
+    return false;
+  }
+  if (!quiet) showStatus(page.labels.rerandomDone);
+  document.body.dataset.rerandom = String(Number(document.body.dataset.rerandom ?? 0) + 1);
+  return true;
+}
 async function rerandom() {
   const button = $("rerandom");
   button.disabled = true;
-  const reply = await call({ action: "rerandom100" });
+  const drawn = await draw(false);
   button.disabled = false;
-  if (reply.kind !== "success") {
-    showFailure(reply);
-    return;
-  }
-  showStatus(page.labels.rerandomDone);
-  document.body.dataset.rerandom = String(Number(document.body.dataset.rerandom ?? 0) + 1);
-  // The random container shows the new draw the next time it is opened.
-  for (const li of document.querySelectorAll('li[data-id="musiclib_random"]')) {
-    if (li.dataset.state === "loaded") {
-      li.dataset.state = "lazy";
-      if (li.getAttribute("aria-expanded") === "true") expand(li);
-    }
-  }
+  if (drawn) page.listener.reload(RANDOM_NODE);
 }
 
 async function keepAlive() {
@@ -304,11 +387,19 @@ async function start() {
   $("rerandom").addEventListener("click", rerandom);
   page.listener = createListener({
     labels: page.labels,
-    onFailure: (reply) =>
-      reply.kind === "error" && typeof reply.message === "string" && reply.message !== ""
-        ? showStatus(reply.message, true)
-        : showFailure(reply.kind === "error" ? { kind: "error", errinfo: reply.errinfo } : reply),
+    begin,
+    onFailure: (reply, action, node) => {
+      showFailure(reply, action);
+      // A node that no longer exists is marked so in the tree.
+      if (failureCode(reply) === "node_gone")
+        for (const li of document.querySelectorAll("#tree li[role=treeitem]")) if (li.dataset.id === node) li.dataset.gone = "true";
+    },
+    onSuccess: (action, node) => {
+      succeeded(action);
+      for (const li of document.querySelectorAll("#tree li[role=treeitem][data-gone]")) if (li.dataset.id === node) delete li.dataset.gone;
+    },
     onStatus: showStatus,
+    drawRandom: () => draw(true),
   });
 
   const tree = $("tree");

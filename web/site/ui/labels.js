@@ -1,5 +1,6 @@
 // The page's own words (the node texts come from the server; the server's error texts from
 // texts.json, generated from data/texts/ at build time). Keyed by the platform's language codes.
+import { FAILURE_WORDS } from "./words/failures.js";
 export const LABELS = {
   enu: {
     title: "Harmona Audio", tree: "Audio sources", rerandom: "New Random 100",
@@ -70,6 +71,10 @@ export const LABELS = {
     unknownError: "錯誤 {sec} / {key}", offline: "無法連線至伺服器。",
   },
 };
+
+// Each feature's own words (words/*.js), one dictionary per language code, merged in.
+for (const words of [FAILURE_WORDS])
+  for (const [code, dictionary] of Object.entries(words)) LABELS[code] = { ...LABELS[code], ...dictionary };
 
 // The page's BCP 47 tag for a language code (the html lang attribute).
 export const HTML_LANG = { enu: "en", ger: "de", fre: "fr", spn: "es", ita: "it", jpn: "ja", chs: "zh-Hans", cht: "zh-Hant" };

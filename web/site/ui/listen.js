@@ -1,6 +1,8 @@
 // The right-hand pane: what the selected node holds (from webapi/library.cgi) and the player.
 // A list of any length is drawn as a window of rows over a spacer of its full height: only the
 // rows in view (and a few around them) exist in the document, so 10,000 tracks scroll smoothly.
+import { failureCode, readApiReply } from "./failures.js";
+
 const API = "webapi/library.cgi";
 const ROW_HEIGHT = 28; // px; .track in app.css has the same height
 const OVERSCAN = 8;    // rows drawn above and below the visible ones
@@ -22,64 +24,110 @@ export function formatDuration(seconds) {
 
 const $ = (id) => document.getElementById(id);
 
-export function createListener({ labels, onFailure, onStatus }) {
+export function createListener({ labels, onFailure, onStatus, onSuccess = () => {}, begin = () => 0, drawRandom = async () => false }) {
   const state = {
     list: { node: "", containers: [], tracks: [] }, // what the pane shows
     queue: [],          // the tracks being played, in order
     queueNode: "",      // the node the queue came from
     index: -1,          // the playing track in the queue
+    cursor: -1,         // the row that the keyboard is on
     request: 0,         // the newest list request; older replies are dropped
+    abort: null,        // aborts the list request in flight
+    pending: 0,         // a deferred show (keyboard moves through the tree)
   };
   const audio = $("audio");
   const viewport = $("tracks");
   const spacer = $("tracks-spacer");
 
   // `object`: a container of a media server on the network (its root when absent).
-  async function fetchList(node, object) {
+  async function fetchList(node, object, signal) {
     const params = { action: "list", node };
     if (typeof object === "string") params.object = object;
     let response;
+    let body = null;
     try {
       response = await fetch(`${API}?${new URLSearchParams(params)}`, {
         credentials: "same-origin",
         cache: "no-store",
+        signal,
       });
-    } catch {
-      return { kind: "offline" };
-    }
-    let body = null;
-    try {
       body = await response.json();
-    } catch {
-      // below
+    } catch (error) {
+      if (signal.aborted) return { kind: "aborted" };
+      if (!response) return { kind: "offline" };
     }
-    if (response.ok && body && body.success === true) return { kind: "list", body };
-    if (body && body.errinfo) return { kind: "error", errinfo: body.errinfo, message: body.message, status: response.status };
-    return { kind: "http", status: response.status };
+    const reply = readApiReply(response.status, body);
+    return reply.kind === "ok" ? { kind: "list", body } : reply;
   }
 
-  async function show(node, title, object) {
-    const request = ++state.request;
-    $("listing").hidden = false;
-    $("listing").setAttribute("aria-busy", "true");
+  // The pane while a list loads, or after it failed: its title, the state in words, no rows.
+  function showState(text, isError) {
+    const line = $("list-state");
+    line.textContent = text;
+    line.hidden = text === "";
+    line.classList.toggle("error", isError);
+  }
+
+  function cancel() {
+    state.request += 1;
+    clearTimeout(state.pending);
+    if (state.abort) state.abort.abort();
+    state.abort = null;
+  }
+
+  // Lists `node`; `defer` ms later when given (the pane shows the loading state at once).
+  async function show(node, title, object, { defer = 0 } = {}) {
+    cancel();
+    const request = state.request;
+    const ticket = begin();
+    const listing = $("listing");
+    listing.hidden = false;
+    listing.setAttribute("aria-busy", "true");
+    listing.dataset.state = "loading";
+    delete listing.dataset.node;
+    delete listing.dataset.error;
     $("list-title").textContent = title;
-    const reply = await fetchList(node, object);
-    if (request !== state.request) return;
-    $("listing").removeAttribute("aria-busy");
+    setList({ node, containers: [], tracks: [] });
+    $("list-count").textContent = "";
+    showState(labels.listLoading, false);
+    if (defer > 0) {
+      await new Promise((resolve) => { state.pending = setTimeout(resolve, defer); });
+      if (request !== state.request) return;
+    }
+    const controller = new AbortController();
+    state.abort = controller;
+    let reply = await fetchList(node, object, controller.signal);
+    // The user's Random 100 before the first draw: drawn now, as "New Random 100" does.
+    if (request === state.request && reply.kind === "list" && reply.body.drawn === false && (await drawRandom()))
+      if (request === state.request) reply = await fetchList(node, object, controller.signal);
+    if (request !== state.request || reply.kind === "aborted") return;
+    state.abort = null;
+    listing.removeAttribute("aria-busy");
     if (reply.kind !== "list") {
-      setList({ node, containers: [], tracks: [] });
-      onFailure(reply);
+      listing.dataset.state = "failed";
+      const code = failureCode(reply);
+      if (code) listing.dataset.error = code;
+      showState((code && labels.failures?.[code]) || reply.message || labels.badReply, true);
+      onFailure(reply, ticket, node);
       return;
     }
     const tracks = Array.isArray(reply.body.tracks) ? reply.body.tracks : [];
     const containers = Array.isArray(reply.body.containers) ? reply.body.containers : [];
+    showState("", false);
     setList({ node, containers, tracks });
-    $("listing").dataset.node = node;
-    $("listing").dataset.loaded = String(Number($("listing").dataset.loaded ?? 0) + 1);
+    listing.dataset.state = "loaded";
+    listing.dataset.node = node;
+    listing.dataset.loaded = String(Number(listing.dataset.loaded ?? 0) + 1);
+    onSuccess(ticket, node);
+  }
+
+  // The list shown again, when it is `node` (after a new draw of it).
+  function reload(node) {
+    if (state.list.node === node && !$("listing").hidden) show(node, $("list-title").textContent);
   }
 
   function hide() {
-    state.request += 1;
+    cancel();
     $("listing").hidden = true;
   }
 
@@ -103,6 +151,7 @@ export function createListener({ labels, onFailure, onStatus }) {
     );
     containers.hidden = list.containers.length === 0;
     $("list-count").textContent = labels.trackCount.replace("{count}", String(list.tracks.length));
+    state.cursor = -1;
     $("play-all").disabled = list.tracks.length === 0;
     spacer.style.height = `${list.tracks.length * ROW_HEIGHT}px`;
     viewport.hidden = list.tracks.length === 0;
@@ -131,6 +180,10 @@ export function createListener({ labels, onFailure, onStatus }) {
     row.dataset.stream = String(track.stream ?? "");
     row.style.top = `${index * ROW_HEIGHT}px`;
     if (isPlaying(index)) row.classList.add("playing");
+    if (index === state.cursor) {
+      row.classList.add("cursor");
+      row.id = "track-cursor";
+    }
     for (const [name, text] of [
       ["number", String(index + 1)],
       ["title", track.title],
@@ -167,6 +220,15 @@ export function createListener({ labels, onFailure, onStatus }) {
     drawRows();
   }
 
+  function moveCursor(index) {
+    state.cursor = index;
+    const top = index * ROW_HEIGHT;
+    if (top < viewport.scrollTop) viewport.scrollTop = top;
+    else if (top + ROW_HEIGHT > viewport.scrollTop + viewport.clientHeight) viewport.scrollTop = top + ROW_HEIGHT - viewport.clientHeight;
+    drawRows();
+    viewport.setAttribute("aria-activedescendant", "track-cursor");
+  }
+
   function step(delta) {
     const next = state.index + delta;
     if (next >= 0 && next < state.queue.length) play(state.queue, state.queueNode, next);
@@ -182,9 +244,26 @@ export function createListener({ labels, onFailure, onStatus }) {
   window.addEventListener("resize", drawRows);
   spacer.addEventListener("click", (event) => {
     const row = event.target.closest(".track");
-    if (row) play(state.list.tracks, state.list.node, Number(row.dataset.index));
+    if (!row) return;
+    state.cursor = Number(row.dataset.index);
+    play(state.list.tracks, state.list.node, state.cursor);
   });
   $("play-all").addEventListener("click", () => play(state.list.tracks, state.list.node, 0));
+  // The keyboard in the list: arrows move over the rows, Enter or Space plays the row.
+  viewport.addEventListener("keydown", (event) => {
+    const count = state.list.tracks.length;
+    if (count === 0) return;
+    const page = Math.max(1, Math.floor(viewport.clientHeight / ROW_HEIGHT) - 1);
+    const moves = { ArrowDown: 1, ArrowUp: -1, PageDown: page, PageUp: -page, Home: -count, End: count };
+    if (event.key in moves) {
+      moveCursor(Math.min(count - 1, Math.max(0, (state.cursor < 0 ? -1 : state.cursor) + moves[event.key])));
+    } else if ((event.key === "Enter" || event.key === " ") && state.cursor >= 0) {
+      play(state.list.tracks, state.list.node, state.cursor);
+    } else {
+      return;
+    }
+    event.preventDefault();
+  });
   $("prev").addEventListener("click", () => step(-1));
   $("next").addEventListener("click", () => step(1));
   $("play").addEventListener("click", () => {
@@ -228,5 +307,5 @@ export function createListener({ labels, onFailure, onStatus }) {
   $("seek").setAttribute("aria-label", labels.seek);
   $("volume").setAttribute("aria-label", labels.volume);
 
-  return { show, hide };
+  return { show, hide, reload };
 }
