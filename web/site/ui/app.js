@@ -3,6 +3,7 @@
 import { parseReply, decodeEntities, languageFromTags, safeIcon, isLazyContainer, nodesOf, REFRESH_TARGETS, BUTTON_IDS } from "./reply.js";
 import { LABELS, HTML_LANG } from "./labels.js";
 import { createListener, isListable } from "./listen.js";
+import { createPlaylists } from "./playlists.js";
 
 const CGI = "webapi/audiotree.cgi";
 const UILANG = "webapi/uilang.cgi";
@@ -20,6 +21,7 @@ const page = {
   labels: LABELS.enu,
   keepAlives: 0,
   listener: null, // the pane's listing and the player (listen.js)
+  playlists: null, // the playlist editor (playlists.js)
 };
 const nodeData = new WeakMap(); // li -> the node object as the server sent it
 const $ = (id) => document.getElementById(id);
@@ -213,7 +215,8 @@ async function refresh(buttonLi) {
 
 function activate(li) {
   select(li);
-  if (REFRESH_TARGETS[li.dataset.id]) refresh(li);
+  if (page.playlists?.isNewButton(li.dataset.id)) page.playlists.create(li.dataset.id);
+  else if (REFRESH_TARGETS[li.dataset.id]) refresh(li);
   else toggle(li);
 }
 
@@ -302,7 +305,34 @@ async function start() {
   $("hint").textContent = page.labels.hint;
   $("rerandom").textContent = page.labels.rerandom;
   $("rerandom").addEventListener("click", rerandom);
+  page.playlists = createPlaylists({
+    labels: page.labels,
+    onStatus: (message) => showStatus(message),
+    onFailure: (message) => showStatus(message, true),
+    // A category's children again (its refresh button), then a node of it selected.
+    refreshCategory: (id) => {
+      const button = document.querySelector(`li[data-id="${id}_refresh"]`);
+      return button ? refresh(button) : Promise.resolve();
+    },
+    selectNode: (id) => {
+      const li = [...document.querySelectorAll("#tree li[role=treeitem]")].find((l) => l.dataset.id === id);
+      if (li) {
+        for (let up = li.parentElement.closest("li[role=treeitem]"); up; up = up.parentElement.closest("li[role=treeitem]"))
+          if (up.getAttribute("aria-expanded") === "false") expand(up);
+        select(li);
+      }
+    },
+    reshow: (node, title) => page.listener.show(node, title),
+    categoryNodes: (id) => {
+      const li = document.querySelector(`li[data-id="${id}"]`);
+      if (!li) return [];
+      const rendered = [...li.querySelectorAll(":scope > ul > li[role=treeitem]")];
+      return rendered.length > 0 ? rendered.map((c) => nodeData.get(c)) : nodesOf(nodeData.get(li)?.children);
+    },
+  });
   page.listener = createListener({
+    decorateRow: (...args) => page.playlists.decorateRow(...args),
+    onListed: (...args) => page.playlists.listed(...args),
     labels: page.labels,
     onFailure: (reply) =>
       reply.kind === "error" && typeof reply.message === "string" && reply.message !== ""

@@ -10,7 +10,7 @@ export function isListable(id) {
   if (typeof id !== "string") return false;
   if (id.startsWith("mediaserver_")) return id !== "mediaserver_root" && id !== "mediaserver_refresh";
   if (!id.startsWith("musiclib_") || id === "musiclib_root") return false;
-  if (/^musiclib_music_(personal|shared)/.test(id)) return /^musiclib_music_(personal|shared)\/playlist\//.test(id);
+  if (/^musiclib_music_(personal|shared)/.test(id)) return /^musiclib_music_(personal|shared)\/(playlist|smart)\//.test(id);
   return true;
 }
 
@@ -22,7 +22,9 @@ export function formatDuration(seconds) {
 
 const $ = (id) => document.getElementById(id);
 
-export function createListener({ labels, onFailure, onStatus }) {
+// `decorateRow(row, track, index, node)` and `onListed(node, title, list)`: the playlist editor's
+// hooks (playlists.js), called for each drawn row and after each listing.
+export function createListener({ labels, onFailure, onStatus, decorateRow = () => {}, onListed = () => {} }) {
   const state = {
     list: { node: "", containers: [], tracks: [] }, // what the pane shows
     queue: [],          // the tracks being played, in order
@@ -68,12 +70,14 @@ export function createListener({ labels, onFailure, onStatus }) {
     $("listing").removeAttribute("aria-busy");
     if (reply.kind !== "list") {
       setList({ node, containers: [], tracks: [] });
+      onListed(node, title, state.list);
       onFailure(reply);
       return;
     }
     const tracks = Array.isArray(reply.body.tracks) ? reply.body.tracks : [];
     const containers = Array.isArray(reply.body.containers) ? reply.body.containers : [];
     setList({ node, containers, tracks });
+    onListed(node, title, state.list);
     $("listing").dataset.node = node;
     $("listing").dataset.loaded = String(Number($("listing").dataset.loaded ?? 0) + 1);
   }
@@ -144,6 +148,7 @@ export function createListener({ labels, onFailure, onStatus }) {
       row.append(cell);
     }
     row.title = String(track.title ?? "");
+    decorateRow(row, track, index, state.list.node);
     return row;
   }
 
