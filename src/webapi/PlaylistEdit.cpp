@@ -445,8 +445,10 @@ int LibraryApi::EditPlaylist(const std::string& action) {
     std::string name;
     std::int64_t id = -1;
     if (personal) {
+        // Any name the listing gives (a file's name less its ending) is found among the folder's
+        // files, never used as a path; the rules of a new name apply to new names only.
         name = node.substr(kPersonalPrefix.size());
-        if (!playlist::IsValidPlaylistName(name))
+        if (name.empty() || name.find('/') != std::string::npos)
             return FailWith(kNotFound, "not_found", kNoSuchPlaylistLine, "error",
                             "Could not get the entry");
     } else if (shared) {

@@ -73,6 +73,13 @@ std::optional<SmartNode> ParseSmartNode(std::string_view node) {
     return parsed;
 }
 
+// A name that can stand between the brackets of a section line: any that the enumerator lists
+// (the rules of a new name apply to new names only).
+bool IsSectionName(std::string_view name) {
+    return !name.empty() && name.size() <= conf::kMaxLineBytes &&
+           name.find_first_of(std::string_view("\r\n\0", 3)) == std::string_view::npos;
+}
+
 std::string NodeOf(bool shared, const std::string& name) {
     return std::string(shared ? kSharedSmartPrefix : kPersonalSmartPrefix) + name;
 }
@@ -196,7 +203,7 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
         if (!playlist::IsValidPlaylistName(name))
             return FailWith(kBadRequest, "name_invalid", kSmartNameLine);
         if (const char* old = webMan.In("old", nullptr)) {
-            if (!playlist::IsValidPlaylistName(old))
+            if (!IsSectionName(old))
                 return FailWith(kNotFound, "not_found", kNoSuchSmartLine, "error",
                                 "Could not get the entry");
             oldName = old;
@@ -213,7 +220,7 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
             return FailWith(kBadRequest, "rule_invalid", kRequestRuleLine, nullptr, nullptr, *key);
     } else {  // smartdelete
         const std::optional<SmartNode> smart = ParseSmartNode(webMan.In("node", ""));
-        if (!smart || !playlist::IsValidPlaylistName(smart->name))
+        if (!smart || !IsSectionName(smart->name))
             return FailWith(kNotFound, "not_found", kNoSuchSmartLine, "error",
                             "Could not get the entry");
         shared = smart->shared;

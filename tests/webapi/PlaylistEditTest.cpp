@@ -322,6 +322,23 @@ TEST_F(PlaylistEdit, ListedPlaylistRowsCarryTheirEntryNumber) {
     EXPECT_EQ(ListStreams("musiclib_music_personal/playlist/Gaps"), (Strings{"4.mp3"}));
 }
 
+TEST_F(PlaylistEdit, PlaylistsOfAnyListedNameCanBeChangedThoughNewNamesFollowTheRules) {
+    MakeGeneratedLibrary(3);
+    WritePersonalPlaylistFile("admin", "Best [2020] .M3U", "#EXTM3U\n");
+    WriteFile(UserSmartPlaylistFile("admin"), "[[Mixed] Bag]\ngenre=Pop\n[Kept]\n");
+    const std::string node = "musiclib_music_personal/playlist/Best [2020] ";
+    const CgiResult added = Change({{"action", "pladd"}, {"node", node}, {"streams", "2.mp3"}});
+    ASSERT_TRUE(added.jsonOk) << added.output;
+    EXPECT_TRUE(added.json["success"].asBool()) << added.body;
+    EXPECT_EQ(ListStreams(node), Strings{"2.mp3"});
+    const CgiResult gone =
+        Change({{"action", "smartdelete"}, {"node", "musiclib_music_personal/smart/[Mixed] Bag"}});
+    EXPECT_TRUE(gone.json["success"].asBool()) << gone.output;
+    EXPECT_EQ(ReadFile(UserSmartPlaylistFile("admin")), "[Kept]\n");
+    ExpectRefused(Change({{"action", "plrename"}, {"node", node}, {"name", "Best [2021]"}}), "400",
+                  "name_invalid");
+}
+
 TEST_F(PlaylistEdit, SharedPlaylistIsMadeAndChangedInLibraryDb) {
     MakeGeneratedLibrary(10, {{7, "Party Mix"}});
     const CgiResult made =

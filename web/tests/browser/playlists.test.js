@@ -116,9 +116,9 @@ test("a bad or taken name is refused in the user's language and makes nothing", 
   await submitDialog(page, { name: "Abendlied" });
   await dialog(page).locator(".pl-error").waitFor();
   assert.equal(await dialog(page).locator(".pl-error").textContent(), PLAYLIST_WORDS.ger.err_name_taken);
+  await screenshot(page, "playlist-name-taken");
   await page.click("#pl-dialog-cancel");
   assert.deepEqual(execFileSync("ls", [playlists("hans")], { encoding: "utf8" }).trim().split("\n"), ["Abendlied.m3u8"]);
-  await screenshot(page, "playlist-name-taken");
 });
 
 test("a smart playlist lists the tracks its rules select, and its rules are edited from the page", async () => {
