@@ -172,6 +172,7 @@ test("New Playlist makes a smart playlist, and a shared playlist in library.db",
   await dialog(page).waitFor();
   await dialog(page).locator('[name="kind"]').selectOption("smart");
   await submitDialog(page, { name: "Five Folk", genre: "Folk", limit: "5" });
+  await page.waitForSelector("dialog.pl-dialog", { state: "detached", timeout: 10000 });
   await waitListed(page, "musiclib_music_personal/smart/Five Folk");
   assert.equal(await page.locator("#list-count").textContent(), "5 tracks");
   assert.match(readFileSync(`${playlists("demo")}/smart.playlist`, "utf8"), /\n\[Five Folk\]\ngenre=Folk\nlimit=5\n$/);
@@ -179,6 +180,7 @@ test("New Playlist makes a smart playlist, and a shared playlist in library.db",
   await open(page, "musiclib_music_shared");
   await item(page, "musiclib_music_shared_new").locator(":scope > .row .label").click();
   await submitDialog(page, { name: "Office Radio" });
+  await page.waitForSelector("dialog.pl-dialog", { state: "detached", timeout: 10000 });
   const id = sql("SELECT id FROM playlist WHERE name = 'Office Radio'");
   assert.match(id, /^\d+$/);
   await waitListed(page, `musiclib_music_shared/playlist/${id}`);
