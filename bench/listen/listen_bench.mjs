@@ -2,6 +2,7 @@
 // one run, the tree CGI's browse of the Bench folder (the baseline), library.cgi's listing of it, and
 // the page's time from a click on the folder to its first track rows drawn.
 import { launch, close, openTree, item } from "../../web/tests/browser/harness.js";
+import { measurePlaylists } from "./playlists_bench.mjs";
 
 const rounds = Number(process.env.BENCH_ROUNDS ?? 15);
 const base = process.env.HARMONA_URL;
@@ -91,3 +92,4 @@ line("tree CGI browse (gettreenode), baseline", tree);
 line("library.cgi list", api);
 for (const [service, values] of Object.entries(probes)) line(`library.cgi probe ${service}`, values);
 line("page: click to first rows on screen", clicks);
+for (const text of await measurePlaylists({ base, auth, rounds, folderNode: node, listMedian: median(api) })) console.log(text);

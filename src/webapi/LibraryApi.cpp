@@ -19,6 +19,7 @@
 #include "src/daemonclient/MediaServerList.h"
 #include "src/webapi/Failure.h"
 #include "src/webapi/ServiceProbe.h"
+#include "src/webapi/PlaylistEdit.h"
 
 namespace harmona::webapi {
 
@@ -87,6 +88,10 @@ int LibraryApi::Process() {
         return DescribeTrack(webMan.In("stream", ""));
     if (std::strcmp(action, "probe") == 0)
         return Probe(webMan.In("service", ""));
+    if (IsPlaylistEditAction(action))
+        return EditPlaylist(action);
+    if (IsSmartPlaylistAction(action))
+        return EditSmartPlaylist(action);
     return Fail(Failure::requestInvalid, kErrorSection, kNotFoundKey, kUnknownActionLine);
 }
 
@@ -99,6 +104,8 @@ int LibraryApi::List(const std::string& node) {
         built = ListSharedPlaylist(node.substr(kSharedPrefix.size()), reply);
     else if (StartsWith(node, kMediaServerPrefix))
         built = ListMediaServer(node, webMan.In("object", kMediaServerRootObject), reply);
+    else if (IsSmartPlaylistNode(node))
+        built = ListSmartPlaylist(node, reply);
     else if (node == kRandomNode)
         built = ListRandomPlaylist(reply);
     else if (StartsWith(node, kLibraryPrefix) && node != kLibraryRootNode &&
@@ -289,11 +296,15 @@ int LibraryApi::ListPlaylistEntries(const playlist::PlaylistFileEntries& entries
 void LibraryApi::AppendPlaylistTracks(const std::vector<std::string>& paths, Json::Value& reply) {
     Json::Value& tracks = reply["tracks"];
     int missing = 0;
-    for (const std::string& path : paths) {
-        if (const std::optional<Track> track = catalog_.ByPath(path))
-            tracks.append(TrackRow(*track));
-        else
+    for (std::size_t entry = 0; entry < paths.size(); ++entry) {
+        if (const std::optional<Track> track = catalog_.ByPath(paths[entry])) {
+            // Its place among the playlist's entries: what a change of the playlist names.
+            Json::Value row = TrackRow(*track);
+            row["entry"] = Json::UInt64(entry);
+            tracks.append(std::move(row));
+        } else {
             ++missing;
+        }
     }
     reply["missing"] = missing;
 }

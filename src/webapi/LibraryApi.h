@@ -6,6 +6,8 @@
 //   action=track&stream=<stream id>  one track's metadata (404 when the library has no such track)
 //   action=probe&service=<name>      whether the media server or the audio daemon answers
 // Every error reply carries a stable "error" code (Failure.h).
+//   action=pl*, action=smart*        playlists and smart playlists made and changed (see
+//                                    PlaylistEdit.h and docs/library-api.md)
 // Tracks carry stream ids only (TrackCatalog.h); the page plays "/media/<stream id>", which the
 // web server passes on to the local media server behind the same login.
 #pragma once
@@ -55,6 +57,19 @@ class LibraryApi : public ActionHandler {
                        DMAParser& parser);
 
     bool OpenCatalog();
+
+    // Playlists made and changed from the page (PlaylistEdit.cpp) and smart playlists: their
+    // tracks, their rules, made, changed and removed (SmartPlaylists.cpp). Each answers the
+    // request itself; 1 for a served request.
+    int EditPlaylist(const std::string& action);
+    int EditSmartPlaylist(const std::string& action);
+    int ListSmartPlaylist(const std::string& node, Json::Value& reply);
+    // An error reply of those actions: the HTTP status, a stable "error" code the page words in
+    // the user's language, and errinfo/message from the UI texts (section/key, null: the code).
+    int FailWith(const char* status, const char* error, int line, const char* section = nullptr,
+                 const char* key = nullptr, const std::string& detail = {});
+    // The checks every changing request passes first: a POST of a bounded body. 0 after answering.
+    int AdmitChange();
 
     // An error reply: the HTTP status, the error envelope and its text in the user's language.
     int Fail(Failure failure, const char* section, const char* key, int line);

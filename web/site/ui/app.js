@@ -4,6 +4,7 @@ import { parseReply, decodeEntities, languageFromTags, safeIcon, isLazyContainer
 import { LABELS, HTML_LANG } from "./labels.js";
 import { createListener, isListable } from "./listen.js";
 import { failureCode, readApiReply, splitTracks, isBrowsedLibraryNode } from "./failures.js";
+import { createPlaylists } from "./playlists.js";
 
 const CGI = "webapi/audiotree.cgi";
 const API = "webapi/library.cgi";
@@ -24,6 +25,7 @@ const page = {
   listener: null, // the pane's listing and the player (listen.js)
   actions: 0,     // user actions so far: each gets the next number when it starts
   errorOf: 0,     // the action whose failure the status line shows (0: none)
+  playlists: null, // the playlist editor (playlists.js)
 };
 // A user action starts: its number, by which its outcome is ordered among the others. What one
 // gesture starts (a click lists a node and opens it) is one action: its parts share the number
@@ -293,7 +295,8 @@ async function refresh(buttonLi) {
 
 function activate(li) {
   select(li);
-  if (REFRESH_TARGETS[li.dataset.id]) refresh(li);
+  if (page.playlists?.isNewButton(li.dataset.id)) page.playlists.create(li.dataset.id);
+  else if (REFRESH_TARGETS[li.dataset.id]) refresh(li);
   else toggle(li);
 }
 
@@ -385,7 +388,34 @@ async function start() {
   $("hint").textContent = page.labels.hint;
   $("rerandom").textContent = page.labels.rerandom;
   $("rerandom").addEventListener("click", rerandom);
+  page.playlists = createPlaylists({
+    labels: page.labels,
+    onStatus: (message) => showStatus(message),
+    onFailure: (message) => showStatus(message, true),
+    // A category's children again (its refresh button), then a node of it selected.
+    refreshCategory: (id) => {
+      const button = document.querySelector(`li[data-id="${id}_refresh"]`);
+      return button ? refresh(button) : Promise.resolve();
+    },
+    selectNode: (id) => {
+      const li = [...document.querySelectorAll("#tree li[role=treeitem]")].find((l) => l.dataset.id === id);
+      if (li) {
+        for (let up = li.parentElement.closest("li[role=treeitem]"); up; up = up.parentElement.closest("li[role=treeitem]"))
+          if (up.getAttribute("aria-expanded") === "false") expand(up);
+        select(li);
+      }
+    },
+    reshow: (node, title) => page.listener.show(node, title),
+    categoryNodes: (id) => {
+      const li = document.querySelector(`li[data-id="${id}"]`);
+      if (!li) return [];
+      const rendered = [...li.querySelectorAll(":scope > ul > li[role=treeitem]")];
+      return rendered.length > 0 ? rendered.map((c) => nodeData.get(c)) : nodesOf(nodeData.get(li)?.children);
+    },
+  });
   page.listener = createListener({
+    decorateRow: (...args) => page.playlists.decorateRow(...args),
+    onListed: (...args) => page.playlists.listed(...args),
     labels: page.labels,
     begin,
     onFailure: (reply, action, node) => {

@@ -12,7 +12,7 @@ export function isListable(id) {
   if (typeof id !== "string") return false;
   if (id.startsWith("mediaserver_")) return id !== "mediaserver_root" && id !== "mediaserver_refresh";
   if (!id.startsWith("musiclib_") || id === "musiclib_root") return false;
-  if (/^musiclib_music_(personal|shared)/.test(id)) return /^musiclib_music_(personal|shared)\/playlist\//.test(id);
+  if (/^musiclib_music_(personal|shared)/.test(id)) return /^musiclib_music_(personal|shared)\/(playlist|smart)\//.test(id);
   return true;
 }
 
@@ -24,7 +24,9 @@ export function formatDuration(seconds) {
 
 const $ = (id) => document.getElementById(id);
 
-export function createListener({ labels, onFailure, onStatus, onSuccess = () => {}, begin = () => 0, drawRandom = async () => false }) {
+// `decorateRow(row, track, index, node)` and `onListed(node, title, list)`: the playlist editor's
+// hooks (playlists.js), called for each drawn row and after each listing.
+export function createListener({ labels, onFailure, onStatus, onSuccess = () => {}, begin = () => 0, drawRandom = async () => false, decorateRow = () => {}, onListed = () => {} }) {
   const state = {
     list: { node: "", containers: [], tracks: [] }, // what the pane shows
     queue: [],          // the tracks being played, in order
@@ -108,6 +110,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
       const code = failureCode(reply);
       if (code) listing.dataset.error = code;
       showState((code && labels.failures?.[code]) || reply.message || labels.badReply, true);
+      onListed(node, title, state.list);
       onFailure(reply, ticket, node);
       return;
     }
@@ -115,6 +118,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
     const containers = Array.isArray(reply.body.containers) ? reply.body.containers : [];
     showState("", false);
     setList({ node, containers, tracks });
+    onListed(node, title, state.list);
     listing.dataset.state = "loaded";
     listing.dataset.node = node;
     listing.dataset.loaded = String(Number(listing.dataset.loaded ?? 0) + 1);
@@ -197,6 +201,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
       row.append(cell);
     }
     row.title = String(track.title ?? "");
+    decorateRow(row, track, index, state.list.node);
     return row;
   }
 

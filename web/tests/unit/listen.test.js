@@ -3,12 +3,13 @@ import { test } from "node:test";
 import assert from "node:assert/strict";
 import { isListable, formatDuration } from "../../site/ui/listen.js";
 
-test("library containers, playlists, random-100 and media servers are listed; categories and buttons are not", () => {
+test("library containers, playlists, smart playlists, random-100 and media servers are listed; categories and buttons are not", () => {
   for (const id of ["musiclib_music_album", "musiclib_album:A/B", "musiclib_random", "musiclib_folder:Bench",
-    "musiclib_music_personal/playlist/Road Trip", "musiclib_music_shared/playlist/7", "mediaserver_http://192.0.2.1:8200/ctl"])
+    "musiclib_music_personal/playlist/Road Trip", "musiclib_music_shared/playlist/7", "mediaserver_http://192.0.2.1:8200/ctl",
+    "musiclib_music_personal/smart/Jazz Only", "musiclib_music_shared/smart/Everything Electronic"])
     assert.equal(isListable(id), true, id);
   for (const id of ["musiclib_root", "musiclib_music_personal", "musiclib_music_shared", "musiclib_music_personal_refresh",
-    "musiclib_music_personal/smart/Jazz Only", "mediaserver_root", "mediaserver_refresh", "inetradio_root", "ipod_root", "", null, 7])
+    "musiclib_music_personal_new", "musiclib_music_shared_new", "mediaserver_root", "mediaserver_refresh", "inetradio_root", "ipod_root", "", null, 7])
     assert.equal(isListable(id), false, String(id));
 });
 
