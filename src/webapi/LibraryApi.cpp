@@ -16,6 +16,8 @@
 #include "platform/playlist/PlaylistList.h"
 #include "platform/texts/LocalizedStringParser.h"
 #include "src/daemonclient/MediaServerList.h"
+#include "src/webapi/RadioApi.h"
+#include "src/webapi/RemoteMedia.h"
 
 namespace harmona::webapi {
 
@@ -98,6 +100,10 @@ int LibraryApi::Process() {
         return List(webMan.In("node", ""));
     if (std::strcmp(action, "track") == 0)
         return DescribeTrack(webMan.In("stream", ""));
+    if (IsRadioAction(action))
+        return ServeRadioAction(*this, webMan, action);
+    if (action == kRemoteStreamAction)
+        return ServeRemoteStream(*this, webMan, permission_);
     return Fail(kBadRequest, kErrorSection, kNotFoundKey, kUnknownActionLine);
 }
 
@@ -112,6 +118,8 @@ int LibraryApi::List(const std::string& node) {
         built = ListMediaServer(node, webMan.In("object", kMediaServerRootObject), reply);
     else if (node == kRandomNode)
         built = ListRandomPlaylist(reply);
+    else if (IsRadioNode(node))
+        built = ListRadioNode(*this, webMan, node, reply);
     else if (StartsWith(node, kLibraryPrefix) && node != kLibraryRootNode &&
              !StartsWith(node, kPersonalCategory) && !StartsWith(node, kSharedCategory))
         built = ListBrowsedContainer(node.substr(kLibraryPrefix.size()), reply);
@@ -197,9 +205,10 @@ int LibraryApi::ListMediaServer(const std::string& node, const std::string& obje
         return 1;
     int notPlayableHere = 0;
     for (const ItemNode* item : *items) {
-        // Tracks of another server are not in this library: no stream id can name them.
+        // A track is played through this server when its resource is on the server's own host.
         if (!item->isContainer) {
-            ++notPlayableHere;
+            if (!AppendRemoteTrack(node, controlUrl, *item, reply["tracks"]))
+                ++notPlayableHere;
             continue;
         }
         Json::Value row(Json::objectValue);
