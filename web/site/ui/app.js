@@ -3,6 +3,7 @@
 import { parseReply, decodeEntities, languageFromTags, safeIcon, isLazyContainer, nodesOf, REFRESH_TARGETS, BUTTON_IDS } from "./reply.js";
 import { LABELS, HTML_LANG } from "./labels.js";
 import { createListener, isListable } from "./listen.js";
+import { createRadio, listedRadioNode } from "./radio.js";
 
 const CGI = "webapi/audiotree.cgi";
 const UILANG = "webapi/uilang.cgi";
@@ -20,6 +21,7 @@ const page = {
   labels: LABELS.enu,
   keepAlives: 0,
   listener: null, // the pane's listing and the player (listen.js)
+  radio: null,    // the internet radio pane (radio.js)
 };
 const nodeData = new WeakMap(); // li -> the node object as the server sent it
 const $ = (id) => document.getElementById(id);
@@ -185,7 +187,9 @@ function select(li) {
   $("selected-id").textContent = typeof node.id === "string" ? node.id : "";
   $("selected-icon").src = safeIcon(node.icon) ?? BLANK;
   if (page.listener) {
-    if (isListable(node.id)) page.listener.show(node.id, decodeEntities(node.text));
+    page.radio?.select(node.id, decodeEntities(node.text));
+    const listed = listedRadioNode(node.id);
+    if (isListable(listed)) page.listener.show(listed, decodeEntities(node.text));
     else page.listener.hide();
   }
 }
@@ -304,12 +308,15 @@ async function start() {
   $("rerandom").addEventListener("click", rerandom);
   page.listener = createListener({
     labels: page.labels,
-    onFailure: (reply) =>
-      reply.kind === "error" && typeof reply.message === "string" && reply.message !== ""
-        ? showStatus(reply.message, true)
-        : showFailure(reply.kind === "error" ? { kind: "error", errinfo: reply.errinfo } : reply),
+    onFailure: (reply) => {
+      const radioWords = page.radio?.failure(reply);
+      if (radioWords) showStatus(radioWords, true);
+      else if (reply.kind === "error" && typeof reply.message === "string" && reply.message !== "") showStatus(reply.message, true);
+      else showFailure(reply.kind === "error" ? { kind: "error", errinfo: reply.errinfo } : reply);
+    },
     onStatus: showStatus,
   });
+  page.radio = createRadio({ labels: page.labels, listener: page.listener, showStatus, showFailure });
 
   const tree = $("tree");
   tree.addEventListener("click", (event) => {

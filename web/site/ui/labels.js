@@ -1,5 +1,6 @@
 // The page's own words (the node texts come from the server; the server's error texts from
 // texts.json, generated from data/texts/ at build time). Keyed by the platform's language codes.
+import { RADIO_WORDS } from "./words/radio.js";
 export const LABELS = {
   enu: {
     title: "Harmona Audio", tree: "Audio sources", rerandom: "New Random 100",
@@ -70,6 +71,8 @@ export const LABELS = {
     unknownError: "錯誤 {sec} / {key}", offline: "無法連線至伺服器。",
   },
 };
+
+for (const [code, words] of Object.entries(RADIO_WORDS)) Object.assign(LABELS[code], words);
 
 // The page's BCP 47 tag for a language code (the html lang attribute).
 export const HTML_LANG = { enu: "en", ger: "de", fre: "fr", spn: "es", ita: "it", jpn: "ja", chs: "zh-Hans", cht: "zh-Hant" };
