@@ -1,16 +1,20 @@
 // Runs inside scripts/system-inside (HARMONA_URL, HARMONA_USER, HARMONA_PASSWORD set): measures, in
-// one run, the tree CGI's browse of the Bench folder (the baseline), library.cgi's listing of it, and
-// the page's time from a click on the folder to its first track rows drawn.
+// one run, the tree CGI's browse of the Bench folder (the baseline), library.cgi's listing of it, the
+// page's time from a click on the folder to its first track rows drawn, and library.cgi's other
+// actions: the radio stations listed, added and removed, and the same folder listed as a media
+// server's on the network with one of its tracks fetched through library.cgi.
 import { launch, close, openTree, item } from "../../web/tests/browser/harness.js";
 import { measurePlaylists } from "./playlists_bench.mjs";
+import { writeFileSync, chownSync, statSync, mkdirSync } from "node:fs";
 
 const rounds = Number(process.env.BENCH_ROUNDS ?? 15);
 const base = process.env.HARMONA_URL;
 const auth = "Basic " + Buffer.from(`${process.env.HARMONA_USER}:${process.env.HARMONA_PASSWORD}`).toString("base64");
 
-async function timed(url) {
+async function timed(url, body) {
   const start = performance.now();
-  const response = await fetch(new URL(url, base), { headers: { Authorization: auth } });
+  const response = await fetch(new URL(url, base), body === undefined ? { headers: { Authorization: auth } }
+    : { method: "POST", body: new URLSearchParams(body), headers: { Authorization: auth } });
   const text = await response.text();
   if (!response.ok) throw new Error(`${url}: HTTP ${response.status}`);
   return { ms: performance.now() - start, bytes: text.length, text };
@@ -22,8 +26,37 @@ const bench = folders.find((node) => node && node.text === "Bench");
 if (!bench) throw new Error("no Bench folder among the music library folders");
 const node = bench.id;
 
+// The user's radio stations: 499 of them (one below the bound), so that each round adds one and
+// removes it again.
+const prefs = `/usr/vanu/etc/preference/${process.env.HARMONA_USER}`;
+mkdirSync(prefs, { recursive: true });
+let stationsText = "";
+for (let n = 1; n <= 499; n++) stationsText += `[${n}]\nname="Station ${n}"\nurl="http://198.51.100.9:8000/s${n}.mp3"\nfavorite=${n % 7 === 0 ? 1 : 0}\n`;
+writeFileSync(`${prefs}/radio.stations`, stationsText);
+const owner = statSync(prefs);
+chownSync(`${prefs}/radio.stations`, owner.uid, owner.gid);
+
+// The system's own media server as the audio daemon finds it on the network link: its Bench folder
+// listed as another server's tracks, and one of them fetched through library.cgi.
+let network = null;
+for (let attempt = 0; attempt < 40 && !network; attempt++) {
+  const servers = JSON.parse((await timed("webapi/audiotree.cgi?action=refresh&target=mediaserver")).text).items ?? [];
+  network = servers.map((s) => s.id).find((id) => typeof id === "string" && id.includes(":50003/")) ?? null;
+  if (!network) await new Promise((resolve) => setTimeout(resolve, 500));
+}
+if (!network) throw new Error("the audio daemon does not list the media server");
+const remoteList = `webapi/library.cgi?action=list&node=${encodeURIComponent(network)}&object=${encodeURIComponent(node.slice("musiclib_".length))}`;
+const remoteTracks = JSON.parse((await timed(remoteList)).text).tracks;
+if (remoteTracks.length === 0 || typeof remoteTracks[0].url !== "string") throw new Error("no remote tracks listed");
+const remoteTrack = remoteTracks[0].url;
+
 const tree = [];
 const api = [];
+const radioList = [];
+const radioAdd = [];
+const radioRemove = [];
+const remote = [];
+const remotePlay = [];
 let treeBytes = 0;
 let apiBytes = 0;
 let apiTracks = 0;
@@ -40,6 +73,13 @@ for (let i = 0; i < rounds; i++) {
   apiTracks = JSON.parse(a.text).tracks.length;
   for (const service of Object.keys(probes))
     probes[service].push((await timed(`webapi/library.cgi?action=probe&service=${service}`)).ms);
+  radioList.push((await timed("webapi/library.cgi?action=list&node=inetradio_userdefined")).ms);
+  const added = await timed("webapi/library.cgi", { action: "radio_add", name: "Bench station", url: "http://198.51.100.9:8000/bench.mp3" });
+  radioAdd.push(added.ms);
+  const id = JSON.parse(added.text).station.station;
+  radioRemove.push((await timed("webapi/library.cgi", { action: "radio_remove", station: id })).ms);
+  remote.push((await timed(remoteList)).ms);
+  remotePlay.push((await timed(remoteTrack)).ms);
 }
 
 const browser = await launch();
@@ -93,3 +133,8 @@ line("library.cgi list", api);
 for (const [service, values] of Object.entries(probes)) line(`library.cgi probe ${service}`, values);
 line("page: click to first rows on screen", clicks);
 for (const text of await measurePlaylists({ base, auth, rounds, folderNode: node, listMedian: median(api) })) console.log(text);
+line("library.cgi list of 499 radio stations", radioList);
+line("library.cgi radio_add (500th station)", radioAdd);
+line("library.cgi radio_remove", radioRemove);
+line(`library.cgi list, same folder on a network server`, remote);
+line("library.cgi remote_stream of one of its tracks", remotePlay);

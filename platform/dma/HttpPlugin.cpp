@@ -1,8 +1,10 @@
 // The HTTP plugin: one POST with libcurl, with the time limits and the streaming reply of
-// HttpPost.h. Built as a MODULE and loaded on demand (see HttpPost.h for why).
+// HttpPost.h, and one GET of a media resource (HttpGet.h). Built as a MODULE and loaded on demand
+// (see HttpPost.h for why).
 #include <cstdio>
 #include <cstring>
 
+#include "platform/dma/HttpGet.h"
 #include "platform/dma/HttpPost.h"
 #include "platform/lib/curl/Easy.h"
 
@@ -102,6 +104,128 @@ extern "C" __attribute__((visibility("default"))) int harmona_http_post(
     result->aborted = state.aborted ? 1 : 0;
     if (code != CURLE_OK) {
         SetError(result, curl_easy_strerror(code));
+        return -1;
+    }
+    return 0;
+}
+
+namespace {
+
+struct GetState {
+    const harmona_http_get_request* request;
+    harmona::curl::Easy* easy;
+    bool headTold = false;
+    bool aborted = false;
+};
+
+// Copies the last value of header `name` of the final reply into `buffer` ("" when absent).
+void CopyHeader(harmona::curl::Easy& easy, const char* name, char* buffer, size_t size) {
+    buffer[0] = '\0';
+    curl_header* header = nullptr;
+    if (curl_easy_header(easy.Get(), name, 0, CURLH_HEADER, -1, &header) == CURLHE_OK &&
+        header != nullptr && header->value != nullptr)
+        std::snprintf(buffer, size, "%s", header->value);
+}
+
+// Tells the caller the status and headers, once; false when the caller aborts.
+bool TellHead(GetState& state) {
+    if (state.headTold)
+        return true;
+    state.headTold = true;
+    harmona_http_reply_head head{};
+    head.status = state.easy->ResponseCode();
+    CopyHeader(*state.easy, "Content-Type", head.contentType, sizeof(head.contentType));
+    CopyHeader(*state.easy, "Content-Length", head.contentLength, sizeof(head.contentLength));
+    CopyHeader(*state.easy, "Content-Range", head.contentRange, sizeof(head.contentRange));
+    CopyHeader(*state.easy, "Accept-Ranges", head.acceptRanges, sizeof(head.acceptRanges));
+    if (state.request->head(state.request->context, &head) != 0) {
+        state.aborted = true;
+        return false;
+    }
+    return true;
+}
+
+size_t WriteBody(char* data, size_t size, size_t count, void* context) {
+    auto* state = static_cast<GetState*>(context);
+    const size_t bytes = size * count;
+    if (!TellHead(*state))
+        return 0;
+    if (state->request->sink(state->request->context, data, bytes) != 0) {
+        state->aborted = true;
+        return 0;
+    }
+    return bytes;
+}
+
+bool ConfigureGet(harmona::curl::Easy& easy, const harmona_http_get_request* request,
+                  harmona::curl::StringList& headers, GetState& state) {
+    bool ok = true;
+    ok &= easy.SetOption(CURLOPT_URL, request->url) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_PROTOCOLS_STR, "http") == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_FOLLOWLOCATION, 0L) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_NOPROXY, "*") == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_NOSIGNAL, 1L) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_HTTPGET, 1L) == CURLE_OK;
+    // The body is passed on as the server sends it: no decoding, no cookies.
+    ok &= easy.SetOption(CURLOPT_HTTP_CONTENT_DECODING, 0L) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_CONNECTTIMEOUT_MS, request->connectTimeoutMs) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_TIMEOUT_MS, request->totalTimeoutMs) == CURLE_OK;
+    // Less than one byte a second for the stall time: the server hangs.
+    const long stallSeconds = request->stallTimeoutMs > 999 ? request->stallTimeoutMs / 1000 : 1;
+    ok &= easy.SetOption(CURLOPT_LOW_SPEED_LIMIT, 1L) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_LOW_SPEED_TIME, stallSeconds) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_WRITEFUNCTION, WriteBody) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_WRITEDATA, &state) == CURLE_OK;
+    for (size_t i = 0; i < request->headerCount; ++i)
+        ok &= headers.Append(request->headers[i]);
+    ok &= easy.SetOption(CURLOPT_HTTPHEADER, headers.Get()) == CURLE_OK;
+    return ok;
+}
+
+void SetGetError(harmona_http_get_result* result, const char* text) {
+    std::snprintf(result->error, sizeof(result->error), "%s", text);
+}
+
+}  // namespace
+
+extern "C" __attribute__((visibility("default"))) int harmona_http_get(
+    const harmona_http_get_request* request, harmona_http_get_result* result) {
+    if (result == nullptr)
+        return -1;
+    *result = harmona_http_get_result{};
+    if (request == nullptr || request->url == nullptr || request->sink == nullptr ||
+        request->head == nullptr) {
+        SetGetError(result, "bad request");
+        return -1;
+    }
+    harmona::curl::GlobalInit global;
+    if (!global) {
+        SetGetError(result, "curl_global_init failed");
+        return -1;
+    }
+    harmona::curl::Easy easy;
+    if (!easy) {
+        SetGetError(result, "curl_easy_init failed");
+        return -1;
+    }
+    harmona::curl::StringList headers;
+    GetState state{request, &easy};
+    if (!ConfigureGet(easy, request, headers, state)) {
+        SetGetError(result, "curl refused an option");
+        return -1;
+    }
+    CURLcode code = easy.Perform();
+    // A whole reply without a body: the head is still told.
+    if (code == CURLE_OK && !TellHead(state))
+        code = CURLE_WRITE_ERROR;
+    result->status = easy.ResponseCode();
+    result->aborted = state.aborted ? 1 : 0;
+    result->timedOut = code == CURLE_OPERATION_TIMEDOUT ? 1 : 0;
+    curl_off_t connectTime = 0;
+    result->connected =
+        easy.GetInfo(CURLINFO_CONNECT_TIME_T, &connectTime) == CURLE_OK && connectTime > 0 ? 1 : 0;
+    if (code != CURLE_OK) {
+        SetGetError(result, curl_easy_strerror(code));
         return -1;
     }
     return 0;

@@ -16,6 +16,7 @@ constexpr KeyField kKeys[] = {
     {"artist", ItemNode::Artist},
     {"album", ItemNode::Album},
     {"res", ItemNode::Res},
+    {"duration", ItemNode::Duration},
 };
 
 }  // namespace

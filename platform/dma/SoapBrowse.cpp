@@ -77,6 +77,10 @@ bool IsNetworkHostUrl(const std::string& url) {
     return false;
 }
 
+std::string HttpUrlHost(const std::string& url) {
+    return IsAbsoluteHttpUrl(url) ? HostOf(url) : std::string();
+}
+
 std::string BuildBrowseEnvelope(const std::string& objectId, const char* browseFlag,
                                 const std::string& filter, unsigned long startingIndex,
                                 unsigned long requestedCount, const std::string& sortCriteria) {
@@ -286,6 +290,8 @@ void FillItem(pugi::xml_node object, ItemNode& item, ItemScratch& scratch) {
         } else if (std::strcmp(ns, kDidlNs) == 0 && std::strcmp(local, "res") == 0 && !haveRes) {
             AssignTextOf(child, values[ItemNode::Res]);
             Trim(values[ItemNode::Res]);
+            values[ItemNode::Duration] = child.attribute("duration").value();
+            Trim(values[ItemNode::Duration]);
             haveRes = true;
         }
     }

@@ -56,6 +56,10 @@ bool IsAbsoluteHttpUrl(const std::string& url);
 // to a service on this machine.
 bool IsNetworkHostUrl(const std::string& url);
 
+// The host of an absolute http URL (IsAbsoluteHttpUrl): what stands between "://" and the port
+// or path, without the brackets of an IPv6 address.
+std::string HttpUrlHost(const std::string& url);
+
 // The SOAP 1.1 body of a Browse action; every argument escaped.
 std::string BuildBrowseEnvelope(const std::string& objectId, const char* browseFlag,
                                 const std::string& filter, unsigned long startingIndex,

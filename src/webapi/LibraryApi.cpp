@@ -20,6 +20,8 @@
 #include "src/webapi/Failure.h"
 #include "src/webapi/ServiceProbe.h"
 #include "src/webapi/PlaylistEdit.h"
+#include "src/webapi/RadioApi.h"
+#include "src/webapi/RemoteMedia.h"
 
 namespace harmona::webapi {
 
@@ -92,6 +94,10 @@ int LibraryApi::Process() {
         return EditPlaylist(action);
     if (IsSmartPlaylistAction(action))
         return EditSmartPlaylist(action);
+    if (IsRadioAction(action))
+        return ServeRadioAction(*this, webMan, action);
+    if (action == kRemoteStreamAction)
+        return ServeRemoteStream(*this, webMan, permission_);
     return Fail(Failure::requestInvalid, kErrorSection, kNotFoundKey, kUnknownActionLine);
 }
 
@@ -108,6 +114,8 @@ int LibraryApi::List(const std::string& node) {
         built = ListSmartPlaylist(node, reply);
     else if (node == kRandomNode)
         built = ListRandomPlaylist(reply);
+    else if (IsRadioNode(node))
+        built = ListRadioNode(*this, webMan, node, reply);
     else if (StartsWith(node, kLibraryPrefix) && node != kLibraryRootNode &&
              !StartsWith(node, kPersonalCategory) && !StartsWith(node, kSharedCategory))
         built = ListBrowsedContainer(node.substr(kLibraryPrefix.size()), reply);
@@ -225,9 +233,10 @@ int LibraryApi::ListMediaServer(const std::string& node, const std::string& obje
         return 1;
     int notPlayableHere = 0;
     for (const ItemNode* item : *items) {
-        // Tracks of another server are not in this library: no stream id can name them.
+        // A track is played through this server when its resource is on the server's own host.
         if (!item->isContainer) {
-            ++notPlayableHere;
+            if (!AppendRemoteTrack(node, controlUrl, *item, reply["tracks"]))
+                ++notPlayableHere;
             continue;
         }
         Json::Value row(Json::objectValue);

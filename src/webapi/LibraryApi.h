@@ -2,14 +2,17 @@
 // lists and plays. Actions:
 //   action=list&node=<tree node id>  the node's sub-containers and tracks
 //     [&object=<object id>]          for a media server on the network: that container of it
-//                                    (default its root, "0"); its containers only
+//                                    (default its root, "0"); its tracks as RemoteMedia.h says
 //   action=track&stream=<stream id>  one track's metadata (404 when the library has no such track)
 //   action=probe&service=<name>      whether the media server or the audio daemon answers
-// Every error reply carries a stable "error" code (Failure.h).
 //   action=pl*, action=smart*        playlists and smart playlists made and changed (see
 //                                    PlaylistEdit.h and docs/library-api.md)
-// Tracks carry stream ids only (TrackCatalog.h); the page plays "/media/<stream id>", which the
-// web server passes on to the local media server behind the same login.
+//   the radio nodes and actions      RadioApi.h
+//   action=remote_stream             a network media server's track, RemoteMedia.h
+// Every error reply carries a stable "error" code (Failure.h).
+// Library tracks carry stream ids only (TrackCatalog.h); the page plays "/media/<stream id>", which
+// the web server passes on to the local media server behind the same login. Other rows carry the
+// "url" the page plays.
 #pragma once
 
 #include <json/value.h>

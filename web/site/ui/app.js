@@ -5,6 +5,7 @@ import { LABELS, HTML_LANG } from "./labels.js";
 import { createListener, isListable } from "./listen.js";
 import { failureCode, readApiReply, splitTracks, isBrowsedLibraryNode } from "./failures.js";
 import { createPlaylists } from "./playlists.js";
+import { createRadio, listedRadioNode } from "./radio.js";
 
 const CGI = "webapi/audiotree.cgi";
 const API = "webapi/library.cgi";
@@ -26,6 +27,7 @@ const page = {
   actions: 0,     // user actions so far: each gets the next number when it starts
   errorOf: 0,     // the action whose failure the status line shows (0: none)
   playlists: null, // the playlist editor (playlists.js)
+  radio: null,    // the internet radio pane (radio.js)
 };
 // A user action starts: its number, by which its outcome is ordered among the others. What one
 // gesture starts (a click lists a node and opens it) is one action: its parts share the number
@@ -260,7 +262,9 @@ function select(li, { keyboard = false } = {}) {
   $("selected-id").textContent = typeof node.id === "string" ? node.id : "";
   $("selected-icon").src = safeIcon(node.icon) ?? BLANK;
   if (page.listener) {
-    if (isListable(node.id)) page.listener.show(node.id, decodeEntities(node.text), undefined, { defer: keyboard ? 300 : 0 });
+    page.radio?.select(node.id, decodeEntities(node.text));
+    const listed = listedRadioNode(node.id);
+    if (isListable(listed)) page.listener.show(listed, decodeEntities(node.text), undefined, { defer: keyboard ? 300 : 0 });
     else page.listener.hide();
   }
 }
@@ -419,7 +423,9 @@ async function start() {
     labels: page.labels,
     begin,
     onFailure: (reply, action, node) => {
-      showFailure(reply, action);
+      const radioWords = page.radio?.failure(reply);
+      if (radioWords) showStatus(radioWords, true);
+      else showFailure(reply, action);
       // A node that no longer exists is marked so in the tree.
       if (failureCode(reply) === "node_gone")
         for (const li of document.querySelectorAll("#tree li[role=treeitem]")) if (li.dataset.id === node) li.dataset.gone = "true";
@@ -431,6 +437,7 @@ async function start() {
     onStatus: showStatus,
     drawRandom: () => draw(true),
   });
+  page.radio = createRadio({ labels: page.labels, listener: page.listener, showStatus, showFailure });
 
   const tree = $("tree");
   tree.addEventListener("click", (event) => {

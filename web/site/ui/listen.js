@@ -11,6 +11,7 @@ const OVERSCAN = 8;    // rows drawn above and below the visible ones
 export function isListable(id) {
   if (typeof id !== "string") return false;
   if (id.startsWith("mediaserver_")) return id !== "mediaserver_root" && id !== "mediaserver_refresh";
+  if (/^inetradio_(userdefined|favorite|sc|rio)$/.test(id)) return true;
   if (!id.startsWith("musiclib_") || id === "musiclib_root") return false;
   if (/^musiclib_music_(personal|shared)/.test(id)) return /^musiclib_music_(personal|shared)\/(playlist|smart)\//.test(id);
   return true;
@@ -215,12 +216,13 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
     state.index = index;
     const track = tracks[index];
     if (!track) return;
-    audio.src = `media/${encodeURIComponent(String(track.stream))}`;
+    // A row that is not a library track (a station, another server's track) names its own URL.
+    audio.src = typeof track.url === "string" && track.url !== "" ? track.url : `media/${encodeURIComponent(String(track.stream))}`;
     audio.play().catch(() => {
       // a play() superseded by the next one, or refused: the audio element's events say so
     });
     $("now-playing").textContent = [track.title, track.artist].filter(Boolean).join(" — ");
-    $("player").dataset.stream = String(track.stream);
+    $("player").dataset.stream = String(track.stream ?? track.url);
     $("player").dataset.index = String(index);
     drawRows();
   }
