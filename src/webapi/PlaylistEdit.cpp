@@ -406,7 +406,7 @@ int LibraryApi::EditPlaylist(const std::string& action) {
             reply["node"] = std::string(kPersonalPrefix) + name;
         } else {
             if (!mayChangeShared)
-                return FailWith(kForbidden, "forbidden", kNotAllowedLine);
+                return FailWith(kForbidden, "request_refused", kNotAllowedLine);
             sqlite::Database db = OpenLibraryForWriting();
             if (!db)
                 return FailWith(kUnavailable, "library_unavailable", kLibraryUnavailableLine,
@@ -449,17 +449,17 @@ int LibraryApi::EditPlaylist(const std::string& action) {
         // files, never used as a path; the rules of a new name apply to new names only.
         name = node.substr(kPersonalPrefix.size());
         if (name.empty() || name.find('/') != std::string::npos)
-            return FailWith(kNotFound, "not_found", kNoSuchPlaylistLine, "error",
+            return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
                             "Could not get the entry");
     } else if (shared) {
         const std::string digits = node.substr(kSharedPrefix.size());
         if (!util::ParseDecimalDigits(digits, id) || id > kMaxSharedId)
-            return FailWith(kNotFound, "not_found", kNoSuchPlaylistLine, "error",
+            return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
                             "Could not get the entry");
         if (!mayChangeShared)
-            return FailWith(kForbidden, "forbidden", kNotAllowedLine);
+            return FailWith(kForbidden, "request_refused", kNotAllowedLine);
     } else {
-        return FailWith(kNotFound, "not_found", kNoSuchPlaylistLine, "error",
+        return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
                         "Could not get the entry");
     }
 
@@ -506,11 +506,11 @@ int LibraryApi::EditPlaylist(const std::string& action) {
     if (personal) {
         const io::FileDescriptor dir = playlist::LockFolder(folder, false);
         if (!dir)
-            return FailWith(kNotFound, "not_found", kNoSuchPlaylistLine, "error",
+            return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
                             "Could not get the entry");
         const std::optional<std::string> file = FindPlaylistFile(dir.Get(), name);
         if (!file)
-            return FailWith(kNotFound, "not_found", kNoSuchPlaylistLine, "error",
+            return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
                             "Could not get the entry");
         if (action == "pldelete") {
             if (unlinkat(dir.Get(), file->c_str(), 0) != 0)
@@ -536,7 +536,7 @@ int LibraryApi::EditPlaylist(const std::string& action) {
             if (entries.status == playlist::PlaylistFileStatus::tooLarge)
                 return FailWith(kTooLarge, "too_large", kPlaylistFullLine);
             if (entries.status != playlist::PlaylistFileStatus::ok)
-                return FailWith(kNotFound, "not_found", kNoSuchPlaylistLine, "error",
+                return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
                                 "Could not get the entry");
             medialib::LibraryOpenResult library = medialib::OpenLibrary(paths::kLibraryDb);
             if (library.status != medialib::LibraryStatus::ok)
@@ -579,7 +579,7 @@ int LibraryApi::EditPlaylist(const std::string& action) {
                                   "error_system");
         std::optional<std::vector<std::string>> paths = SharedPaths(db, id);
         if (!paths)
-            return FailWith(kNotFound, "not_found", kNoSuchPlaylistLine, "error",
+            return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
                             "Could not get the entry");
         bool stored = true;
         if (action == "pldelete") {

@@ -21,24 +21,24 @@ inline constexpr std::string_view kRemoveAction = "radio_remove";
 inline constexpr std::string_view kFavoriteAction = "radio_favorite";
 
 // The errors, with fixed line numbers that log readers match on.
-constexpr ApiError kDirectoryUnreachable{kStatusUnavailable, kSystemSection, kSystemText, 301,
+constexpr ApiError kDirectoryUnreachable{kStatusUnavailable, kSystemSection, kSystemText, 401,
                                          "directory_unreachable"};
-constexpr ApiError kStationsUnreadable{kStatusServerError, kSystemSection, kSystemText, 302,
+constexpr ApiError kStationsUnreadable{kStatusServerError, kSystemSection, kSystemText, 402,
                                        "stations_unreadable"};
-constexpr ApiError kNotPost{kStatusMethodNotAllowed, kSystemSection, kSystemText, 303,
+constexpr ApiError kNotPost{kStatusMethodNotAllowed, kSystemSection, kSystemText, 403,
                             "method_not_allowed"};
-constexpr ApiError kNameInvalid{kStatusBadRequest, kSystemSection, kSystemText, 304,
+constexpr ApiError kNameInvalid{kStatusBadRequest, kSystemSection, kSystemText, 404,
                                 "name_invalid"};
-constexpr ApiError kUrlInvalid{kStatusBadRequest, kSystemSection, kSystemText, 305, "url_invalid"};
-constexpr ApiError kStationInvalid{kStatusBadRequest, kNotFoundSection, kNotFoundText, 306,
+constexpr ApiError kUrlInvalid{kStatusBadRequest, kSystemSection, kSystemText, 405, "url_invalid"};
+constexpr ApiError kStationInvalid{kStatusBadRequest, kNotFoundSection, kNotFoundText, 406,
                                    "station_invalid"};
-constexpr ApiError kStationNotFound{kStatusNotFound, kNotFoundSection, kNotFoundText, 307,
+constexpr ApiError kStationNotFound{kStatusNotFound, kNotFoundSection, kNotFoundText, 407,
                                     "station_not_found"};
-constexpr ApiError kFavoriteInvalid{kStatusBadRequest, kSystemSection, kSystemText, 308,
+constexpr ApiError kFavoriteInvalid{kStatusBadRequest, kSystemSection, kSystemText, 408,
                                     "favorite_invalid"};
-constexpr ApiError kStationsFull{kStatusConflict, kSystemSection, kSystemText, 309,
+constexpr ApiError kStationsFull{kStatusConflict, kSystemSection, kSystemText, 409,
                                  "stations_full"};
-constexpr ApiError kStationsUnwritable{kStatusServerError, kSystemSection, kSystemText, 310,
+constexpr ApiError kStationsUnwritable{kStatusServerError, kSystemSection, kSystemText, 410,
                                        "stations_unwritable"};
 
 Json::Value StationRow(const radio::Station& station) {

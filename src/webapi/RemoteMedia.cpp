@@ -26,29 +26,29 @@ namespace {
 inline constexpr std::string_view kMediaServerPrefix = "mediaserver_";
 
 // The errors, with fixed line numbers that log readers match on.
-constexpr ApiError kNoPermission{kStatusForbidden, kSystemSection, kSystemText, 321,
+constexpr ApiError kNoPermission{kStatusForbidden, kSystemSection, kSystemText, 421,
                                  "request_refused"};
-constexpr ApiError kUnknownServer{kStatusNotFound, kNotFoundSection, kNotFoundText, 322,
-                                  "node_not_found"};
-constexpr ApiError kObjectInvalid{kStatusBadRequest, kNotFoundSection, kNotFoundText, 323,
+constexpr ApiError kUnknownServer{kStatusNotFound, kNotFoundSection, kNotFoundText, 422,
+                                  "node_gone"};
+constexpr ApiError kObjectInvalid{kStatusBadRequest, kNotFoundSection, kNotFoundText, 423,
                                   "object_invalid"};
-constexpr ApiError kBrowseFailed{kStatusBadGateway, kSystemSection, kSystemText, 324,
-                                 "media_server_failed"};
-constexpr ApiError kNotATrack{kStatusNotFound, kNotFoundSection, kNotFoundText, 325,
-                              "node_not_found"};
-constexpr ApiError kResourceElsewhere{kStatusForbidden, kSystemSection, kSystemText, 326,
+constexpr ApiError kBrowseFailed{kStatusBadGateway, kSystemSection, kSystemText, 424,
+                                 "media_server_invalid"};
+constexpr ApiError kNotATrack{kStatusNotFound, kNotFoundSection, kNotFoundText, 425,
+                              "node_gone"};
+constexpr ApiError kResourceElsewhere{kStatusForbidden, kSystemSection, kSystemText, 426,
                                       "resource_refused"};
-constexpr ApiError kTooLarge{kStatusBadGateway, kSystemSection, kSystemText, 327,
+constexpr ApiError kTooLarge{kStatusBadGateway, kSystemSection, kSystemText, 427,
                              "resource_too_large"};
-constexpr ApiError kRangeRefused{kStatusRangeNotSatisfiable, kSystemSection, kSystemText, 328,
+constexpr ApiError kRangeRefused{kStatusRangeNotSatisfiable, kSystemSection, kSystemText, 428,
                                  "range_invalid"};
-constexpr ApiError kResourceFailed{kStatusBadGateway, kSystemSection, kSystemText, 329,
+constexpr ApiError kResourceFailed{kStatusBadGateway, kSystemSection, kSystemText, 429,
                                    "resource_failed"};
-constexpr ApiError kTimedOut{kStatusGatewayTimeout, kSystemSection, kSystemText, 330,
+constexpr ApiError kTimedOut{kStatusGatewayTimeout, kSystemSection, kSystemText, 430,
                              "media_server_timeout"};
-constexpr ApiError kUnreachable{kStatusBadGateway, kSystemSection, kSystemText, 331,
-                                "media_server_unreachable"};
-constexpr ApiError kNoHttpClient{kStatusServerError, kSystemSection, kSystemText, 332,
+constexpr ApiError kUnreachable{kStatusBadGateway, kSystemSection, kSystemText, 431,
+                                "media_server_down"};
+constexpr ApiError kNoHttpClient{kStatusServerError, kSystemSection, kSystemText, 432,
                                  "system_error"};
 
 // Two numeric hosts name the same address.

@@ -117,14 +117,14 @@ bool IsSmartPlaylistNode(std::string_view node) {
 int LibraryApi::ListSmartPlaylist(const std::string& node, Json::Value& reply) {
     const std::optional<SmartNode> smart = ParseSmartNode(node);
     if (!smart)
-        return FailWith(kNotFound, "not_found", kNoSuchSmartLine, "error",
+        return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
                         "Could not get the entry");
     const std::string file = smart->shared ? std::string(paths::kSharedSmartPlaylists)
                                            : webMan.GetPreferenceDir() + paths::kPlaylistsFolder +
                                                  paths::kSmartPlaylistFile;
     const playlist::SmartSection section = playlist::ReadSmartSection(file.c_str(), smart->name);
     if (section.status == playlist::SmartReadStatus::missing)
-        return FailWith(kNotFound, "not_found", kNoSuchSmartLine, "error",
+        return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
                         "Could not get the entry");
     if (section.status == playlist::SmartReadStatus::invalid)
         return FailWith(kUnprocessable, "rule_invalid", kStoredRuleLine, nullptr, nullptr,
@@ -166,7 +166,7 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
     if (action == "smartget") {
         const std::optional<SmartNode> smart = ParseSmartNode(webMan.In("node", ""));
         if (!smart)
-            return FailWith(kNotFound, "not_found", kNoSuchSmartLine, "error",
+            return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
                             "Could not get the entry");
         const std::string file =
             smart->shared
@@ -175,7 +175,7 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
         RawSection section(smart->name);
         conf::ReadConf(file.c_str(), section);
         if (!section.found)
-            return FailWith(kNotFound, "not_found", kNoSuchSmartLine, "error",
+            return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
                             "Could not get the entry");
         Json::Value reply(Json::objectValue);
         reply["success"] = true;
@@ -204,7 +204,7 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
             return FailWith(kBadRequest, "name_invalid", kSmartNameLine);
         if (const char* old = webMan.In("old", nullptr)) {
             if (!IsSectionName(old))
-                return FailWith(kNotFound, "not_found", kNoSuchSmartLine, "error",
+                return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
                                 "Could not get the entry");
             oldName = old;
         }
@@ -221,14 +221,14 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
     } else {  // smartdelete
         const std::optional<SmartNode> smart = ParseSmartNode(webMan.In("node", ""));
         if (!smart || !IsSectionName(smart->name))
-            return FailWith(kNotFound, "not_found", kNoSuchSmartLine, "error",
+            return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
                             "Could not get the entry");
         shared = smart->shared;
         name = smart->name;
         oldName = smart->name;
     }
     if (shared && !mayChangeShared)
-        return FailWith(kForbidden, "forbidden", kSmartNotAllowedLine);
+        return FailWith(kForbidden, "request_refused", kSmartNotAllowedLine);
 
     std::string folder = kSharedSmartFolder;
     if (!shared) {
@@ -244,7 +244,7 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
         case playlist::SmartChange::ok:
             break;
         case playlist::SmartChange::missing:
-            return FailWith(kNotFound, "not_found", kNoSuchSmartLine, "error",
+            return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
                             "Could not get the entry");
         case playlist::SmartChange::exists:
             return FailWith(kConflict, "name_taken", kSmartNameTakenLine);

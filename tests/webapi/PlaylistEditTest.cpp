@@ -144,7 +144,7 @@ TEST_F(PlaylistEdit, SmartPlaylistWithABadStoredRuleSaysWhichRule) {
         EXPECT_EQ(r.json["tracks"].size(), 0u);
     }
     ExpectRefused(Read({{"action", "list"}, {"node", "musiclib_music_personal/smart/Absent"}}),
-                  "404", "not_found");
+                  "404", "node_gone");
 }
 
 TEST_F(PlaylistEdit, SmartSaveAddsASectionAndKeepsEveryOtherByte) {
@@ -225,7 +225,7 @@ TEST_F(PlaylistEdit, SmartSaveRefusesBadRulesAndNamesAndChangesNothing) {
                   "name_taken");
     ExpectRefused(
         Change({{"action", "smartsave"}, {"category", "personal"}, {"old", "Z"}, {"name", "Z"}}),
-        "404", "not_found");
+        "404", "node_gone");
     ExpectRefused(Change({{"action", "smartsave"}, {"category", "elsewhere"}, {"name", "N"}}),
                   "400", "category_invalid");
     EXPECT_EQ(ChangedPaths(before, Snapshot()), Strings{});
@@ -245,11 +245,11 @@ TEST_F(PlaylistEdit, SharedSmartPlaylistsChangeOnlyWithTheSharedPlaylistRight) {
     const FileSnapshot before = Snapshot();
     ExpectRefused(
         Change({{"action", "smartsave"}, {"category", "shared"}, {"name", "Mine"}}, "listener"),
-        "403", "forbidden");
+        "403", "request_refused");
     ExpectRefused(
         Change({{"action", "smartdelete"}, {"node", "musiclib_music_shared/smart/Shared"}},
                "listener"),
-        "403", "forbidden");
+        "403", "request_refused");
     EXPECT_EQ(ChangedPaths(before, Snapshot()), Strings{});
     const CgiResult r = Change(
         {{"action", "smartsave"}, {"category", "shared"}, {"name", "Mine"}, {"genre", "Rock"}});
@@ -411,9 +411,9 @@ TEST_F(PlaylistEdit, BadNamesPositionsAndTracksAreRefusedAndChangeNothing) {
                   "name_invalid");
     ExpectRefused(
         Change({{"action", "pldelete"}, {"node", "musiclib_music_personal/playlist/../Mine"}}),
-        "404", "not_found");
+        "404", "node_gone");
     ExpectRefused(Change({{"action", "pldelete"}, {"node", "musiclib_music_shared/playlist/99"}}),
-                  "404", "not_found");
+                  "404", "node_gone");
     ExpectRefused(Change({{"action", "pladd"},
                           {"node", "musiclib_music_shared/playlist/3"},
                           {"streams", "1.mp3"},
@@ -445,15 +445,15 @@ TEST_F(PlaylistEdit, SharedPlaylistsChangeOnlyWithTheSharedPlaylistRight) {
     const FileSnapshot before = Snapshot();
     ExpectRefused(
         Change({{"action", "plcreate"}, {"category", "shared"}, {"name", "Mine"}}, "listener"),
-        "403", "forbidden");
+        "403", "request_refused");
     ExpectRefused(Change({{"action", "pladd"},
                           {"node", "musiclib_music_shared/playlist/3"},
                           {"streams", "1.mp3"}},
                          "listener"),
-                  "403", "forbidden");
+                  "403", "request_refused");
     ExpectRefused(
         Change({{"action", "pldelete"}, {"node", "musiclib_music_shared/playlist/3"}}, "listener"),
-        "403", "forbidden");
+        "403", "request_refused");
     EXPECT_EQ(ChangedPaths(before, Snapshot()), Strings{});
     // His own playlists he may make.
     const CgiResult mine =

@@ -249,8 +249,8 @@ TEST_F(RemoteMedia, TheResourceIsTakenFromTheServersAnswerAtPlayTimeNeverFromThe
     ExpectError(Stream("away"), "403", "resource_refused");
     ExpectError(Stream("local"), "403", "resource_refused");
     // A container or an unknown object is no track.
-    ExpectError(Stream("box"), "404", "node_not_found");
-    ExpectError(Stream("nothing"), "502", "media_server_failed");
+    ExpectError(Stream("box"), "404", "node_gone");
+    ExpectError(Stream("nothing"), "502", "media_server_invalid");
     // A URL in the request is never used.
     const CgiResult withUrl = Api({{"action", "remote_stream"},
                                    {"node", kNode},
@@ -272,7 +272,7 @@ TEST_F(RemoteMedia, OnlyAListedNetworkServerAndAUserWithTheMediaServerBitArePlay
          {std::string("mediaserver_http://198.51.100.2:50004/other"), std::string("mediaserver_"),
           std::string("musiclib_music_all"), std::string("")}) {
         ExpectError(Api({{"action", "remote_stream"}, {"node", node}, {"object", "t1"}}), "404",
-                    "node_not_found");
+                    "node_gone");
     }
     for (const std::string& object : {std::string(""), std::string("a\nb"), std::string(1025, 'o')})
         ExpectError(Stream(object), "400", "object_invalid");
@@ -374,7 +374,7 @@ TEST_F(RemoteMedia, FailuresOfTheResourceAreToldApart) {
     ASSERT_TRUE(server.Start());
     ExpectError(Stream("gone"), "502", "resource_failed");
     ExpectError(Stream("range", "bytes=999999-"), "416", "range_invalid");
-    ExpectError(Stream("closed"), "502", "media_server_unreachable");
+    ExpectError(Stream("closed"), "502", "media_server_down");
     // Whatever the server calls it, it is passed on as bytes, never as a page of this site.
     const CgiResult page = Stream("page");
     EXPECT_EQ(page.Header("Content-Type"), "application/octet-stream");
