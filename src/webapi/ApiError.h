@@ -14,11 +14,14 @@ inline constexpr const char* kStatusForbidden = "403 Forbidden";
 inline constexpr const char* kStatusNotFound = "404 Not Found";
 inline constexpr const char* kStatusMethodNotAllowed = "405 Method Not Allowed";
 inline constexpr const char* kStatusConflict = "409 Conflict";
+inline constexpr const char* kStatusTooLarge = "413 Payload Too Large";
 inline constexpr const char* kStatusRangeNotSatisfiable = "416 Range Not Satisfiable";
+inline constexpr const char* kStatusUnprocessable = "422 Unprocessable Entity";
 inline constexpr const char* kStatusServerError = "500 Internal Server Error";
 inline constexpr const char* kStatusBadGateway = "502 Bad Gateway";
 inline constexpr const char* kStatusUnavailable = "503 Service Unavailable";
 inline constexpr const char* kStatusGatewayTimeout = "504 Gateway Timeout";
+inline constexpr const char* kStatusInsufficientStorage = "507 Insufficient Storage";
 
 // The two UI texts that the errors show: "the entry could not be got" and "a system error".
 inline constexpr const char* kNotFoundSection = "error";

@@ -1,5 +1,7 @@
 #include "src/webapi/Failure.h"
 
+#include "src/webapi/ApiError.h"
+
 #include "platform/dma/SoapBrowse.h"
 
 namespace harmona::webapi {
@@ -35,25 +37,25 @@ const char* FailureCode(Failure failure) {
 const char* FailureStatus(Failure failure) {
     switch (failure) {
         case Failure::requestInvalid:
-            return "400 Bad Request";
+            return kStatusBadRequest;
         case Failure::requestRefused:
-            return "403 Forbidden";
+            return kStatusForbidden;
         case Failure::nodeGone:
         case Failure::playlistUnreadable:
-            return "404 Not Found";
+            return kStatusNotFound;
         case Failure::tooLarge:
-            return "413 Payload Too Large";
+            return kStatusTooLarge;
         case Failure::mediaServerDown:
         case Failure::mediaServerInvalid:
-            return "502 Bad Gateway";
+            return kStatusBadGateway;
         case Failure::libraryUnavailable:
         case Failure::audioDaemonDown:
-            return "503 Service Unavailable";
+            return kStatusUnavailable;
         case Failure::mediaServerTimeout:
         case Failure::audioDaemonTimeout:
-            return "504 Gateway Timeout";
+            return kStatusGatewayTimeout;
     }
-    return "400 Bad Request";
+    return kStatusBadRequest;
 }
 
 Failure BrowseFailure(const std::string& error, long elapsedMs) {

@@ -17,24 +17,19 @@
 #include "platform/playlist/PlaylistList.h"
 #include "platform/texts/LocalizedStringParser.h"
 #include "src/daemonclient/MediaServerList.h"
+#include "src/webapi/ApiError.h"
 #include "src/webapi/Failure.h"
-#include "src/webapi/ServiceProbe.h"
 #include "src/webapi/PlaylistEdit.h"
 #include "src/webapi/RadioApi.h"
 #include "src/webapi/RemoteMedia.h"
+#include "src/webapi/ServiceProbe.h"
 
 namespace harmona::webapi {
 
 namespace {
 
-inline constexpr const char* kContentType = "application/json; charset=\"UTF-8\"";
-
 // The error replies: the kind of failure (its HTTP status and "error" code, Failure.h), the UI
 // text shown, and a fixed line number that log readers and the page match on.
-inline constexpr const char* kErrorSection = "error";
-inline constexpr const char* kNotFoundKey = "Could not get the entry";
-inline constexpr const char* kSystemSection = "common";
-inline constexpr const char* kSystemKey = "error_system";
 
 // Tree node ids of what the page lists (the ids the tree CGI hands out).
 inline constexpr std::string_view kLibraryPrefix = "musiclib_";
@@ -82,7 +77,7 @@ int LibraryApi::Process() {
         return 0;  // the 401 reply is out
     permission_ = admitted.permission;
     if (admitted.admission == cgi::Admission::noPermission)
-        return Fail(Failure::requestRefused, kSystemSection, kSystemKey, kNoPermissionLine);
+        return Fail(Failure::requestRefused, kSystemSection, kSystemText, kNoPermissionLine);
     const char* action = webMan.In("action", "");
     if (std::strcmp(action, "list") == 0)
         return List(webMan.In("node", ""));
@@ -98,7 +93,7 @@ int LibraryApi::Process() {
         return ServeRadioAction(*this, webMan, action);
     if (action == kRemoteStreamAction)
         return ServeRemoteStream(*this, webMan, permission_);
-    return Fail(Failure::requestInvalid, kErrorSection, kNotFoundKey, kUnknownActionLine);
+    return Fail(Failure::requestInvalid, kNotFoundSection, kNotFoundText, kUnknownActionLine);
 }
 
 int LibraryApi::List(const std::string& node) {
@@ -120,23 +115,23 @@ int LibraryApi::List(const std::string& node) {
              !StartsWith(node, kPersonalCategory) && !StartsWith(node, kSharedCategory))
         built = ListBrowsedContainer(node.substr(kLibraryPrefix.size()), reply);
     else
-        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kNotFoundSection, kNotFoundText, kUnknownNodeLine);
     if (built == 0)
         return 0;
-    PrintResponse(std::move(reply), kContentType);
+    PrintResponse(std::move(reply), kJsonReplyType);
     return 1;
 }
 
 int LibraryApi::DescribeTrack(const char* stream) {
     if (!OpenCatalog())
-        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemText, kNoLibraryLine);
     const std::optional<Track> track = catalog_.ByStreamId(stream);
     if (!track)
-        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownStreamLine);
+        return Fail(Failure::nodeGone, kNotFoundSection, kNotFoundText, kUnknownStreamLine);
     Json::Value reply(Json::objectValue);
     reply["success"] = true;
     reply["track"] = TrackRow(*track);
-    PrintResponse(std::move(reply), kContentType);
+    PrintResponse(std::move(reply), kJsonReplyType);
     return 1;
 }
 
@@ -145,7 +140,7 @@ int LibraryApi::BrowseChildren(const std::string& controlUrl, const std::string&
     DMABrowse browse(BrowseDirectChildren, controlUrl);
     browse.objectId = objectId;
     if (browse.Prepare() != 0)
-        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kNotFoundSection, kNotFoundText, kUnknownNodeLine);
     const auto started = std::chrono::steady_clock::now();
     if (parser.Parse(&browse) == 0)
         return 1;
@@ -154,22 +149,23 @@ int LibraryApi::BrowseChildren(const std::string& controlUrl, const std::string&
                                                  .count());
     switch (BrowseFailure(parser.Error(), elapsedMs)) {
         case Failure::nodeGone:
-            return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kBrowsedObjectGoneLine);
+            return Fail(Failure::nodeGone, kNotFoundSection, kNotFoundText, kBrowsedObjectGoneLine);
         case Failure::mediaServerTimeout:
-            return Fail(Failure::mediaServerTimeout, kSystemSection, kSystemKey,
+            return Fail(Failure::mediaServerTimeout, kSystemSection, kSystemText,
                         kBrowseTimedOutLine);
         case Failure::tooLarge:
-            return Fail(Failure::tooLarge, kSystemSection, kSystemKey, kBrowseTooLargeLine);
+            return Fail(Failure::tooLarge, kSystemSection, kSystemText, kBrowseTooLargeLine);
         case Failure::mediaServerInvalid:
-            return Fail(Failure::mediaServerInvalid, kSystemSection, kSystemKey, kBrowseFailedLine);
+            return Fail(Failure::mediaServerInvalid, kSystemSection, kSystemText,
+                        kBrowseFailedLine);
         default:
-            return Fail(Failure::mediaServerDown, kSystemSection, kSystemKey, kBrowseFailedLine);
+            return Fail(Failure::mediaServerDown, kSystemSection, kSystemText, kBrowseFailedLine);
     }
 }
 
 int LibraryApi::ListBrowsedContainer(const std::string& objectId, Json::Value& reply) {
     if (!OpenCatalog())
-        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemText, kNoLibraryLine);
     DMAParser parser;
     if (BrowseChildren(paths::kLocalMediaServerControlUrl, objectId, parser) == 0)
         return 0;
@@ -200,13 +196,13 @@ int LibraryApi::ListBrowsedContainer(const std::string& objectId, Json::Value& r
 int LibraryApi::ListMediaServer(const std::string& node, const std::string& objectId,
                                 Json::Value& reply) {
     if ((permission_ & cgi::kPermissionMediaServer) == 0)
-        return Fail(Failure::requestRefused, kSystemSection, kSystemKey, kNoPermissionLine);
+        return Fail(Failure::requestRefused, kSystemSection, kSystemText, kNoPermissionLine);
     // Only a server that the audio daemon lists right now is browsed, by the control URL it gave:
     // a request never makes this program connect to an address of its own choosing.
     const std::string controlUrl = node.substr(kMediaServerPrefix.size());
     // Nor one whose control URL names this machine or a link-local host, whoever listed it.
     if (!dma::IsNetworkHostUrl(controlUrl))
-        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kNotFoundSection, kNotFoundText, kUnknownNodeLine);
     bool listed = false;
     daemonclient::ReadMediaServerList([&](const daemonclient::ListedMediaServer& server) {
         listed = listed || server.controlUrl == controlUrl;
@@ -215,15 +211,15 @@ int LibraryApi::ListMediaServer(const std::string& node, const std::string& obje
         // Not listed: gone from the network, or the daemon that lists servers cannot say.
         switch (ProbeAudioDaemon()) {
             case ServiceState::down:
-                return Fail(Failure::audioDaemonDown, kSystemSection, kSystemKey,
+                return Fail(Failure::audioDaemonDown, kSystemSection, kSystemText,
                             kAudioDaemonDownLine);
             case ServiceState::notAnswering:
-                return Fail(Failure::audioDaemonTimeout, kSystemSection, kSystemKey,
+                return Fail(Failure::audioDaemonTimeout, kSystemSection, kSystemText,
                             kAudioDaemonTimedOutLine);
             case ServiceState::running:
                 break;
         }
-        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kNotFoundSection, kNotFoundText, kUnknownNodeLine);
     }
     DMAParser parser;
     if (BrowseChildren(controlUrl, objectId, parser) == 0)
@@ -253,21 +249,21 @@ int LibraryApi::ListPersonalPlaylist(const std::string& name, Json::Value& reply
     const playlist::PlaylistFileEntries entries = playlist::ReadPersonalPlaylist(
         webMan.GetPreferenceDir().c_str(), name, medialib::AudioSharePath());
     if (entries.status == playlist::PlaylistFileStatus::missing)
-        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kNotFoundSection, kNotFoundText, kUnknownNodeLine);
     return ListPlaylistEntries(entries, reply);
 }
 
 int LibraryApi::ListSharedPlaylist(const std::string& id, Json::Value& reply) {
     if (id.empty() || id.size() > 10 || id.find_first_not_of("0123456789") != std::string::npos)
-        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kNotFoundSection, kNotFoundText, kUnknownNodeLine);
     if (!OpenCatalog())
-        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemText, kNoLibraryLine);
     const auto paths = catalog_.SharedPlaylistPaths(std::strtoll(id.c_str(), nullptr, 10),
                                                     playlist::kMaxPlaylistEntries);
     if (!paths)
-        return Fail(Failure::nodeGone, kErrorSection, kNotFoundKey, kUnknownNodeLine);
+        return Fail(Failure::nodeGone, kNotFoundSection, kNotFoundText, kUnknownNodeLine);
     if (paths->tooLarge)
-        return Fail(Failure::tooLarge, kSystemSection, kSystemKey, kPlaylistTooLargeLine);
+        return Fail(Failure::tooLarge, kSystemSection, kSystemText, kPlaylistTooLargeLine);
     AppendPlaylistTracks(paths->paths, reply);
     return 1;
 }
@@ -292,12 +288,12 @@ int LibraryApi::ListPlaylistEntries(const playlist::PlaylistFileEntries& entries
     if (entries.status == playlist::PlaylistFileStatus::missing && missingIsEmpty)
         return 1;
     if (entries.status == playlist::PlaylistFileStatus::tooLarge)
-        return Fail(Failure::tooLarge, kSystemSection, kSystemKey, kPlaylistTooLargeLine);
+        return Fail(Failure::tooLarge, kSystemSection, kSystemText, kPlaylistTooLargeLine);
     if (entries.status != playlist::PlaylistFileStatus::ok)
-        return Fail(Failure::playlistUnreadable, kErrorSection, kNotFoundKey,
+        return Fail(Failure::playlistUnreadable, kNotFoundSection, kNotFoundText,
                     kPlaylistUnreadableLine);
     if (!OpenCatalog())
-        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemKey, kNoLibraryLine);
+        return Fail(Failure::libraryUnavailable, kSystemSection, kSystemText, kNoLibraryLine);
     AppendPlaylistTracks(entries.paths, reply);
     return 1;
 }
@@ -329,7 +325,7 @@ int LibraryApi::Fail(Failure failure, const char* section, const char* key, int 
     const Json::Value texts = VANU::ZET::LocalizedStringParser::ParseTexts(
         std::string(paths::kTextsPrefix) + webMan.GetUILanguage());
     reply["message"] = texts[section][key].asString();
-    PrintResponse(std::move(reply), kContentType, FailureStatus(failure));
+    PrintResponse(std::move(reply), kJsonReplyType, FailureStatus(failure));
     return 0;
 }
 

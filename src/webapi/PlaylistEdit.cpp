@@ -32,22 +32,11 @@
 #include "platform/playlist/PlaylistFile.h"
 #include "platform/playlist/PlaylistWrite.h"
 #include "platform/texts/LocalizedStringParser.h"
+#include "src/webapi/ApiError.h"
 #include "src/webapi/LibraryApi.h"
 
 namespace harmona::webapi {
 namespace {
-
-inline constexpr const char* kContentType = "application/json; charset=\"UTF-8\"";
-
-inline constexpr const char* kBadRequest = "400 Bad Request";
-inline constexpr const char* kForbidden = "403 Forbidden";
-inline constexpr const char* kNotFound = "404 Not Found";
-inline constexpr const char* kMethodNotAllowed = "405 Method Not Allowed";
-inline constexpr const char* kConflict = "409 Conflict";
-inline constexpr const char* kTooLarge = "413 Payload Too Large";
-inline constexpr const char* kServerError = "500 Internal Server Error";
-inline constexpr const char* kUnavailable = "503 Service Unavailable";
-inline constexpr const char* kInsufficientStorage = "507 Insufficient Storage";
 
 // Fixed line numbers of the errors, which log readers match on.
 enum ErrorLine : int {
@@ -357,19 +346,19 @@ int LibraryApi::FailWith(const char* status, const char* error, int line, const 
             std::string(paths::kTextsPrefix) + webMan.GetUILanguage());
         reply["message"] = texts[section][key].asString();
     }
-    PrintResponse(std::move(reply), kContentType, status);
+    PrintResponse(std::move(reply), kJsonReplyType, status);
     return 0;
 }
 
 int LibraryApi::AdmitChange() {
     const char* method = std::getenv("REQUEST_METHOD");
     if (method == nullptr || std::strcmp(method, "POST") != 0)
-        return FailWith(kMethodNotAllowed, "method_not_allowed", kMethodLine);
+        return FailWith(kStatusMethodNotAllowed, "method_not_allowed", kMethodLine);
     const char* length = std::getenv("CONTENT_LENGTH");
     std::int64_t bytes = 0;
     if (length != nullptr && *length != '\0' &&
         (!util::ParseDecimalDigits(length, bytes) || bytes > kMaxChangeBodyBytes))
-        return FailWith(kTooLarge, "too_large", kBodyTooLargeLine);
+        return FailWith(kStatusTooLarge, "too_large", kBodyTooLargeLine);
     return 1;
 }
 
@@ -383,58 +372,58 @@ int LibraryApi::EditPlaylist(const std::string& action) {
         const std::string category = webMan.In("category", "");
         const std::string name = webMan.In("name", "");
         if (category != "personal" && category != "shared")
-            return FailWith(kBadRequest, "category_invalid", kCategoryInvalidLine);
+            return FailWith(kStatusBadRequest, "category_invalid", kCategoryInvalidLine);
         if (!playlist::IsValidPlaylistName(name))
-            return FailWith(kBadRequest, "name_invalid", kNameInvalidLine);
+            return FailWith(kStatusBadRequest, "name_invalid", kNameInvalidLine);
         Json::Value reply(Json::objectValue);
         reply["success"] = true;
         if (category == "personal") {
             mkdir(webMan.GetPreferenceDir().c_str(), 0755);
             const io::FileDescriptor dir = playlist::LockFolder(folder, true);
             if (!dir)
-                return FailWith(kServerError, "write_failed", kWriteFailedLine, "common",
-                                "error_system");
+                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
+                                kSystemSection, kSystemText);
             if (FindPlaylistFile(dir.Get(), name))
-                return FailWith(kConflict, "name_taken", kNameTakenLine);
+                return FailWith(kStatusConflict, "name_taken", kNameTakenLine);
             const playlist::WriteOutcome written =
                 playlist::WriteFileAt(dir.Get(), name + kPlaylistFileEnding, "#EXTM3U\n", true);
             if (written == playlist::WriteOutcome::exists)
-                return FailWith(kConflict, "name_taken", kNameTakenLine);
+                return FailWith(kStatusConflict, "name_taken", kNameTakenLine);
             if (written != playlist::WriteOutcome::ok)
-                return FailWith(kServerError, "write_failed", kWriteFailedLine, "common",
-                                "error_system");
+                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
+                                kSystemSection, kSystemText);
             reply["node"] = std::string(kPersonalPrefix) + name;
         } else {
             if (!mayChangeShared)
-                return FailWith(kForbidden, "request_refused", kNotAllowedLine);
+                return FailWith(kStatusForbidden, "request_refused", kNotAllowedLine);
             sqlite::Database db = OpenLibraryForWriting();
             if (!db)
-                return FailWith(kUnavailable, "library_unavailable", kLibraryUnavailableLine,
-                                "common", "error_system");
+                return FailWith(kStatusUnavailable, "library_unavailable", kLibraryUnavailableLine,
+                                kSystemSection, kSystemText);
             WriteTransaction transaction(db);
             if (transaction.Code() != SQLITE_OK)
                 return IsBusy(transaction.Code())
-                           ? FailWith(kUnavailable, "library_busy", kLibraryBusyLine)
-                           : FailWith(kServerError, "write_failed", kWriteFailedLine, "common",
-                                      "error_system");
+                           ? FailWith(kStatusUnavailable, "library_busy", kLibraryBusyLine)
+                           : FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
+                                      kSystemSection, kSystemText);
             if (SharedNameTaken(db, name, -1))
-                return FailWith(kConflict, "name_taken", kNameTakenLine);
+                return FailWith(kStatusConflict, "name_taken", kNameTakenLine);
             sqlite::Statement next = db.Prepare("SELECT coalesce(max(id), 0) + 1 FROM playlist");
             if (!next || next.Step() != SQLITE_ROW)
-                return FailWith(kServerError, "write_failed", kWriteFailedLine, "common",
-                                "error_system");
+                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
+                                kSystemSection, kSystemText);
             const std::int64_t id = next.ColumnInt64(0);
             if (id > kMaxSharedId)
-                return FailWith(kInsufficientStorage, "no_id_left", kNoIdLeftLine);
+                return FailWith(kStatusInsufficientStorage, "no_id_left", kNoIdLeftLine);
             sqlite::Statement insert = db.Prepare("INSERT INTO playlist (id, name) VALUES (?, ?)");
             if (!insert || insert.Bind(1, id) != SQLITE_OK ||
                 insert.Bind(2, std::string_view(name)) != SQLITE_OK ||
                 insert.Step() != SQLITE_DONE || !transaction.Commit())
-                return FailWith(kServerError, "write_failed", kWriteFailedLine, "common",
-                                "error_system");
+                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
+                                kSystemSection, kSystemText);
             reply["node"] = std::string(kSharedPrefix) + std::to_string(id);
         }
-        PrintResponse(std::move(reply), kContentType);
+        PrintResponse(std::move(reply), kJsonReplyType);
         return 1;
     }
 
@@ -449,18 +438,18 @@ int LibraryApi::EditPlaylist(const std::string& action) {
         // files, never used as a path; the rules of a new name apply to new names only.
         name = node.substr(kPersonalPrefix.size());
         if (name.empty() || name.find('/') != std::string::npos)
-            return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
-                            "Could not get the entry");
+            return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
+                            kNotFoundText);
     } else if (shared) {
         const std::string digits = node.substr(kSharedPrefix.size());
         if (!util::ParseDecimalDigits(digits, id) || id > kMaxSharedId)
-            return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
-                            "Could not get the entry");
+            return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
+                            kNotFoundText);
         if (!mayChangeShared)
-            return FailWith(kForbidden, "request_refused", kNotAllowedLine);
+            return FailWith(kStatusForbidden, "request_refused", kNotAllowedLine);
     } else {
-        return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
-                        "Could not get the entry");
+        return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
+                        kNotFoundText);
     }
 
     // What is asked, checked before anything is opened.
@@ -470,33 +459,33 @@ int LibraryApi::EditPlaylist(const std::string& action) {
     if (action == "pladd") {
         change.kind = EntryChange::Kind::add;
         if (!SplitList(webMan.In("streams", ""), playlist::kMaxPlaylistEntries, items))
-            return FailWith(kBadRequest, "track_unknown", kTrackUnknownLine);
+            return FailWith(kStatusBadRequest, "track_unknown", kTrackUnknownLine);
         const std::string at = webMan.In("position", "");
         std::size_t position = 0;
         if (!at.empty()) {
             if (!ParseIndex(at, position))
-                return FailWith(kBadRequest, "position_invalid", kPositionInvalidLine);
+                return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
             change.at = position;
         }
     } else if (action == "plremove") {
         change.kind = EntryChange::Kind::remove;
         if (!SplitList(webMan.In("entries", ""), playlist::kMaxPlaylistEntries, items))
-            return FailWith(kBadRequest, "position_invalid", kPositionInvalidLine);
+            return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
         for (std::string_view item : items) {
             std::size_t entry = 0;
             if (!ParseIndex(item, entry))
-                return FailWith(kBadRequest, "position_invalid", kPositionInvalidLine);
+                return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
             change.remove.push_back(entry);
         }
     } else if (action == "plmove") {
         change.kind = EntryChange::Kind::move;
         if (!ParseIndex(webMan.In("from", ""), change.from) ||
             !ParseIndex(webMan.In("to", ""), change.to))
-            return FailWith(kBadRequest, "position_invalid", kPositionInvalidLine);
+            return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
     } else if (action == "plrename") {
         newName = webMan.In("name", "");
         if (!playlist::IsValidPlaylistName(newName))
-            return FailWith(kBadRequest, "name_invalid", kNameInvalidLine);
+            return FailWith(kStatusBadRequest, "name_invalid", kNameInvalidLine);
     }
 
     Json::Value reply(Json::objectValue);
@@ -506,27 +495,28 @@ int LibraryApi::EditPlaylist(const std::string& action) {
     if (personal) {
         const io::FileDescriptor dir = playlist::LockFolder(folder, false);
         if (!dir)
-            return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
-                            "Could not get the entry");
+            return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
+                            kNotFoundText);
         const std::optional<std::string> file = FindPlaylistFile(dir.Get(), name);
         if (!file)
-            return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
-                            "Could not get the entry");
+            return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
+                            kNotFoundText);
         if (action == "pldelete") {
             if (unlinkat(dir.Get(), file->c_str(), 0) != 0)
-                return FailWith(kServerError, "write_failed", kWriteFailedLine, "common",
-                                "error_system");
+                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
+                                kSystemSection, kSystemText);
             fsync(dir.Get());
         } else if (action == "plrename") {
             if (newName != name) {
                 if (FindPlaylistFile(dir.Get(), newName))
-                    return FailWith(kConflict, "name_taken", kNameTakenLine);
+                    return FailWith(kStatusConflict, "name_taken", kNameTakenLine);
                 const std::string renamed = newName + file->substr(name.size());
                 if (renameat2(dir.Get(), file->c_str(), dir.Get(), renamed.c_str(),
                               RENAME_NOREPLACE) != 0)
-                    return errno == EEXIST ? FailWith(kConflict, "name_taken", kNameTakenLine)
-                                           : FailWith(kServerError, "write_failed",
-                                                      kWriteFailedLine, "common", "error_system");
+                    return errno == EEXIST
+                               ? FailWith(kStatusConflict, "name_taken", kNameTakenLine)
+                               : FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
+                                          kSystemSection, kSystemText);
                 fsync(dir.Get());
             }
             reply["node"] = std::string(kPersonalPrefix) + newName;
@@ -534,53 +524,53 @@ int LibraryApi::EditPlaylist(const std::string& action) {
             playlist::PlaylistFileEntries entries =
                 playlist::ReadPlaylistFileAt(dir.Get(), file->c_str(), medialib::AudioSharePath());
             if (entries.status == playlist::PlaylistFileStatus::tooLarge)
-                return FailWith(kTooLarge, "too_large", kPlaylistFullLine);
+                return FailWith(kStatusTooLarge, "too_large", kPlaylistFullLine);
             if (entries.status != playlist::PlaylistFileStatus::ok)
-                return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
-                                "Could not get the entry");
+                return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
+                                kNotFoundText);
             medialib::LibraryOpenResult library = medialib::OpenLibrary(paths::kLibraryDb);
             if (library.status != medialib::LibraryStatus::ok)
-                return FailWith(kUnavailable, "library_unavailable", kLibraryUnavailableLine,
-                                "common", "error_system");
+                return FailWith(kStatusUnavailable, "library_unavailable", kLibraryUnavailableLine,
+                                kSystemSection, kSystemText);
             EntryLookup lookup(library.db);
             if (!lookup)
-                return FailWith(kUnavailable, "library_unavailable", kLibraryUnavailableLine,
-                                "common", "error_system");
+                return FailWith(kStatusUnavailable, "library_unavailable", kLibraryUnavailableLine,
+                                kSystemSection, kSystemText);
             for (std::string_view stream : items) {
                 if (change.kind != EntryChange::Kind::add)
                     break;
                 std::optional<LibraryEntry> entry = lookup.ByStream(stream);
                 if (!entry)
-                    return FailWith(kBadRequest, "track_unknown", kTrackUnknownLine);
+                    return FailWith(kStatusBadRequest, "track_unknown", kTrackUnknownLine);
                 change.addPaths.push_back(std::move(entry->path));
             }
             const ChangeOutcome applied = Apply(change, entries.paths);
             if (applied == ChangeOutcome::badPosition)
-                return FailWith(kBadRequest, "position_invalid", kPositionInvalidLine);
+                return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
             if (applied == ChangeOutcome::full)
-                return FailWith(kTooLarge, "too_large", kPlaylistFullLine);
+                return FailWith(kStatusTooLarge, "too_large", kPlaylistFullLine);
             if (playlist::WriteFileAt(dir.Get(), *file, PlaylistText(entries.paths, &lookup),
                                       false) != playlist::WriteOutcome::ok)
-                return FailWith(kServerError, "write_failed", kWriteFailedLine, "common",
-                                "error_system");
+                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
+                                kSystemSection, kSystemText);
             reply["node"] = node;
             reply["entries"] = Json::UInt64(entries.paths.size());
         }
     } else {
         sqlite::Database db = OpenLibraryForWriting();
         if (!db)
-            return FailWith(kUnavailable, "library_unavailable", kLibraryUnavailableLine, "common",
-                            "error_system");
+            return FailWith(kStatusUnavailable, "library_unavailable", kLibraryUnavailableLine,
+                            kSystemSection, kSystemText);
         WriteTransaction transaction(db);
         if (transaction.Code() != SQLITE_OK)
             return IsBusy(transaction.Code())
-                       ? FailWith(kUnavailable, "library_busy", kLibraryBusyLine)
-                       : FailWith(kServerError, "write_failed", kWriteFailedLine, "common",
-                                  "error_system");
+                       ? FailWith(kStatusUnavailable, "library_busy", kLibraryBusyLine)
+                       : FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
+                                  kSystemSection, kSystemText);
         std::optional<std::vector<std::string>> paths = SharedPaths(db, id);
         if (!paths)
-            return FailWith(kNotFound, "node_gone", kNoSuchPlaylistLine, "error",
-                            "Could not get the entry");
+            return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
+                            kNotFoundText);
         bool stored = true;
         if (action == "pldelete") {
             sqlite::Statement entries =
@@ -591,40 +581,40 @@ int LibraryApi::EditPlaylist(const std::string& action) {
                      row.Step() == SQLITE_DONE;
         } else if (action == "plrename") {
             if (SharedNameTaken(db, newName, id))
-                return FailWith(kConflict, "name_taken", kNameTakenLine);
+                return FailWith(kStatusConflict, "name_taken", kNameTakenLine);
             sqlite::Statement update = db.Prepare("UPDATE playlist SET name = ? WHERE id = ?");
             stored = update && update.Bind(1, std::string_view(newName)) == SQLITE_OK &&
                      update.Bind(2, id) == SQLITE_OK && update.Step() == SQLITE_DONE;
             reply["node"] = node;
         } else if (changesEntries) {
             if (paths->size() > playlist::kMaxPlaylistEntries)
-                return FailWith(kTooLarge, "too_large", kPlaylistFullLine);
+                return FailWith(kStatusTooLarge, "too_large", kPlaylistFullLine);
             EntryLookup lookup(db);
             if (!lookup)
-                return FailWith(kServerError, "write_failed", kWriteFailedLine, "common",
-                                "error_system");
+                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
+                                kSystemSection, kSystemText);
             for (std::string_view stream : items) {
                 if (change.kind != EntryChange::Kind::add)
                     break;
                 std::optional<LibraryEntry> entry = lookup.ByStream(stream);
                 if (!entry)
-                    return FailWith(kBadRequest, "track_unknown", kTrackUnknownLine);
+                    return FailWith(kStatusBadRequest, "track_unknown", kTrackUnknownLine);
                 change.addPaths.push_back(std::move(entry->path));
             }
             const ChangeOutcome applied = Apply(change, *paths);
             if (applied == ChangeOutcome::badPosition)
-                return FailWith(kBadRequest, "position_invalid", kPositionInvalidLine);
+                return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
             if (applied == ChangeOutcome::full)
-                return FailWith(kTooLarge, "too_large", kPlaylistFullLine);
+                return FailWith(kStatusTooLarge, "too_large", kPlaylistFullLine);
             stored = StoreSharedPaths(db, id, *paths);
             reply["node"] = node;
             reply["entries"] = Json::UInt64(paths->size());
         }
         if (!stored || !transaction.Commit())
-            return FailWith(kServerError, "write_failed", kWriteFailedLine, "common",
-                            "error_system");
+            return FailWith(kStatusServerError, "write_failed", kWriteFailedLine, kSystemSection,
+                            kSystemText);
     }
-    PrintResponse(std::move(reply), kContentType);
+    PrintResponse(std::move(reply), kJsonReplyType);
     return 1;
 }
 

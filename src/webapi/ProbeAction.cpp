@@ -6,47 +6,41 @@
 
 #include "platform/cgi/ApplicationRequest.h"
 
+#include "src/webapi/ApiError.h"
 #include "src/webapi/Failure.h"
 #include "src/webapi/LibraryApi.h"
 #include "src/webapi/ServiceProbe.h"
 
 namespace harmona::webapi {
-namespace {
-
-inline constexpr const char* kContentType = "application/json; charset=\"UTF-8\"";
-inline constexpr const char* kSystemSection = "common";
-inline constexpr const char* kSystemKey = "error_system";
-inline constexpr const char* kErrorSection = "error";
-inline constexpr const char* kNotFoundKey = "Could not get the entry";
-
-}  // namespace
+namespace {}  // namespace
 
 int LibraryApi::Probe(const std::string& service) {
     ServiceState state = ServiceState::running;
     if (service == "media_server") {
         state = ProbeLocalMediaServer();
         if (state == ServiceState::down)
-            return Fail(Failure::mediaServerDown, kSystemSection, kSystemKey, kBrowseFailedLine);
+            return Fail(Failure::mediaServerDown, kSystemSection, kSystemText, kBrowseFailedLine);
         if (state == ServiceState::notAnswering)
-            return Fail(Failure::mediaServerTimeout, kSystemSection, kSystemKey,
+            return Fail(Failure::mediaServerTimeout, kSystemSection, kSystemText,
                         kBrowseTimedOutLine);
     } else if (service == "audio_daemon") {
         // The audio daemon lists the media servers: without that permission there is no use of it.
         if ((permission_ & cgi::kPermissionMediaServer) == 0)
-            return Fail(Failure::requestRefused, kSystemSection, kSystemKey, kNoPermissionLine);
+            return Fail(Failure::requestRefused, kSystemSection, kSystemText, kNoPermissionLine);
         state = ProbeAudioDaemon();
         if (state == ServiceState::down)
-            return Fail(Failure::audioDaemonDown, kSystemSection, kSystemKey, kAudioDaemonDownLine);
+            return Fail(Failure::audioDaemonDown, kSystemSection, kSystemText,
+                        kAudioDaemonDownLine);
         if (state == ServiceState::notAnswering)
-            return Fail(Failure::audioDaemonTimeout, kSystemSection, kSystemKey,
+            return Fail(Failure::audioDaemonTimeout, kSystemSection, kSystemText,
                         kAudioDaemonTimedOutLine);
     } else {
-        return Fail(Failure::requestInvalid, kErrorSection, kNotFoundKey, kUnknownServiceLine);
+        return Fail(Failure::requestInvalid, kNotFoundSection, kNotFoundText, kUnknownServiceLine);
     }
     Json::Value reply(Json::objectValue);
     reply["success"] = true;
     reply["service"] = service;
-    PrintResponse(std::move(reply), kContentType);
+    PrintResponse(std::move(reply), kJsonReplyType);
     return 1;
 }
 

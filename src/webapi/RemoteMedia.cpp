@@ -34,8 +34,7 @@ constexpr ApiError kObjectInvalid{kStatusBadRequest, kNotFoundSection, kNotFound
                                   "object_invalid"};
 constexpr ApiError kBrowseFailed{kStatusBadGateway, kSystemSection, kSystemText, 424,
                                  "media_server_invalid"};
-constexpr ApiError kNotATrack{kStatusNotFound, kNotFoundSection, kNotFoundText, 425,
-                              "node_gone"};
+constexpr ApiError kNotATrack{kStatusNotFound, kNotFoundSection, kNotFoundText, 425, "node_gone"};
 constexpr ApiError kResourceElsewhere{kStatusForbidden, kSystemSection, kSystemText, 426,
                                       "resource_refused"};
 constexpr ApiError kTooLarge{kStatusBadGateway, kSystemSection, kSystemText, 427,

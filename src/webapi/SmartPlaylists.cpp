@@ -15,21 +15,12 @@
 #include "platform/paths/PlatformPaths.h"
 #include "platform/playlist/PlaylistWrite.h"
 #include "platform/playlist/SmartRules.h"
+#include "src/webapi/ApiError.h"
 #include "src/webapi/LibraryApi.h"
 #include "src/webapi/PlaylistEdit.h"
 
 namespace harmona::webapi {
 namespace {
-
-inline constexpr const char* kContentType = "application/json; charset=\"UTF-8\"";
-inline constexpr const char* kBadRequest = "400 Bad Request";
-inline constexpr const char* kForbidden = "403 Forbidden";
-inline constexpr const char* kNotFound = "404 Not Found";
-inline constexpr const char* kConflict = "409 Conflict";
-inline constexpr const char* kTooLarge = "413 Payload Too Large";
-inline constexpr const char* kUnprocessable = "422 Unprocessable Entity";
-inline constexpr const char* kServerError = "500 Internal Server Error";
-inline constexpr const char* kUnavailable = "503 Service Unavailable";
 
 enum ErrorLine : int {
     kNoSuchSmartLine = 301,
@@ -117,29 +108,29 @@ bool IsSmartPlaylistNode(std::string_view node) {
 int LibraryApi::ListSmartPlaylist(const std::string& node, Json::Value& reply) {
     const std::optional<SmartNode> smart = ParseSmartNode(node);
     if (!smart)
-        return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
-                        "Could not get the entry");
+        return FailWith(kStatusNotFound, "node_gone", kNoSuchSmartLine, kNotFoundSection,
+                        kNotFoundText);
     const std::string file = smart->shared ? std::string(paths::kSharedSmartPlaylists)
                                            : webMan.GetPreferenceDir() + paths::kPlaylistsFolder +
                                                  paths::kSmartPlaylistFile;
     const playlist::SmartSection section = playlist::ReadSmartSection(file.c_str(), smart->name);
     if (section.status == playlist::SmartReadStatus::missing)
-        return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
-                        "Could not get the entry");
+        return FailWith(kStatusNotFound, "node_gone", kNoSuchSmartLine, kNotFoundSection,
+                        kNotFoundText);
     if (section.status == playlist::SmartReadStatus::invalid)
-        return FailWith(kUnprocessable, "rule_invalid", kStoredRuleLine, nullptr, nullptr,
+        return FailWith(kStatusUnprocessable, "rule_invalid", kStoredRuleLine, nullptr, nullptr,
                         section.badKey);
 
     medialib::LibraryOpenResult library = medialib::OpenLibrary(paths::kLibraryDb);
     if (library.status != medialib::LibraryStatus::ok)
-        return FailWith(kUnavailable, "library_unavailable", kSmartLibraryLine, "common",
-                        "error_system");
+        return FailWith(kStatusUnavailable, "library_unavailable", kSmartLibraryLine,
+                        kSystemSection, kSystemText);
     const playlist::SmartQuery query = playlist::BuildSmartQuery(
         section.rules, medialib::AudioSharePath(), static_cast<std::int64_t>(std::time(nullptr)));
     sqlite::Statement select = library.db.Prepare(query.sql);
     if (!select)
-        return FailWith(kUnavailable, "library_unavailable", kSmartLibraryLine, "common",
-                        "error_system");
+        return FailWith(kStatusUnavailable, "library_unavailable", kSmartLibraryLine,
+                        kSystemSection, kSystemText);
     int index = 1;
     for (const auto& value : query.values) {
         if (const auto* number = std::get_if<std::int64_t>(&value))
@@ -152,11 +143,11 @@ int LibraryApi::ListSmartPlaylist(const std::string& node, Json::Value& reply) {
     while ((code = select.Step()) == SQLITE_ROW)
         paths.emplace_back(select.ColumnText(1));
     if (code != SQLITE_DONE)
-        return FailWith(kUnavailable, "library_unavailable", kSmartLibraryLine, "common",
-                        "error_system");
+        return FailWith(kStatusUnavailable, "library_unavailable", kSmartLibraryLine,
+                        kSystemSection, kSystemText);
     if (!OpenCatalog())
-        return FailWith(kUnavailable, "library_unavailable", kSmartLibraryLine, "common",
-                        "error_system");
+        return FailWith(kStatusUnavailable, "library_unavailable", kSmartLibraryLine,
+                        kSystemSection, kSystemText);
     AppendPlaylistTracks(paths, reply);
     return 1;
 }
@@ -166,8 +157,8 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
     if (action == "smartget") {
         const std::optional<SmartNode> smart = ParseSmartNode(webMan.In("node", ""));
         if (!smart)
-            return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
-                            "Could not get the entry");
+            return FailWith(kStatusNotFound, "node_gone", kNoSuchSmartLine, kNotFoundSection,
+                            kNotFoundText);
         const std::string file =
             smart->shared
                 ? std::string(paths::kSharedSmartPlaylists)
@@ -175,8 +166,8 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
         RawSection section(smart->name);
         conf::ReadConf(file.c_str(), section);
         if (!section.found)
-            return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
-                            "Could not get the entry");
+            return FailWith(kStatusNotFound, "node_gone", kNoSuchSmartLine, kNotFoundSection,
+                            kNotFoundText);
         Json::Value reply(Json::objectValue);
         reply["success"] = true;
         reply["node"] = NodeOf(smart->shared, smart->name);
@@ -184,7 +175,7 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
         reply["category"] = smart->shared ? "shared" : "personal";
         reply["rules"] = section.rules;
         reply["editable"] = !smart->shared || mayChangeShared;
-        PrintResponse(std::move(reply), kContentType);
+        PrintResponse(std::move(reply), kJsonReplyType);
         return 1;
     }
 
@@ -197,15 +188,15 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
     if (action == "smartsave") {
         const std::string category = webMan.In("category", "");
         if (category != "personal" && category != "shared")
-            return FailWith(kBadRequest, "category_invalid", kSmartCategoryLine);
+            return FailWith(kStatusBadRequest, "category_invalid", kSmartCategoryLine);
         shared = category == "shared";
         name = webMan.In("name", "");
         if (!playlist::IsValidPlaylistName(name))
-            return FailWith(kBadRequest, "name_invalid", kSmartNameLine);
+            return FailWith(kStatusBadRequest, "name_invalid", kSmartNameLine);
         if (const char* old = webMan.In("old", nullptr)) {
             if (!IsSectionName(old))
-                return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
-                                "Could not get the entry");
+                return FailWith(kStatusNotFound, "node_gone", kNoSuchSmartLine, kNotFoundSection,
+                                kNotFoundText);
             oldName = old;
         }
         for (std::string_view key : playlist::kSmartRuleKeys) {
@@ -213,22 +204,23 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
             if (value == nullptr)
                 continue;
             if (playlist::SetSmartRule(rules, key, value) != playlist::RuleOutcome::ok)
-                return FailWith(kBadRequest, "rule_invalid", kRequestRuleLine, nullptr, nullptr,
-                                std::string(key));
+                return FailWith(kStatusBadRequest, "rule_invalid", kRequestRuleLine, nullptr,
+                                nullptr, std::string(key));
         }
         if (std::optional<std::string> key = playlist::ConflictingRule(rules))
-            return FailWith(kBadRequest, "rule_invalid", kRequestRuleLine, nullptr, nullptr, *key);
+            return FailWith(kStatusBadRequest, "rule_invalid", kRequestRuleLine, nullptr, nullptr,
+                            *key);
     } else {  // smartdelete
         const std::optional<SmartNode> smart = ParseSmartNode(webMan.In("node", ""));
         if (!smart || !IsSectionName(smart->name))
-            return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
-                            "Could not get the entry");
+            return FailWith(kStatusNotFound, "node_gone", kNoSuchSmartLine, kNotFoundSection,
+                            kNotFoundText);
         shared = smart->shared;
         name = smart->name;
         oldName = smart->name;
     }
     if (shared && !mayChangeShared)
-        return FailWith(kForbidden, "request_refused", kSmartNotAllowedLine);
+        return FailWith(kStatusForbidden, "request_refused", kSmartNotAllowedLine);
 
     std::string folder = kSharedSmartFolder;
     if (!shared) {
@@ -237,28 +229,29 @@ int LibraryApi::EditSmartPlaylist(const std::string& action) {
     }
     const io::FileDescriptor dir = playlist::LockFolder(folder, !shared);
     if (!dir)
-        return FailWith(kServerError, "write_failed", kSmartWriteLine, "common", "error_system");
+        return FailWith(kStatusServerError, "write_failed", kSmartWriteLine, kSystemSection,
+                        kSystemText);
     const playlist::SmartChange changed = playlist::ChangeSmartSection(
         dir.Get(), kSmartFileName, oldName, name, action == "smartsave" ? &rules : nullptr);
     switch (changed) {
         case playlist::SmartChange::ok:
             break;
         case playlist::SmartChange::missing:
-            return FailWith(kNotFound, "node_gone", kNoSuchSmartLine, "error",
-                            "Could not get the entry");
+            return FailWith(kStatusNotFound, "node_gone", kNoSuchSmartLine, kNotFoundSection,
+                            kNotFoundText);
         case playlist::SmartChange::exists:
-            return FailWith(kConflict, "name_taken", kSmartNameTakenLine);
+            return FailWith(kStatusConflict, "name_taken", kSmartNameTakenLine);
         case playlist::SmartChange::tooLarge:
-            return FailWith(kTooLarge, "too_large", kSmartFileTooLargeLine);
+            return FailWith(kStatusTooLarge, "too_large", kSmartFileTooLargeLine);
         case playlist::SmartChange::failed:
-            return FailWith(kServerError, "write_failed", kSmartWriteLine, "common",
-                            "error_system");
+            return FailWith(kStatusServerError, "write_failed", kSmartWriteLine, kSystemSection,
+                            kSystemText);
     }
     Json::Value reply(Json::objectValue);
     reply["success"] = true;
     if (action == "smartsave")
         reply["node"] = NodeOf(shared, name);
-    PrintResponse(std::move(reply), kContentType);
+    PrintResponse(std::move(reply), kJsonReplyType);
     return 1;
 }
 
