@@ -9,14 +9,20 @@
 
 namespace harmona::webapi {
 
-int AnswerError(ActionHandler& handler, WebMan& webMan, const ApiError& error) {
+Json::Value ErrorReply(ActionHandler& handler, WebMan& webMan, const ApiError& error) {
     Json::Value reply(Json::objectValue);
     handler.SetError(reply, error.section, error.key, error.line);
     const Json::Value texts = VANU::ZET::LocalizedStringParser::ParseTexts(
         std::string(paths::kTextsPrefix) + webMan.GetUILanguage());
-    reply["message"] = texts[error.section][error.key].asString();
+    const Json::Value& text = texts[error.section][error.key];
+    if (text.isString())
+        reply["message"] = text.asString();
     reply["error"] = error.code;
-    handler.PrintResponse(std::move(reply), kJsonReplyType, error.status);
+    return reply;
+}
+
+int AnswerError(ActionHandler& handler, WebMan& webMan, const ApiError& error) {
+    handler.PrintResponse(ErrorReply(handler, webMan, error), kJsonReplyType, error.status);
     return 0;
 }
 

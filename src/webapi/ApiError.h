@@ -37,6 +37,10 @@ struct ApiError {
     const char* code;  // the "error" member
 };
 
+// The error reply's body: errinfo, the text of its section and key in the user's language as
+// "message" (when the texts have it), and the "error" code.
+Json::Value ErrorReply(ActionHandler& handler, WebMan& webMan, const ApiError& error);
+
 // Prints the error reply; returns 0, the exit status of a request that failed.
 int AnswerError(ActionHandler& handler, WebMan& webMan, const ApiError& error);
 

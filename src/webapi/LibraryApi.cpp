@@ -319,14 +319,8 @@ bool LibraryApi::OpenCatalog() {
 }
 
 int LibraryApi::Fail(Failure failure, const char* section, const char* key, int line) {
-    Json::Value reply(Json::objectValue);
-    SetError(reply, section, key, line);
-    reply["error"] = FailureCode(failure);
-    const Json::Value texts = VANU::ZET::LocalizedStringParser::ParseTexts(
-        std::string(paths::kTextsPrefix) + webMan.GetUILanguage());
-    reply["message"] = texts[section][key].asString();
-    PrintResponse(std::move(reply), kJsonReplyType, FailureStatus(failure));
-    return 0;
+    return AnswerError(*this, webMan,
+                       {FailureStatus(failure), section, key, line, FailureCode(failure)});
 }
 
 }  // namespace harmona::webapi

@@ -336,16 +336,12 @@ bool IsPlaylistEditAction(std::string_view action) {
 
 int LibraryApi::FailWith(const char* status, const char* error, int line, const char* section,
                          const char* key, const std::string& detail) {
-    Json::Value reply(Json::objectValue);
-    SetError(reply, section != nullptr ? section : "playlist", key != nullptr ? key : error, line);
-    reply["error"] = error;
+    // Without a UI text the code itself stands in the errinfo (section "playlist").
+    Json::Value reply = ErrorReply(*this, webMan,
+                                   {status, section != nullptr ? section : "playlist",
+                                    key != nullptr ? key : error, line, error});
     if (!detail.empty())
         reply["rule"] = detail;
-    if (section != nullptr && key != nullptr) {
-        const Json::Value texts = VANU::ZET::LocalizedStringParser::ParseTexts(
-            std::string(paths::kTextsPrefix) + webMan.GetUILanguage());
-        reply["message"] = texts[section][key].asString();
-    }
     PrintResponse(std::move(reply), kJsonReplyType, status);
     return 0;
 }
