@@ -15,6 +15,7 @@
 #include <string>
 
 #include "common/io/ChildProcess.h"
+#include "common/io/WriteAll.h"
 #include "platform/ipod/IPodPlaylist.h"
 #include "platform/ipod/IPodPluginApi.h"
 #include "platform/paths/PlatformPaths.h"
@@ -36,19 +37,7 @@ constexpr std::uint32_t kEndOfList = 0xFFFFFFFFu;
 // A name is cut to this many bytes on the way (the record keeps 254 of them anyway).
 constexpr std::size_t kMaxWireNameBytes = 1024;
 
-bool WriteAll(int fd, const void* data, std::size_t size) {
-    const char* bytes = static_cast<const char*>(data);
-    while (size > 0) {
-        const ssize_t n = write(fd, bytes, size);
-        if (n < 0 && errno == EINTR)
-            continue;
-        if (n <= 0)
-            return false;
-        bytes += n;
-        size -= static_cast<std::size_t>(n);
-    }
-    return true;
-}
+using io::WriteAll;
 
 // --- the child ---------------------------------------------------------------------------------
 

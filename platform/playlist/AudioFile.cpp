@@ -27,6 +27,7 @@
 #include <vector>
 
 #include "common/io/FileDescriptor.h"
+#include "common/io/WriteAll.h"
 #include "common/util/CleanText.h"
 #include "common/util/Utf8.h"
 #include "platform/lib/sqlite/Database.h"
@@ -248,18 +249,7 @@ std::string M3uText(const std::vector<Track>& tracks) {
     return text;
 }
 
-bool WriteAll(int fd, const std::string& text) {
-    std::size_t done = 0;
-    while (done < text.size()) {
-        const ssize_t n = write(fd, text.data() + done, text.size() - done);
-        if (n < 0 && errno == EINTR)
-            continue;
-        if (n <= 0)
-            return false;
-        done += static_cast<std::size_t>(n);
-    }
-    return true;
-}
+using io::WriteAll;
 
 // A name for the temporary file that no random playlist can have (those begin with "==").
 std::string TemporaryName(const std::string& base, Generator& random) {

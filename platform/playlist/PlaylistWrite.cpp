@@ -10,6 +10,7 @@
 #include <cerrno>
 #include <random>
 
+#include "common/io/WriteAll.h"
 #include "common/util/Utf8.h"
 #include "platform/conf/ConfFile.h"
 
@@ -28,17 +29,7 @@ std::string_view Trim(std::string_view s) {
     return s;
 }
 
-bool WriteAll(int fd, std::string_view text) {
-    while (!text.empty()) {
-        const ssize_t n = write(fd, text.data(), text.size());
-        if (n < 0 && errno == EINTR)
-            continue;
-        if (n <= 0)
-            return false;
-        text.remove_prefix(static_cast<std::size_t>(n));
-    }
-    return true;
-}
+using io::WriteAll;
 
 // A temporary name that no playlist file can have (it does not end in ".m3u" or ".m3u8") and
 // that the conf reader never reads.

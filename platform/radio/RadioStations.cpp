@@ -10,6 +10,7 @@
 #include <random>
 
 #include "common/io/FileDescriptor.h"
+#include "common/io/WriteAll.h"
 #include "common/util/Number.h"
 #include "common/util/Utf8.h"
 #include "platform/conf/ConfFile.h"
@@ -93,18 +94,7 @@ std::string FilePath(const std::string& preferenceDir) {
     return preferenceDir + "/" + kStationsFileName;
 }
 
-bool WriteAll(int fd, const std::string& text) {
-    std::size_t done = 0;
-    while (done < text.size()) {
-        const ssize_t n = write(fd, text.data() + done, text.size() - done);
-        if (n < 0 && errno == EINTR)
-            continue;
-        if (n <= 0)
-            return false;
-        done += static_cast<std::size_t>(n);
-    }
-    return true;
-}
+using io::WriteAll;
 
 // Writes `text` to a new file in the directory and renames it over the stations file; the data and
 // the rename are on disk when it returns true.
