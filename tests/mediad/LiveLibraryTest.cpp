@@ -240,9 +240,13 @@ TEST_F(LiveShare, APassOverTwentyThousandFilesGivesItsMemoryBackWhenItEnds) {
     EXPECT_EQ(figures[3], kManyFiles);
     ASSERT_GT(before, 0);
     ASSERT_GT(after, 0);
+#ifndef HARMONA_SANITIZE
+    // AddressSanitizer's allocator keeps freed blocks in quarantine and never trims: the bound
+    // holds for the real allocator only.
     EXPECT_LE(after, before + kPassMarginKiB)
         << "anonymous resident memory " << before << " KiB before the pass, " << after
         << " KiB after it";
+#endif
 }
 
 TEST_F(LiveShare, AFileAddedInANewFolderIsBrowsableWithinSeconds) {
