@@ -10,6 +10,50 @@
 
 namespace {
 
+// libcurl set up for one request: initialised in this order, cleaned up in the reverse.
+struct Session {
+    harmona::curl::GlobalInit global;
+    harmona::curl::Easy easy;
+    harmona::curl::StringList headers;
+
+    // Why no request can be made; nullptr when it can.
+    const char* Failure() const {
+        if (!global)
+            return "curl_global_init failed";
+        if (!easy)
+            return "curl_easy_init failed";
+        return nullptr;
+    }
+};
+
+// The options every request shares, each of which matters for a hostile or slow server: only
+// plain HTTP, never a redirect, never a proxy from the environment, no signals (SIGALRM for DNS
+// time-outs would disturb the CGI), the time limits, the caller's header lines and where the body
+// goes. False when libcurl refused one.
+template <typename Request, typename State>
+bool ConfigureShared(Session& session, const Request* request, curl_write_callback write,
+                     State* state) {
+    harmona::curl::Easy& easy = session.easy;
+    bool ok = true;
+    ok &= easy.SetOption(CURLOPT_URL, request->url) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_PROTOCOLS_STR, "http") == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_FOLLOWLOCATION, 0L) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_NOPROXY, "*") == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_NOSIGNAL, 1L) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_CONNECTTIMEOUT_MS, request->connectTimeoutMs) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_TIMEOUT_MS, request->totalTimeoutMs) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_WRITEFUNCTION, write) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_WRITEDATA, state) == CURLE_OK;
+    for (size_t i = 0; i < request->headerCount; ++i)
+        ok &= session.headers.Append(request->headers[i]);
+    return ok;
+}
+
+template <typename Result>
+void SetError(Result* result, const char* text) {
+    std::snprintf(result->error, sizeof(result->error), "%s", text);
+}
+
 struct SinkState {
     const harmona_http_post_request* request;
     const harmona::curl::Easy* easy;
@@ -38,34 +82,17 @@ size_t WriteToSink(char* data, size_t size, size_t count, void* context) {
     return bytes;
 }
 
-void SetError(harmona_http_post_result* result, const char* text) {
-    std::snprintf(result->error, sizeof(result->error), "%s", text);
-}
-
-// Every option that matters for a hostile or slow server; false when libcurl refused one.
-bool Configure(harmona::curl::Easy& easy, const harmona_http_post_request* request,
-               harmona::curl::StringList& headers, SinkState& state) {
-    bool ok = true;
-    ok &= easy.SetOption(CURLOPT_URL, request->url) == CURLE_OK;
-    // Only plain HTTP, never a redirect, never a proxy from the environment, no signals (SIGALRM
-    // for DNS time-outs would disturb the CGI).
-    ok &= easy.SetOption(CURLOPT_PROTOCOLS_STR, "http") == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_FOLLOWLOCATION, 0L) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_NOPROXY, "*") == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_NOSIGNAL, 1L) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_CONNECTTIMEOUT_MS, request->connectTimeoutMs) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_TIMEOUT_MS, request->totalTimeoutMs) == CURLE_OK;
+// The POST's own options: its body, sent at once.
+bool Configure(Session& session, const harmona_http_post_request* request, SinkState& state) {
+    harmona::curl::Easy& easy = session.easy;
+    bool ok = ConfigureShared(session, request, WriteToSink, &state);
     ok &= easy.SetOption(CURLOPT_POST, 1L) == CURLE_OK;
     ok &= easy.SetOption(CURLOPT_POSTFIELDS, request->body) == CURLE_OK;
     ok &= easy.SetOption(CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(request->bodySize)) ==
           CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_WRITEFUNCTION, WriteToSink) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_WRITEDATA, &state) == CURLE_OK;
-    for (size_t i = 0; i < request->headerCount; ++i)
-        ok &= headers.Append(request->headers[i]);
     // libcurl would wait up to a second for "100 Continue" on a large body; servers rarely send it.
-    ok &= headers.Append("Expect:");
-    ok &= easy.SetOption(CURLOPT_HTTPHEADER, headers.Get()) == CURLE_OK;
+    ok &= session.headers.Append("Expect:");
+    ok &= easy.SetOption(CURLOPT_HTTPHEADER, session.headers.Get()) == CURLE_OK;
     return ok;
 }
 
@@ -83,19 +110,14 @@ extern "C" __attribute__((visibility("default"))) int harmona_http_post(
         SetError(result, "bad request");
         return -1;
     }
-    harmona::curl::GlobalInit global;
-    if (!global) {
-        SetError(result, "curl_global_init failed");
+    Session session;
+    if (const char* failure = session.Failure()) {
+        SetError(result, failure);
         return -1;
     }
-    harmona::curl::Easy easy;
-    if (!easy) {
-        SetError(result, "curl_easy_init failed");
-        return -1;
-    }
-    harmona::curl::StringList headers;
+    harmona::curl::Easy& easy = session.easy;
     SinkState state{request, &easy};
-    if (!Configure(easy, request, headers, state)) {
+    if (!Configure(session, request, state)) {
         SetError(result, "curl refused an option");
         return -1;
     }
@@ -157,33 +179,19 @@ size_t WriteBody(char* data, size_t size, size_t count, void* context) {
     return bytes;
 }
 
-bool ConfigureGet(harmona::curl::Easy& easy, const harmona_http_get_request* request,
-                  harmona::curl::StringList& headers, GetState& state) {
-    bool ok = true;
-    ok &= easy.SetOption(CURLOPT_URL, request->url) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_PROTOCOLS_STR, "http") == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_FOLLOWLOCATION, 0L) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_NOPROXY, "*") == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_NOSIGNAL, 1L) == CURLE_OK;
+// The GET's own options: the body passed on as the server sends it (no decoding, no cookies), and
+// a stall limit.
+bool ConfigureGet(Session& session, const harmona_http_get_request* request, GetState& state) {
+    harmona::curl::Easy& easy = session.easy;
+    bool ok = ConfigureShared(session, request, WriteBody, &state);
     ok &= easy.SetOption(CURLOPT_HTTPGET, 1L) == CURLE_OK;
-    // The body is passed on as the server sends it: no decoding, no cookies.
     ok &= easy.SetOption(CURLOPT_HTTP_CONTENT_DECODING, 0L) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_CONNECTTIMEOUT_MS, request->connectTimeoutMs) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_TIMEOUT_MS, request->totalTimeoutMs) == CURLE_OK;
     // Less than one byte a second for the stall time: the server hangs.
     const long stallSeconds = request->stallTimeoutMs > 999 ? request->stallTimeoutMs / 1000 : 1;
     ok &= easy.SetOption(CURLOPT_LOW_SPEED_LIMIT, 1L) == CURLE_OK;
     ok &= easy.SetOption(CURLOPT_LOW_SPEED_TIME, stallSeconds) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_WRITEFUNCTION, WriteBody) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_WRITEDATA, &state) == CURLE_OK;
-    for (size_t i = 0; i < request->headerCount; ++i)
-        ok &= headers.Append(request->headers[i]);
-    ok &= easy.SetOption(CURLOPT_HTTPHEADER, headers.Get()) == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_HTTPHEADER, session.headers.Get()) == CURLE_OK;
     return ok;
-}
-
-void SetGetError(harmona_http_get_result* result, const char* text) {
-    std::snprintf(result->error, sizeof(result->error), "%s", text);
 }
 
 }  // namespace
@@ -195,23 +203,18 @@ extern "C" __attribute__((visibility("default"))) int harmona_http_get(
     *result = harmona_http_get_result{};
     if (request == nullptr || request->url == nullptr || request->sink == nullptr ||
         request->head == nullptr) {
-        SetGetError(result, "bad request");
+        SetError(result, "bad request");
         return -1;
     }
-    harmona::curl::GlobalInit global;
-    if (!global) {
-        SetGetError(result, "curl_global_init failed");
+    Session session;
+    if (const char* failure = session.Failure()) {
+        SetError(result, failure);
         return -1;
     }
-    harmona::curl::Easy easy;
-    if (!easy) {
-        SetGetError(result, "curl_easy_init failed");
-        return -1;
-    }
-    harmona::curl::StringList headers;
+    harmona::curl::Easy& easy = session.easy;
     GetState state{request, &easy};
-    if (!ConfigureGet(easy, request, headers, state)) {
-        SetGetError(result, "curl refused an option");
+    if (!ConfigureGet(session, request, state)) {
+        SetError(result, "curl refused an option");
         return -1;
     }
     CURLcode code = easy.Perform();
@@ -225,7 +228,7 @@ extern "C" __attribute__((visibility("default"))) int harmona_http_get(
     result->connected =
         easy.GetInfo(CURLINFO_CONNECT_TIME_T, &connectTime) == CURLE_OK && connectTime > 0 ? 1 : 0;
     if (code != CURLE_OK) {
-        SetGetError(result, curl_easy_strerror(code));
+        SetError(result, curl_easy_strerror(code));
         return -1;
     }
     return 0;

@@ -27,7 +27,7 @@
 #include <vector>
 
 #include "common/io/FileDescriptor.h"
-#include "common/io/WriteAll.h"
+#include "common/io/ReplaceFile.h"
 #include "common/util/CleanText.h"
 #include "common/util/Utf8.h"
 #include "platform/lib/sqlite/Database.h"
@@ -249,18 +249,6 @@ std::string M3uText(const std::vector<Track>& tracks) {
     return text;
 }
 
-using io::WriteAll;
-
-// A name for the temporary file that no random playlist can have (those begin with "==").
-std::string TemporaryName(const std::string& base, Generator& random) {
-    static constexpr char kLetters[] = "abcdefghijklmnopqrstuvwxyz0123456789";
-    std::uniform_int_distribution<int> letter(0, sizeof kLetters - 2);
-    std::string name = ".tmp-" + base + "-";
-    for (int i = 0; i < 8; ++i)
-        name += kLetters[letter(random)];
-    return name;
-}
-
 // The name of the user `uid`, or "?" when the system does not know it.
 std::string UserNameOf(uid_t uid) {
     passwd entry{};
@@ -298,26 +286,13 @@ bool ReplaceFile(const char* path, const std::string& text) {
     FileDescriptor dir(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     if (dir.Get() < 0 || !MayReplace(dir.Get(), full, base))
         return false;
-    Generator random = SeededGenerator();
-    for (int attempt = 0; attempt < 16; ++attempt) {
-        const std::string temporary = TemporaryName(base, random);
-        FileDescriptor file(openat(dir.Get(), temporary.c_str(),
-                                   O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
-        if (file.Get() < 0) {
-            if (errno == EEXIST)
-                continue;
-            return false;
-        }
-        const bool written = WriteAll(file.Get(), text) && file.Close();
-        if (written && renameat(dir.Get(), temporary.c_str(), dir.Get(), base.c_str()) == 0)
-            return true;
-        const int renameError = errno;
-        unlinkat(dir.Get(), temporary.c_str(), 0);
-        // Another user's file put there since the test above: say whose, as above.
-        if (written && (renameError == EPERM || renameError == EACCES))
-            MayReplace(dir.Get(), full, base);
-        return false;
-    }
+    // The temporary file's name is one no random playlist can have (those begin with "==").
+    const std::string temporaryPrefix = ".tmp-" + base + "-";
+    if (io::ReplaceFileAt(dir.Get(), base.c_str(), text, temporaryPrefix) == io::ReplaceOutcome::ok)
+        return true;
+    // Another user's file put there since the test above: say whose, as above.
+    if (errno == EPERM || errno == EACCES)
+        MayReplace(dir.Get(), full, base);
     return false;
 }
 

@@ -8,9 +8,8 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <random>
 
-#include "common/io/WriteAll.h"
+#include "common/io/ReplaceFile.h"
 #include "common/util/Utf8.h"
 #include "platform/conf/ConfFile.h"
 
@@ -29,19 +28,9 @@ std::string_view Trim(std::string_view s) {
     return s;
 }
 
-using io::WriteAll;
-
-// A temporary name that no playlist file can have (it does not end in ".m3u" or ".m3u8") and
-// that the conf reader never reads.
-std::string TemporaryName() {
-    static constexpr char kLetters[] = "abcdefghijklmnopqrstuvwxyz0123456789";
-    std::random_device device;
-    std::uniform_int_distribution<int> letter(0, sizeof kLetters - 2);
-    std::string name = ".tmp-playlist-";
-    for (int i = 0; i < 12; ++i)
-        name += kLetters[letter(device)];
-    return name;
-}
+// Temporary files begin so: no playlist file can have such a name (it does not end in ".m3u" or
+// ".m3u8") and the conf reader never reads it.
+constexpr char kTemporaryPrefix[] = ".tmp-playlist-";
 
 // The whole file `name` in `dirFd` (a regular file, not through a link), at most `maxBytes`.
 enum class ReadWhole { ok, missing, tooLarge, failed };
@@ -152,30 +141,13 @@ WriteOutcome WriteFileAt(int dirFd, const std::string& name, std::string_view te
         if (S_ISREG(old.st_mode))
             mode = old.st_mode & 0777;
     }
-    for (int attempt = 0; attempt < 16; ++attempt) {
-        const std::string temporary = TemporaryName();
-        io::FileDescriptor file(openat(dirFd, temporary.c_str(),
-                                       O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, mode));
-        if (!file) {
-            if (errno == EEXIST)
-                continue;
-            return WriteOutcome::failed;
-        }
-        fchmod(file.Get(), mode);  // whatever the umask took away
-        const bool written = WriteAll(file.Get(), text) && fsync(file.Get()) == 0 && file.Close();
-        int renamed = -1;
-        if (written) {
-            renamed = mustBeNew ? renameat2(dirFd, temporary.c_str(), dirFd, name.c_str(),
-                                            RENAME_NOREPLACE)
-                                : renameat(dirFd, temporary.c_str(), dirFd, name.c_str());
-        }
-        if (renamed != 0) {
-            const int error = errno;
-            unlinkat(dirFd, temporary.c_str(), 0);
-            return written && error == EEXIST ? WriteOutcome::exists : WriteOutcome::failed;
-        }
-        fsync(dirFd);
-        return WriteOutcome::ok;
+    switch (io::ReplaceFileAt(dirFd, name.c_str(), text, kTemporaryPrefix, {mode, mustBeNew})) {
+        case io::ReplaceOutcome::ok:
+            return WriteOutcome::ok;
+        case io::ReplaceOutcome::exists:
+            return WriteOutcome::exists;
+        case io::ReplaceOutcome::failed:
+            break;
     }
     return WriteOutcome::failed;
 }

@@ -6,11 +6,9 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdio>
-#include <random>
 
 #include "common/io/FileDescriptor.h"
-#include "common/io/WriteAll.h"
+#include "common/io/ReplaceFile.h"
 #include "common/util/Number.h"
 #include "common/util/Utf8.h"
 #include "platform/conf/ConfFile.h"
@@ -94,33 +92,11 @@ std::string FilePath(const std::string& preferenceDir) {
     return preferenceDir + "/" + kStationsFileName;
 }
 
-using io::WriteAll;
-
 // Writes `text` to a new file in the directory and renames it over the stations file; the data and
 // the rename are on disk when it returns true.
 bool ReplaceStationsFile(int dirFd, const std::string& text) {
-    std::random_device seed;
-    std::mt19937 random(seed());
-    for (int attempt = 0; attempt < 16; ++attempt) {
-        char temporary[64];
-        std::snprintf(temporary, sizeof(temporary), ".%s.%08x", kStationsFileName,
-                      static_cast<unsigned>(random()));
-        io::FileDescriptor file(
-            openat(dirFd, temporary, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
-        if (!file) {
-            if (errno == EEXIST)
-                continue;
-            return false;
-        }
-        const bool written = WriteAll(file.Get(), text) && fsync(file.Get()) == 0 && file.Close();
-        if (written && renameat(dirFd, temporary, dirFd, kStationsFileName) == 0) {
-            fsync(dirFd);
-            return true;
-        }
-        unlinkat(dirFd, temporary, 0);
-        return false;
-    }
-    return false;
+    return io::ReplaceFileAt(dirFd, kStationsFileName, text,
+                             std::string(".") + kStationsFileName + ".") == io::ReplaceOutcome::ok;
 }
 
 // Runs `change` on the stations under an exclusive lock of the preference directory (made when

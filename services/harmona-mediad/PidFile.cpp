@@ -8,6 +8,7 @@
 #include <cstdlib>
 
 #include "common/io/FileDescriptor.h"
+#include "common/io/ReplaceFile.h"
 #include "platform/paths/PlatformPaths.h"
 
 namespace harmona::mediad {
@@ -30,22 +31,16 @@ std::string PidFilePath() {
 
 bool WritePidFile(const std::string& path) {
     const std::size_t slash = path.rfind('/');
+    const std::string folder = slash == std::string::npos ? "." : path.substr(0, slash + 1);
+    const std::string name = slash == std::string::npos ? path : path.substr(slash + 1);
     if (slash != std::string::npos)
-        MakeDirs(path.substr(0, slash + 1));
-    const std::string temporary = path + ".tmp";
-    unlink(temporary.c_str());
-    io::FileDescriptor fd(
-        open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644));
-    if (!fd)
+        MakeDirs(folder);
+    const io::FileDescriptor dir(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (!dir)
         return false;
-    const std::string text = std::to_string(getpid()) + "\n";
-    const bool written =
-        write(fd.Get(), text.data(), text.size()) == static_cast<ssize_t>(text.size());
-    if (!fd.Close() || !written || rename(temporary.c_str(), path.c_str()) != 0) {
-        unlink(temporary.c_str());
-        return false;
-    }
-    return true;
+    // Readable by all: whoever looks for the running server reads it.
+    return io::ReplaceFileAt(dir.Get(), name.c_str(), std::to_string(getpid()) + "\n",
+                             "." + name + ".", {0644}) == io::ReplaceOutcome::ok;
 }
 
 void RemovePidFile(const std::string& path) {

@@ -54,12 +54,41 @@ enum ErrorLine : int {
     kCategoryInvalidLine = 212,
     kLibraryBusyLine = 213,
     kNoIdLeftLine = 214,
+    kPlaylistChangedLine = 215,
 };
 
 inline constexpr std::string_view kPersonalPrefix = "musiclib_music_personal/playlist/";
 inline constexpr std::string_view kSharedPrefix = "musiclib_music_shared/playlist/";
 inline constexpr std::int64_t kMaxSharedId = 4294967295LL;
 inline constexpr const char* kPlaylistFileEnding = ".m3u8";
+
+// An error reply of a change, as LibraryApi::FailWith writes it; without a section and key the
+// code itself stands in the errinfo.
+struct Refusal {
+    const char* status;
+    const char* error;
+    int line;
+    const char* section = nullptr;
+    const char* key = nullptr;
+};
+using MaybeRefusal = std::optional<Refusal>;
+
+constexpr Refusal kWriteFailed{kStatusServerError, "write_failed", kWriteFailedLine, kSystemSection,
+                               kSystemText};
+constexpr Refusal kPlaylistGone{kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
+                                kNotFoundText};
+constexpr Refusal kLibraryUnavailable{kStatusUnavailable, "library_unavailable",
+                                      kLibraryUnavailableLine, kSystemSection, kSystemText};
+constexpr Refusal kLibraryBusy{kStatusUnavailable, "library_busy", kLibraryBusyLine};
+constexpr Refusal kNameInvalid{kStatusBadRequest, "name_invalid", kNameInvalidLine};
+constexpr Refusal kNameTaken{kStatusConflict, "name_taken", kNameTakenLine};
+constexpr Refusal kNotAllowed{kStatusForbidden, "request_refused", kNotAllowedLine};
+constexpr Refusal kPositionInvalid{kStatusBadRequest, "position_invalid", kPositionInvalidLine};
+constexpr Refusal kTrackUnknown{kStatusBadRequest, "track_unknown", kTrackUnknownLine};
+constexpr Refusal kPlaylistFull{kStatusTooLarge, "too_large", kPlaylistFullLine};
+constexpr Refusal kCategoryInvalid{kStatusBadRequest, "category_invalid", kCategoryInvalidLine};
+constexpr Refusal kNoIdLeft{kStatusInsufficientStorage, "no_id_left", kNoIdLeftLine};
+constexpr Refusal kPlaylistChanged{kStatusConflict, "playlist_changed", kPlaylistChangedLine};
 
 bool StartsWith(std::string_view text, std::string_view prefix) {
     return text.compare(0, prefix.size(), prefix) == 0;
@@ -248,40 +277,47 @@ ChangeOutcome Apply(const EntryChange& change, std::vector<std::string>& paths) 
     return ChangeOutcome::badPosition;
 }
 
-// library.db opened for writing: only a regular file, with the same busy timeout as every reader.
-sqlite::Database OpenLibraryForWriting() {
-    struct stat st {};
-    if (stat(paths::kLibraryDb, &st) != 0 || !S_ISREG(st.st_mode))
-        return sqlite::Database();
-    return sqlite::Database::Open(paths::kLibraryDb, SQLITE_OPEN_READWRITE,
-                                  medialib::kLibraryBusyTimeoutMs);
-}
-
-// A write transaction that is rolled back unless committed.
-class WriteTransaction {
+// library.db opened for writing (only a regular file, with the same busy timeout as every reader)
+// with a write transaction begun, which is rolled back unless committed.
+class LibraryWrite {
   public:
-    explicit WriteTransaction(sqlite::Database& db) : db_(db) {
-        code_ = db_.Execute("BEGIN IMMEDIATE");
+    LibraryWrite() {
+        struct stat st {};
+        if (stat(paths::kLibraryDb, &st) != 0 || !S_ISREG(st.st_mode))
+            return;
+        db_ = sqlite::Database::Open(paths::kLibraryDb, SQLITE_OPEN_READWRITE,
+                                     medialib::kLibraryBusyTimeoutMs);
+        if (db_)
+            begun_ = db_.Execute("BEGIN IMMEDIATE");
     }
-    ~WriteTransaction() {
-        if (code_ == SQLITE_OK && !committed_)
+    ~LibraryWrite() {
+        if (begun_ == SQLITE_OK && !committed_)
             db_.Execute("ROLLBACK");
     }
-    int Code() const { return code_; }
+    LibraryWrite(const LibraryWrite&) = delete;
+    LibraryWrite& operator=(const LibraryWrite&) = delete;
+
+    // Why no change can be made: library.db missing, held by another writer past the timeout, or
+    // not writable.
+    MaybeRefusal WhyNot() const {
+        if (!db_)
+            return kLibraryUnavailable;
+        if (begun_ == SQLITE_OK)
+            return std::nullopt;
+        const int primary = begun_ & 0xff;
+        return primary == SQLITE_BUSY || primary == SQLITE_LOCKED ? kLibraryBusy : kWriteFailed;
+    }
+    sqlite::Database& Db() { return db_; }
     bool Commit() {
         committed_ = db_.Execute("COMMIT") == SQLITE_OK;
         return committed_;
     }
 
   private:
-    sqlite::Database& db_;
-    int code_ = SQLITE_ERROR;
+    sqlite::Database db_;
+    int begun_ = SQLITE_ERROR;
     bool committed_ = false;
 };
-
-bool IsBusy(int code) {
-    return (code & 0xff) == SQLITE_BUSY || (code & 0xff) == SQLITE_LOCKED;
-}
 
 std::optional<std::vector<std::string>> SharedPaths(sqlite::Database& db, std::int64_t id) {
     sqlite::Statement exists = db.Prepare("SELECT 1 FROM playlist WHERE id = ?");
@@ -327,6 +363,290 @@ bool SharedNameTaken(sqlite::Database& db, const std::string& name, std::int64_t
     return taken.Step() == SQLITE_ROW;
 }
 
+// The playlist a change names by its tree node: a personal one by its name (found among the
+// folder's files, never used as a path), a shared one by its number.
+struct Target {
+    enum class Kind { personal, shared } kind = Kind::personal;
+    std::string node;
+    std::string name;      // personal
+    std::int64_t id = -1;  // shared
+};
+
+MaybeRefusal ParseTarget(const std::string& node, bool mayChangeShared, Target& target) {
+    target.node = node;
+    if (StartsWith(node, kPersonalPrefix)) {
+        // Any name the listing gives (a file's name less its ending) is accepted here; the rules
+        // of a new name apply to new names only.
+        target.kind = Target::Kind::personal;
+        target.name = node.substr(kPersonalPrefix.size());
+        if (target.name.empty() || target.name.find('/') != std::string::npos)
+            return kPlaylistGone;
+        return std::nullopt;
+    }
+    if (StartsWith(node, kSharedPrefix)) {
+        target.kind = Target::Kind::shared;
+        if (!util::ParseDecimalDigits(node.substr(kSharedPrefix.size()), target.id) ||
+            target.id > kMaxSharedId)
+            return kPlaylistGone;
+        return mayChangeShared ? std::nullopt : MaybeRefusal(kNotAllowed);
+    }
+    return kPlaylistGone;
+}
+
+// What a change asks, checked before anything is opened.
+struct ChangeRequest {
+    std::string action;
+    EntryChange change;
+    std::vector<std::string_view> streams;  // pladd: the stream ids, in order
+    // plremove, plmove: the stream ids the page saw at the entries named (plremove: one for each,
+    // plmove: the one moved); none given, none checked. Another tab or user may have changed the
+    // playlist since it was listed, and entry numbers alone would then remove or move another
+    // track.
+    std::vector<std::string_view> expected;
+    std::string newName;  // plrename
+
+    bool ChangesEntries() const {
+        return action == "pladd" || action == "plremove" || action == "plmove";
+    }
+};
+
+// The stream ids of `expect`: none, or exactly `count`.
+bool ParseExpected(WebMan& webMan, std::size_t count, std::vector<std::string_view>& expected) {
+    const std::string_view given = webMan.In("expect", "");
+    if (given.empty())
+        return true;
+    return SplitList(given, playlist::kMaxPlaylistEntries, expected) && expected.size() == count;
+}
+
+MaybeRefusal ParseChange(WebMan& webMan, ChangeRequest& request) {
+    EntryChange& change = request.change;
+    if (request.action == "pladd") {
+        change.kind = EntryChange::Kind::add;
+        if (!SplitList(webMan.In("streams", ""), playlist::kMaxPlaylistEntries, request.streams))
+            return kTrackUnknown;
+        const std::string at = webMan.In("position", "");
+        std::size_t position = 0;
+        if (!at.empty()) {
+            if (!ParseIndex(at, position))
+                return kPositionInvalid;
+            change.at = position;
+        }
+    } else if (request.action == "plremove") {
+        change.kind = EntryChange::Kind::remove;
+        std::vector<std::string_view> entries;
+        if (!SplitList(webMan.In("entries", ""), playlist::kMaxPlaylistEntries, entries))
+            return kPositionInvalid;
+        for (std::string_view item : entries) {
+            std::size_t entry = 0;
+            if (!ParseIndex(item, entry))
+                return kPositionInvalid;
+            change.remove.push_back(entry);
+        }
+        if (!ParseExpected(webMan, change.remove.size(), request.expected))
+            return kPositionInvalid;
+    } else if (request.action == "plmove") {
+        change.kind = EntryChange::Kind::move;
+        if (!ParseIndex(webMan.In("from", ""), change.from) ||
+            !ParseIndex(webMan.In("to", ""), change.to) ||
+            !ParseExpected(webMan, 1, request.expected))
+            return kPositionInvalid;
+    } else if (request.action == "plrename") {
+        request.newName = webMan.In("name", "");
+        if (!playlist::IsValidPlaylistName(request.newName))
+            return kNameInvalid;
+    }
+    return std::nullopt;
+}
+
+// True when each entry named still holds the track the page saw there.
+bool EntriesAsExpected(const ChangeRequest& request, EntryLookup& lookup,
+                       const std::vector<std::string>& paths) {
+    const EntryChange& change = request.change;
+    const std::vector<std::size_t> named = change.kind == EntryChange::Kind::move
+                                               ? std::vector<std::size_t>{change.from}
+                                               : change.remove;
+    for (std::size_t i = 0; i < request.expected.size() && i < named.size(); ++i) {
+        if (named[i] >= paths.size())
+            return true;  // a position outside the playlist: Apply says so
+        const std::optional<LibraryEntry> entry = lookup.ByStream(request.expected[i]);
+        if (!entry || entry->path != paths[named[i]])
+            return false;
+    }
+    return true;
+}
+
+// The change applied to the entries: the paths of the tracks added looked up first.
+MaybeRefusal ApplyChange(ChangeRequest& request, EntryLookup& lookup,
+                         std::vector<std::string>& paths) {
+    if (!EntriesAsExpected(request, lookup, paths))
+        return kPlaylistChanged;
+    if (request.change.kind == EntryChange::Kind::add) {
+        for (std::string_view stream : request.streams) {
+            std::optional<LibraryEntry> entry = lookup.ByStream(stream);
+            if (!entry)
+                return kTrackUnknown;
+            request.change.addPaths.push_back(std::move(entry->path));
+        }
+    }
+    switch (Apply(request.change, paths)) {
+        case ChangeOutcome::ok:
+            return std::nullopt;
+        case ChangeOutcome::badPosition:
+            return kPositionInvalid;
+        case ChangeOutcome::full:
+            return kPlaylistFull;
+    }
+    return kPositionInvalid;
+}
+
+MaybeRefusal CreatePersonal(const std::string& preferenceDir, const std::string& folder,
+                            const std::string& name, Json::Value& reply) {
+    mkdir(preferenceDir.c_str(), 0755);
+    const io::FileDescriptor dir = playlist::LockFolder(folder, true);
+    if (!dir)
+        return kWriteFailed;
+    if (FindPlaylistFile(dir.Get(), name))
+        return kNameTaken;
+    switch (playlist::WriteFileAt(dir.Get(), name + kPlaylistFileEnding, "#EXTM3U\n", true)) {
+        case playlist::WriteOutcome::ok:
+            break;
+        case playlist::WriteOutcome::exists:
+            return kNameTaken;
+        default:
+            return kWriteFailed;
+    }
+    reply["node"] = std::string(kPersonalPrefix) + name;
+    return std::nullopt;
+}
+
+MaybeRefusal CreateShared(const std::string& name, Json::Value& reply) {
+    LibraryWrite write;
+    if (MaybeRefusal refused = write.WhyNot())
+        return refused;
+    sqlite::Database& db = write.Db();
+    if (SharedNameTaken(db, name, -1))
+        return kNameTaken;
+    sqlite::Statement next = db.Prepare("SELECT coalesce(max(id), 0) + 1 FROM playlist");
+    if (!next || next.Step() != SQLITE_ROW)
+        return kWriteFailed;
+    const std::int64_t id = next.ColumnInt64(0);
+    if (id > kMaxSharedId)
+        return kNoIdLeft;
+    sqlite::Statement insert = db.Prepare("INSERT INTO playlist (id, name) VALUES (?, ?)");
+    if (!insert || insert.Bind(1, id) != SQLITE_OK ||
+        insert.Bind(2, std::string_view(name)) != SQLITE_OK || insert.Step() != SQLITE_DONE ||
+        !write.Commit())
+        return kWriteFailed;
+    reply["node"] = std::string(kSharedPrefix) + std::to_string(id);
+    return std::nullopt;
+}
+
+MaybeRefusal RenamePersonal(int dirFd, const std::string& file, const Target& target,
+                            const std::string& newName) {
+    if (newName == target.name)
+        return std::nullopt;
+    if (FindPlaylistFile(dirFd, newName))
+        return kNameTaken;
+    const std::string renamed = newName + file.substr(target.name.size());
+    if (renameat2(dirFd, file.c_str(), dirFd, renamed.c_str(), RENAME_NOREPLACE) != 0)
+        return errno == EEXIST ? kNameTaken : kWriteFailed;
+    fsync(dirFd);
+    return std::nullopt;
+}
+
+MaybeRefusal ChangePersonalEntries(int dirFd, const std::string& file, ChangeRequest& request,
+                                   Json::Value& reply) {
+    playlist::PlaylistFileEntries entries =
+        playlist::ReadPlaylistFileAt(dirFd, file.c_str(), medialib::AudioSharePath());
+    if (entries.status == playlist::PlaylistFileStatus::tooLarge)
+        return kPlaylistFull;
+    if (entries.status != playlist::PlaylistFileStatus::ok)
+        return kPlaylistGone;
+    medialib::LibraryOpenResult library = medialib::OpenLibrary(paths::kLibraryDb);
+    if (library.status != medialib::LibraryStatus::ok)
+        return kLibraryUnavailable;
+    EntryLookup lookup(library.db);
+    if (!lookup)
+        return kLibraryUnavailable;
+    if (MaybeRefusal refused = ApplyChange(request, lookup, entries.paths))
+        return refused;
+    if (playlist::WriteFileAt(dirFd, file, PlaylistText(entries.paths, &lookup), false) !=
+        playlist::WriteOutcome::ok)
+        return kWriteFailed;
+    reply["entries"] = Json::UInt64(entries.paths.size());
+    return std::nullopt;
+}
+
+// A personal playlist changed under the lock of its folder.
+MaybeRefusal ChangePersonal(const std::string& folder, const Target& target, ChangeRequest& request,
+                            Json::Value& reply) {
+    const io::FileDescriptor dir = playlist::LockFolder(folder, false);
+    if (!dir)
+        return kPlaylistGone;
+    const std::optional<std::string> file = FindPlaylistFile(dir.Get(), target.name);
+    if (!file)
+        return kPlaylistGone;
+    if (request.action == "pldelete") {
+        if (unlinkat(dir.Get(), file->c_str(), 0) != 0)
+            return kWriteFailed;
+        fsync(dir.Get());
+        return std::nullopt;
+    }
+    if (request.action == "plrename") {
+        reply["node"] = std::string(kPersonalPrefix) + request.newName;
+        return RenamePersonal(dir.Get(), *file, target, request.newName);
+    }
+    reply["node"] = target.node;
+    return ChangePersonalEntries(dir.Get(), *file, request, reply);
+}
+
+bool DeleteShared(sqlite::Database& db, std::int64_t id) {
+    sqlite::Statement entries = db.Prepare("DELETE FROM playlist_entry WHERE playlist_id = ?");
+    sqlite::Statement row = db.Prepare("DELETE FROM playlist WHERE id = ?");
+    return entries && row && entries.Bind(1, id) == SQLITE_OK && entries.Step() == SQLITE_DONE &&
+           row.Bind(1, id) == SQLITE_OK && row.Step() == SQLITE_DONE;
+}
+
+bool RenameShared(sqlite::Database& db, std::int64_t id, const std::string& newName) {
+    sqlite::Statement update = db.Prepare("UPDATE playlist SET name = ? WHERE id = ?");
+    return update && update.Bind(1, std::string_view(newName)) == SQLITE_OK &&
+           update.Bind(2, id) == SQLITE_OK && update.Step() == SQLITE_DONE;
+}
+
+// A shared playlist changed in one write transaction of library.db.
+MaybeRefusal ChangeShared(const Target& target, ChangeRequest& request, Json::Value& reply) {
+    LibraryWrite write;
+    if (MaybeRefusal refused = write.WhyNot())
+        return refused;
+    sqlite::Database& db = write.Db();
+    std::optional<std::vector<std::string>> paths = SharedPaths(db, target.id);
+    if (!paths)
+        return kPlaylistGone;
+    bool stored = true;
+    if (request.action == "pldelete") {
+        stored = DeleteShared(db, target.id);
+    } else if (request.action == "plrename") {
+        if (SharedNameTaken(db, request.newName, target.id))
+            return kNameTaken;
+        stored = RenameShared(db, target.id, request.newName);
+        reply["node"] = target.node;
+    } else if (request.ChangesEntries()) {
+        if (paths->size() > playlist::kMaxPlaylistEntries)
+            return kPlaylistFull;
+        EntryLookup lookup(db);
+        if (!lookup)
+            return kWriteFailed;
+        if (MaybeRefusal refused = ApplyChange(request, lookup, *paths))
+            return refused;
+        stored = StoreSharedPaths(db, target.id, *paths);
+        reply["node"] = target.node;
+        reply["entries"] = Json::UInt64(paths->size());
+    }
+    if (!stored || !write.Commit())
+        return kWriteFailed;
+    return std::nullopt;
+}
+
 }  // namespace
 
 bool IsPlaylistEditAction(std::string_view action) {
@@ -361,255 +681,40 @@ int LibraryApi::AdmitChange() {
 int LibraryApi::EditPlaylist(const std::string& action) {
     if (AdmitChange() == 0)
         return 0;
+    const auto refuse = [this](const Refusal& refusal) {
+        return FailWith(refusal.status, refusal.error, refusal.line, refusal.section, refusal.key);
+    };
     const bool mayChangeShared = (permission_ & cgi::kPermissionNewSharedPlaylist) != 0;
     const std::string folder = webMan.GetPreferenceDir() + paths::kPlaylistsFolder;
+    Json::Value reply(Json::objectValue);
+    reply["success"] = true;
 
+    MaybeRefusal refused;
     if (action == "plcreate") {
         const std::string category = webMan.In("category", "");
         const std::string name = webMan.In("name", "");
         if (category != "personal" && category != "shared")
-            return FailWith(kStatusBadRequest, "category_invalid", kCategoryInvalidLine);
-        if (!playlist::IsValidPlaylistName(name))
-            return FailWith(kStatusBadRequest, "name_invalid", kNameInvalidLine);
-        Json::Value reply(Json::objectValue);
-        reply["success"] = true;
-        if (category == "personal") {
-            mkdir(webMan.GetPreferenceDir().c_str(), 0755);
-            const io::FileDescriptor dir = playlist::LockFolder(folder, true);
-            if (!dir)
-                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
-                                kSystemSection, kSystemText);
-            if (FindPlaylistFile(dir.Get(), name))
-                return FailWith(kStatusConflict, "name_taken", kNameTakenLine);
-            const playlist::WriteOutcome written =
-                playlist::WriteFileAt(dir.Get(), name + kPlaylistFileEnding, "#EXTM3U\n", true);
-            if (written == playlist::WriteOutcome::exists)
-                return FailWith(kStatusConflict, "name_taken", kNameTakenLine);
-            if (written != playlist::WriteOutcome::ok)
-                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
-                                kSystemSection, kSystemText);
-            reply["node"] = std::string(kPersonalPrefix) + name;
-        } else {
-            if (!mayChangeShared)
-                return FailWith(kStatusForbidden, "request_refused", kNotAllowedLine);
-            sqlite::Database db = OpenLibraryForWriting();
-            if (!db)
-                return FailWith(kStatusUnavailable, "library_unavailable", kLibraryUnavailableLine,
-                                kSystemSection, kSystemText);
-            WriteTransaction transaction(db);
-            if (transaction.Code() != SQLITE_OK)
-                return IsBusy(transaction.Code())
-                           ? FailWith(kStatusUnavailable, "library_busy", kLibraryBusyLine)
-                           : FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
-                                      kSystemSection, kSystemText);
-            if (SharedNameTaken(db, name, -1))
-                return FailWith(kStatusConflict, "name_taken", kNameTakenLine);
-            sqlite::Statement next = db.Prepare("SELECT coalesce(max(id), 0) + 1 FROM playlist");
-            if (!next || next.Step() != SQLITE_ROW)
-                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
-                                kSystemSection, kSystemText);
-            const std::int64_t id = next.ColumnInt64(0);
-            if (id > kMaxSharedId)
-                return FailWith(kStatusInsufficientStorage, "no_id_left", kNoIdLeftLine);
-            sqlite::Statement insert = db.Prepare("INSERT INTO playlist (id, name) VALUES (?, ?)");
-            if (!insert || insert.Bind(1, id) != SQLITE_OK ||
-                insert.Bind(2, std::string_view(name)) != SQLITE_OK ||
-                insert.Step() != SQLITE_DONE || !transaction.Commit())
-                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
-                                kSystemSection, kSystemText);
-            reply["node"] = std::string(kSharedPrefix) + std::to_string(id);
-        }
-        PrintResponse(std::move(reply), kJsonReplyType);
-        return 1;
-    }
-
-    // The other actions name an existing playlist by its tree node.
-    const std::string node = webMan.In("node", "");
-    const bool personal = StartsWith(node, kPersonalPrefix);
-    const bool shared = StartsWith(node, kSharedPrefix);
-    std::string name;
-    std::int64_t id = -1;
-    if (personal) {
-        // Any name the listing gives (a file's name less its ending) is found among the folder's
-        // files, never used as a path; the rules of a new name apply to new names only.
-        name = node.substr(kPersonalPrefix.size());
-        if (name.empty() || name.find('/') != std::string::npos)
-            return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
-                            kNotFoundText);
-    } else if (shared) {
-        const std::string digits = node.substr(kSharedPrefix.size());
-        if (!util::ParseDecimalDigits(digits, id) || id > kMaxSharedId)
-            return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
-                            kNotFoundText);
-        if (!mayChangeShared)
-            return FailWith(kStatusForbidden, "request_refused", kNotAllowedLine);
+            refused = kCategoryInvalid;
+        else if (!playlist::IsValidPlaylistName(name))
+            refused = kNameInvalid;
+        else if (category == "personal")
+            refused = CreatePersonal(webMan.GetPreferenceDir(), folder, name, reply);
+        else
+            refused = mayChangeShared ? CreateShared(name, reply) : MaybeRefusal(kNotAllowed);
     } else {
-        return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
-                        kNotFoundText);
+        Target target;
+        ChangeRequest request;
+        request.action = action;
+        refused = ParseTarget(webMan.In("node", ""), mayChangeShared, target);
+        if (!refused)
+            refused = ParseChange(webMan, request);
+        if (!refused)
+            refused = target.kind == Target::Kind::personal
+                          ? ChangePersonal(folder, target, request, reply)
+                          : ChangeShared(target, request, reply);
     }
-
-    // What is asked, checked before anything is opened.
-    EntryChange change;
-    std::vector<std::string_view> items;
-    std::string newName;
-    if (action == "pladd") {
-        change.kind = EntryChange::Kind::add;
-        if (!SplitList(webMan.In("streams", ""), playlist::kMaxPlaylistEntries, items))
-            return FailWith(kStatusBadRequest, "track_unknown", kTrackUnknownLine);
-        const std::string at = webMan.In("position", "");
-        std::size_t position = 0;
-        if (!at.empty()) {
-            if (!ParseIndex(at, position))
-                return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
-            change.at = position;
-        }
-    } else if (action == "plremove") {
-        change.kind = EntryChange::Kind::remove;
-        if (!SplitList(webMan.In("entries", ""), playlist::kMaxPlaylistEntries, items))
-            return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
-        for (std::string_view item : items) {
-            std::size_t entry = 0;
-            if (!ParseIndex(item, entry))
-                return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
-            change.remove.push_back(entry);
-        }
-    } else if (action == "plmove") {
-        change.kind = EntryChange::Kind::move;
-        if (!ParseIndex(webMan.In("from", ""), change.from) ||
-            !ParseIndex(webMan.In("to", ""), change.to))
-            return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
-    } else if (action == "plrename") {
-        newName = webMan.In("name", "");
-        if (!playlist::IsValidPlaylistName(newName))
-            return FailWith(kStatusBadRequest, "name_invalid", kNameInvalidLine);
-    }
-
-    Json::Value reply(Json::objectValue);
-    reply["success"] = true;
-    const bool changesEntries = action == "pladd" || action == "plremove" || action == "plmove";
-
-    if (personal) {
-        const io::FileDescriptor dir = playlist::LockFolder(folder, false);
-        if (!dir)
-            return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
-                            kNotFoundText);
-        const std::optional<std::string> file = FindPlaylistFile(dir.Get(), name);
-        if (!file)
-            return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
-                            kNotFoundText);
-        if (action == "pldelete") {
-            if (unlinkat(dir.Get(), file->c_str(), 0) != 0)
-                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
-                                kSystemSection, kSystemText);
-            fsync(dir.Get());
-        } else if (action == "plrename") {
-            if (newName != name) {
-                if (FindPlaylistFile(dir.Get(), newName))
-                    return FailWith(kStatusConflict, "name_taken", kNameTakenLine);
-                const std::string renamed = newName + file->substr(name.size());
-                if (renameat2(dir.Get(), file->c_str(), dir.Get(), renamed.c_str(),
-                              RENAME_NOREPLACE) != 0)
-                    return errno == EEXIST
-                               ? FailWith(kStatusConflict, "name_taken", kNameTakenLine)
-                               : FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
-                                          kSystemSection, kSystemText);
-                fsync(dir.Get());
-            }
-            reply["node"] = std::string(kPersonalPrefix) + newName;
-        } else if (changesEntries) {
-            playlist::PlaylistFileEntries entries =
-                playlist::ReadPlaylistFileAt(dir.Get(), file->c_str(), medialib::AudioSharePath());
-            if (entries.status == playlist::PlaylistFileStatus::tooLarge)
-                return FailWith(kStatusTooLarge, "too_large", kPlaylistFullLine);
-            if (entries.status != playlist::PlaylistFileStatus::ok)
-                return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
-                                kNotFoundText);
-            medialib::LibraryOpenResult library = medialib::OpenLibrary(paths::kLibraryDb);
-            if (library.status != medialib::LibraryStatus::ok)
-                return FailWith(kStatusUnavailable, "library_unavailable", kLibraryUnavailableLine,
-                                kSystemSection, kSystemText);
-            EntryLookup lookup(library.db);
-            if (!lookup)
-                return FailWith(kStatusUnavailable, "library_unavailable", kLibraryUnavailableLine,
-                                kSystemSection, kSystemText);
-            for (std::string_view stream : items) {
-                if (change.kind != EntryChange::Kind::add)
-                    break;
-                std::optional<LibraryEntry> entry = lookup.ByStream(stream);
-                if (!entry)
-                    return FailWith(kStatusBadRequest, "track_unknown", kTrackUnknownLine);
-                change.addPaths.push_back(std::move(entry->path));
-            }
-            const ChangeOutcome applied = Apply(change, entries.paths);
-            if (applied == ChangeOutcome::badPosition)
-                return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
-            if (applied == ChangeOutcome::full)
-                return FailWith(kStatusTooLarge, "too_large", kPlaylistFullLine);
-            if (playlist::WriteFileAt(dir.Get(), *file, PlaylistText(entries.paths, &lookup),
-                                      false) != playlist::WriteOutcome::ok)
-                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
-                                kSystemSection, kSystemText);
-            reply["node"] = node;
-            reply["entries"] = Json::UInt64(entries.paths.size());
-        }
-    } else {
-        sqlite::Database db = OpenLibraryForWriting();
-        if (!db)
-            return FailWith(kStatusUnavailable, "library_unavailable", kLibraryUnavailableLine,
-                            kSystemSection, kSystemText);
-        WriteTransaction transaction(db);
-        if (transaction.Code() != SQLITE_OK)
-            return IsBusy(transaction.Code())
-                       ? FailWith(kStatusUnavailable, "library_busy", kLibraryBusyLine)
-                       : FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
-                                  kSystemSection, kSystemText);
-        std::optional<std::vector<std::string>> paths = SharedPaths(db, id);
-        if (!paths)
-            return FailWith(kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
-                            kNotFoundText);
-        bool stored = true;
-        if (action == "pldelete") {
-            sqlite::Statement entries =
-                db.Prepare("DELETE FROM playlist_entry WHERE playlist_id = ?");
-            sqlite::Statement row = db.Prepare("DELETE FROM playlist WHERE id = ?");
-            stored = entries && row && entries.Bind(1, id) == SQLITE_OK &&
-                     entries.Step() == SQLITE_DONE && row.Bind(1, id) == SQLITE_OK &&
-                     row.Step() == SQLITE_DONE;
-        } else if (action == "plrename") {
-            if (SharedNameTaken(db, newName, id))
-                return FailWith(kStatusConflict, "name_taken", kNameTakenLine);
-            sqlite::Statement update = db.Prepare("UPDATE playlist SET name = ? WHERE id = ?");
-            stored = update && update.Bind(1, std::string_view(newName)) == SQLITE_OK &&
-                     update.Bind(2, id) == SQLITE_OK && update.Step() == SQLITE_DONE;
-            reply["node"] = node;
-        } else if (changesEntries) {
-            if (paths->size() > playlist::kMaxPlaylistEntries)
-                return FailWith(kStatusTooLarge, "too_large", kPlaylistFullLine);
-            EntryLookup lookup(db);
-            if (!lookup)
-                return FailWith(kStatusServerError, "write_failed", kWriteFailedLine,
-                                kSystemSection, kSystemText);
-            for (std::string_view stream : items) {
-                if (change.kind != EntryChange::Kind::add)
-                    break;
-                std::optional<LibraryEntry> entry = lookup.ByStream(stream);
-                if (!entry)
-                    return FailWith(kStatusBadRequest, "track_unknown", kTrackUnknownLine);
-                change.addPaths.push_back(std::move(entry->path));
-            }
-            const ChangeOutcome applied = Apply(change, *paths);
-            if (applied == ChangeOutcome::badPosition)
-                return FailWith(kStatusBadRequest, "position_invalid", kPositionInvalidLine);
-            if (applied == ChangeOutcome::full)
-                return FailWith(kStatusTooLarge, "too_large", kPlaylistFullLine);
-            stored = StoreSharedPaths(db, id, *paths);
-            reply["node"] = node;
-            reply["entries"] = Json::UInt64(paths->size());
-        }
-        if (!stored || !transaction.Commit())
-            return FailWith(kStatusServerError, "write_failed", kWriteFailedLine, kSystemSection,
-                            kSystemText);
-    }
+    if (refused)
+        return refuse(*refused);
     PrintResponse(std::move(reply), kJsonReplyType);
     return 1;
 }

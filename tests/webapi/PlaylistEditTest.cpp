@@ -363,6 +363,44 @@ TEST_F(PlaylistEdit, SharedPlaylistIsMadeAndChangedInLibraryDb) {
               (Strings{"0"}));
 }
 
+TEST_F(PlaylistEdit, AChangeByEntryNumberThatAnotherTabOvertookIsRefusedAndChangesNothing) {
+    MakeGeneratedLibrary(6);
+    for (const char* category : {"personal", "shared"}) {
+        SCOPED_TRACE(category);
+        const CgiResult made =
+            Change({{"action", "plcreate"}, {"category", category}, {"name", "Shared View"}});
+        ASSERT_TRUE(made.jsonOk) << made.output;
+        const std::string node = made.json["node"].asString();
+        Change({{"action", "pladd"}, {"node", node}, {"streams", "1.mp3,2.mp3,3.mp3"}});
+        // The page listed 1, 2, 3; another tab then removed entry 0, so entry 1 now holds 3.
+        Change({{"action", "plremove"}, {"node", node}, {"entries", "0"}, {"expect", "1.mp3"}});
+        ASSERT_EQ(ListStreams(node), (Strings{"2.mp3", "3.mp3"}));
+        ExpectRefused(
+            Change({{"action", "plremove"}, {"node", node}, {"entries", "1"}, {"expect", "2.mp3"}}),
+            "409", "playlist_changed");
+        ExpectRefused(Change({{"action", "plmove"},
+                              {"node", node},
+                              {"from", "1"},
+                              {"to", "0"},
+                              {"expect", "2.mp3"}}),
+                      "409", "playlist_changed");
+        EXPECT_EQ(ListStreams(node), (Strings{"2.mp3", "3.mp3"}));
+        // As the page sees it now, the same changes pass.
+        Change({{"action", "plmove"},
+                {"node", node},
+                {"from", "1"},
+                {"to", "0"},
+                {"expect", "3.mp3"}});
+        EXPECT_EQ(ListStreams(node), (Strings{"3.mp3", "2.mp3"}));
+        // One expected track for each entry named, or the request is malformed.
+        ExpectRefused(
+            Change(
+                {{"action", "plremove"}, {"node", node}, {"entries", "0,1"}, {"expect", "3.mp3"}}),
+            "400", "position_invalid");
+        EXPECT_EQ(ListStreams(node), (Strings{"3.mp3", "2.mp3"}));
+    }
+}
+
 TEST_F(PlaylistEdit, SharedPlaylistChangeWaitsForAWriterInsteadOfFailing) {
     MakeGeneratedLibrary(3, {{1, "Mix"}});
     DatabaseWriterLock indexer(kLibraryDb, 800);

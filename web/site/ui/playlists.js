@@ -297,9 +297,9 @@ export function createPlaylists({ labels, onStatus, onFailure, refreshCategory, 
     };
     if (editable && Number.isInteger(track.entry)) {
       const count = state.list ? state.list.tracks.length : 0;
-      if (index > 0) tools.append(small("pl-up", "\u2191", labels.plUp, () => move(node, track.entry, state.list.tracks[index - 1].entry)));
-      if (index < count - 1) tools.append(small("pl-down", "\u2193", labels.plDown, () => move(node, track.entry, state.list.tracks[index + 1].entry)));
-      tools.append(small("pl-remove", "\u2715", labels.plRemove, () => removeEntry(node, track.entry)));
+      if (index > 0) tools.append(small("pl-up", "\u2191", labels.plUp, () => move(node, track, state.list.tracks[index - 1].entry)));
+      if (index < count - 1) tools.append(small("pl-down", "\u2193", labels.plDown, () => move(node, track, state.list.tracks[index + 1].entry)));
+      tools.append(small("pl-remove", "\u2715", labels.plRemove, () => removeEntry(node, track)));
     }
     if (state.target && state.target !== node && typeof track.stream === "string")
       tools.append(small("pl-add", "+", labels.plAddOne, () => add([track])));
@@ -328,12 +328,26 @@ export function createPlaylists({ labels, onStatus, onFailure, refreshCategory, 
     await change({ action: "pladd", node: target, streams: streams.join(",") }, format(labels.plAdded, { count: streams.length, name }));
   }
 
-  async function move(node, from, to) {
-    if (await change({ action: "plmove", node, from, to }, labels.plMoved)) reshow(node, state.title);
+  // Entry numbers name the rows as this page listed them; `expect` (the track seen there) makes the
+  // server refuse the change when another tab or user changed the playlist since. Either way the
+  // playlist is shown again as it is.
+  async function changeEntries(params, done, node) {
+    const result = await post(params);
+    if (result.ok) {
+      onStatus(done);
+      reshow(node, state.title);
+      return;
+    }
+    if (result.error === "playlist_changed") await reshow(node, state.title);
+    onFailure(errorText(result));
   }
 
-  async function removeEntry(node, entry) {
-    if (await change({ action: "plremove", node, entries: String(entry) }, labels.plRemoved)) reshow(node, state.title);
+  async function move(node, track, to) {
+    await changeEntries({ action: "plmove", node, from: track.entry, to, expect: track.stream }, labels.plMoved, node);
+  }
+
+  async function removeEntry(node, track) {
+    await changeEntries({ action: "plremove", node, entries: String(track.entry), expect: track.stream }, labels.plRemoved, node);
   }
 
   function rename(node, title) {

@@ -193,3 +193,31 @@ test("New Playlist makes a smart playlist, and a shared playlist in library.db",
   assert.equal(sql(`SELECT group_concat(position) FROM playlist_entry WHERE playlist_id = ${id} ORDER BY position`), "0,1,2,3,4");
   assert.deepEqual(page.problems, []);
 });
+
+test("a row removed in a tab that another tab overtook changes nothing and shows the playlist as it is", async () => {
+  const paths = sql("SELECT path FROM track WHERE path NOT LIKE '%Bench%' ORDER BY id LIMIT 3").split("\n");
+  assert.equal(paths.length, 3);
+  // Written as the web server's user would have written it: owned like the preference folder.
+  execFileSync("sh", ["-c", 'mkdir -p "$1" && f="$1/Two Tabs.m3u8" && shift && printf "%s\\n" "$@" >"$f" && ' +
+    'chown -R --reference=/usr/vanu/etc/preference "$(dirname "$(dirname "$f")")"', "sh", playlists("demo"), "#EXTM3U", ...paths]);
+  const node = "musiclib_music_personal/playlist/Two Tabs";
+  const [first, second] = [await openTree(browser, "demo"), await openTree(browser, "demo")];
+  for (const page of [first, second]) {
+    await open(page, "musiclib_music_personal");
+    await selectNode(page, item(page, node));
+  }
+  const listed = await streams(first);
+  assert.equal(listed.length, 3);
+  // The second tab removes the first row; the first tab, not knowing, removes its second row.
+  await second.locator("#tracks .track").first().locator(".pl-remove").click();
+  await second.waitForFunction(() => document.querySelectorAll("#tracks .track").length === 2, null, { timeout: 10000 });
+  await first.locator("#tracks .track").nth(1).locator(".pl-remove").click();
+  await first.waitForFunction((words) => document.getElementById("status").classList.contains("error") &&
+    document.getElementById("status").textContent === words, PLAYLIST_WORDS.enu.err_playlist_changed, { timeout: 10000 });
+  // Nothing more was removed, and the first tab shows the playlist as it now is.
+  assert.deepEqual(await streams(first), listed.slice(1));
+  const file = readFileSync(`${playlists("demo")}/Two Tabs.m3u8`, "utf8");
+  assert.deepEqual(file.split("\n").filter((l) => l.startsWith("/")), paths.slice(1));
+  assert.deepEqual(first.problems.filter((p) => !/409/.test(p)), []);
+  assert.deepEqual(second.problems, []);
+});
