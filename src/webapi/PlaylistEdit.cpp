@@ -62,33 +62,37 @@ inline constexpr std::string_view kSharedPrefix = "musiclib_music_shared/playlis
 inline constexpr std::int64_t kMaxSharedId = 4294967295LL;
 inline constexpr const char* kPlaylistFileEnding = ".m3u8";
 
-// An error reply of a change, as LibraryApi::FailWith writes it; without a section and key the
-// code itself stands in the errinfo.
-struct Refusal {
-    const char* status;
-    const char* error;
-    int line;
-    const char* section = nullptr;
-    const char* key = nullptr;
-};
-using MaybeRefusal = std::optional<Refusal>;
+// The error replies of a change. Where no UI text fits, the code itself stands in the errinfo
+// (section "playlist").
+using MaybeRefusal = std::optional<ApiError>;
+constexpr const char* kPlaylistSection = "playlist";
 
-constexpr Refusal kWriteFailed{kStatusServerError, "write_failed", kWriteFailedLine, kSystemSection,
-                               kSystemText};
-constexpr Refusal kPlaylistGone{kStatusNotFound, "node_gone", kNoSuchPlaylistLine, kNotFoundSection,
-                                kNotFoundText};
-constexpr Refusal kLibraryUnavailable{kStatusUnavailable, "library_unavailable",
-                                      kLibraryUnavailableLine, kSystemSection, kSystemText};
-constexpr Refusal kLibraryBusy{kStatusUnavailable, "library_busy", kLibraryBusyLine};
-constexpr Refusal kNameInvalid{kStatusBadRequest, "name_invalid", kNameInvalidLine};
-constexpr Refusal kNameTaken{kStatusConflict, "name_taken", kNameTakenLine};
-constexpr Refusal kNotAllowed{kStatusForbidden, "request_refused", kNotAllowedLine};
-constexpr Refusal kPositionInvalid{kStatusBadRequest, "position_invalid", kPositionInvalidLine};
-constexpr Refusal kTrackUnknown{kStatusBadRequest, "track_unknown", kTrackUnknownLine};
-constexpr Refusal kPlaylistFull{kStatusTooLarge, "too_large", kPlaylistFullLine};
-constexpr Refusal kCategoryInvalid{kStatusBadRequest, "category_invalid", kCategoryInvalidLine};
-constexpr Refusal kNoIdLeft{kStatusInsufficientStorage, "no_id_left", kNoIdLeftLine};
-constexpr Refusal kPlaylistChanged{kStatusConflict, "playlist_changed", kPlaylistChangedLine};
+constexpr ApiError kWriteFailed{kStatusServerError, kSystemSection, kSystemText, kWriteFailedLine,
+                                "write_failed"};
+constexpr ApiError kPlaylistGone{kStatusNotFound, kNotFoundSection, kNotFoundText,
+                                 kNoSuchPlaylistLine, "node_gone"};
+constexpr ApiError kLibraryUnavailable{kStatusUnavailable, kSystemSection, kSystemText,
+                                       kLibraryUnavailableLine, "library_unavailable"};
+constexpr ApiError kLibraryBusy{kStatusUnavailable, kPlaylistSection, "library_busy",
+                                kLibraryBusyLine, "library_busy"};
+constexpr ApiError kNameInvalid{kStatusBadRequest, kPlaylistSection, "name_invalid",
+                                kNameInvalidLine, "name_invalid"};
+constexpr ApiError kNameTaken{kStatusConflict, kPlaylistSection, "name_taken", kNameTakenLine,
+                              "name_taken"};
+constexpr ApiError kNotAllowed{kStatusForbidden, kPlaylistSection, "request_refused",
+                               kNotAllowedLine, "request_refused"};
+constexpr ApiError kPositionInvalid{kStatusBadRequest, kPlaylistSection, "position_invalid",
+                                    kPositionInvalidLine, "position_invalid"};
+constexpr ApiError kTrackUnknown{kStatusBadRequest, kPlaylistSection, "track_unknown",
+                                 kTrackUnknownLine, "track_unknown"};
+constexpr ApiError kPlaylistFull{kStatusTooLarge, kPlaylistSection, "too_large", kPlaylistFullLine,
+                                 "too_large"};
+constexpr ApiError kCategoryInvalid{kStatusBadRequest, kPlaylistSection, "category_invalid",
+                                    kCategoryInvalidLine, "category_invalid"};
+constexpr ApiError kNoIdLeft{kStatusInsufficientStorage, kPlaylistSection, "no_id_left",
+                             kNoIdLeftLine, "no_id_left"};
+constexpr ApiError kPlaylistChanged{kStatusConflict, kPlaylistSection, "playlist_changed",
+                                    kPlaylistChangedLine, "playlist_changed"};
 
 bool StartsWith(std::string_view text, std::string_view prefix) {
     return text.compare(0, prefix.size(), prefix) == 0;
@@ -658,7 +662,7 @@ int LibraryApi::FailWith(const char* status, const char* error, int line, const 
                          const char* key, const std::string& detail) {
     // Without a UI text the code itself stands in the errinfo (section "playlist").
     Json::Value reply = ErrorReply(*this, webMan,
-                                   {status, section != nullptr ? section : "playlist",
+                                   {status, section != nullptr ? section : kPlaylistSection,
                                     key != nullptr ? key : error, line, error});
     if (!detail.empty())
         reply["rule"] = detail;
@@ -681,9 +685,6 @@ int LibraryApi::AdmitChange() {
 int LibraryApi::EditPlaylist(const std::string& action) {
     if (AdmitChange() == 0)
         return 0;
-    const auto refuse = [this](const Refusal& refusal) {
-        return FailWith(refusal.status, refusal.error, refusal.line, refusal.section, refusal.key);
-    };
     const bool mayChangeShared = (permission_ & cgi::kPermissionNewSharedPlaylist) != 0;
     const std::string folder = webMan.GetPreferenceDir() + paths::kPlaylistsFolder;
     Json::Value reply(Json::objectValue);
@@ -714,7 +715,7 @@ int LibraryApi::EditPlaylist(const std::string& action) {
                           : ChangeShared(target, request, reply);
     }
     if (refused)
-        return refuse(*refused);
+        return AnswerError(*this, webMan, *refused);
     PrintResponse(std::move(reply), kJsonReplyType);
     return 1;
 }
