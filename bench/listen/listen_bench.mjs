@@ -5,6 +5,7 @@
 // server's on the network with one of its tracks fetched through library.cgi.
 import { launch, close, openTree, item } from "../../web/tests/browser/harness.js";
 import { measurePlaylists } from "./playlists_bench.mjs";
+import { measureCovers } from "./covers_bench.mjs";
 import { writeFileSync, chownSync, statSync, mkdirSync } from "node:fs";
 
 const rounds = Number(process.env.BENCH_ROUNDS ?? 15);
@@ -133,6 +134,7 @@ line("library.cgi list", api);
 for (const [service, values] of Object.entries(probes)) line(`library.cgi probe ${service}`, values);
 line("page: click to first rows on screen", clicks);
 for (const text of await measurePlaylists({ base, auth, rounds, folderNode: node, listMedian: median(api) })) console.log(text);
+for (const text of await measureCovers({ base, auth, rounds, folderNode: node, listMedian: median(api) })) console.log(text);
 line("library.cgi list of 499 radio stations", radioList);
 line("library.cgi radio_add (500th station)", radioAdd);
 line("library.cgi radio_remove", radioRemove);

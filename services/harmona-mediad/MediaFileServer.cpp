@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <optional>
@@ -80,6 +81,44 @@ void SetImageHeaders(SoupMessageHeaders* headers, const ServedFile& file) {
     soup_message_headers_replace(headers, "Content-Type", file.mimeType.c_str());
     soup_message_headers_replace(headers, "Accept-Ranges", "bytes");
     soup_message_headers_replace(headers, "transferMode.dlna.org", "Interactive");
+}
+
+// A cover image's validators: an entity tag of the file's identity, size and time, and the time as
+// Last-Modified, so that a browser that keeps the image asks again only whether it changed.
+std::string ImageEntityTag(const struct stat& st) {
+    char tag[96];
+    std::snprintf(tag, sizeof tag, "\"%llx-%llx-%llx\"", static_cast<unsigned long long>(st.st_ino),
+                  static_cast<unsigned long long>(st.st_size),
+                  static_cast<unsigned long long>(st.st_mtime));
+    return tag;
+}
+
+std::string HttpDate(time_t when) {
+    GDateTime* time = g_date_time_new_from_unix_utc(static_cast<gint64>(when));
+    if (time == nullptr)
+        return {};
+    char* text = soup_date_time_to_string(time, SOUP_DATE_HTTP);
+    g_date_time_unref(time);
+    std::string date = text != nullptr ? text : "";
+    g_free(text);
+    return date;
+}
+
+// Whether the request's validators say that the client holds this version of the image already:
+// If-None-Match names its entity tag, or (without If-None-Match) If-Modified-Since is not older
+// than the file.
+bool ClientHoldsImage(SoupMessageHeaders* request, const std::string& tag, time_t modified) {
+    if (const char* match = soup_message_headers_get_one(request, "If-None-Match"))
+        return std::strstr(match, tag.c_str()) != nullptr || std::strcmp(match, "*") == 0;
+    const char* since = soup_message_headers_get_one(request, "If-Modified-Since");
+    if (since == nullptr)
+        return false;
+    GDateTime* time = soup_date_time_new_from_http_string(since);
+    if (time == nullptr)
+        return false;
+    const bool held = g_date_time_to_unix(time) >= static_cast<gint64>(modified);
+    g_date_time_unref(time);
+    return held;
 }
 
 // A stream name (platform/medialib/StreamName.h) -> the id and the extension; false for anything
@@ -201,10 +240,20 @@ void MediaFileServer::Serve(SoupServerMessage* message, const std::string& path)
     SoupMessageHeaders* response = soup_server_message_get_response_headers(message);
     const ByteRange range =
         ParseByteRange(soup_message_headers_get_one(request, "Range"), st.st_size);
-    if (file.image)
+    if (file.image) {
         SetImageHeaders(response, file);
-    else
+        const std::string tag = ImageEntityTag(st);
+        soup_message_headers_replace(response, "ETag", tag.c_str());
+        const std::string modified = HttpDate(st.st_mtime);
+        if (!modified.empty())
+            soup_message_headers_replace(response, "Last-Modified", modified.c_str());
+        if (ClientHoldsImage(request, tag, st.st_mtime)) {
+            soup_server_message_set_status(message, SOUP_STATUS_NOT_MODIFIED, nullptr);
+            return;
+        }
+    } else {
         SetAudioHeaders(response, file);
+    }
     if (range.kind == ByteRange::Kind::unsatisfiable) {
         const std::string contentRange = "bytes */" + std::to_string(st.st_size);
         soup_message_headers_replace(response, "Content-Range", contentRange.c_str());

@@ -18,6 +18,7 @@
 #include "platform/texts/LocalizedStringParser.h"
 #include "src/daemonclient/MediaServerList.h"
 #include "src/webapi/ApiError.h"
+#include "src/webapi/CoverArt.h"
 #include "src/webapi/Failure.h"
 #include "src/webapi/PlaylistEdit.h"
 #include "src/webapi/RadioApi.h"
@@ -93,6 +94,8 @@ int LibraryApi::Process() {
         return ServeRadioAction(*this, webMan, action);
     if (action == kRemoteStreamAction)
         return ServeRemoteStream(*this, webMan, permission_);
+    if (IsCoverArtAction(action))
+        return ServeCoverArtAction(*this, webMan, action);
     return Fail(Failure::requestInvalid, kNotFoundSection, kNotFoundText, kUnknownActionLine);
 }
 

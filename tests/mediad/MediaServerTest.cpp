@@ -257,6 +257,56 @@ TEST_F(LocalMediaServer, CoverArtNamedInTheListingIsServed) {
     EXPECT_EQ(HttpGet("http://127.0.0.1:50003/media/art/999999.jpg").status, 404);
 }
 
+// A cover image carries an entity tag and its time: a browser that keeps it asks again with them
+// and gets 304 without the image while the file is unchanged, the image again once it changed.
+TEST_F(LocalMediaServer, CoverArtCarriesValidatorsAndAnUnchangedOneIsNotSentAgain) {
+    const std::string cover = std::string(kShare) + "/Jazz/Blue/cover.png";
+    WriteFile(cover, std::string("\x89PNG\r\n\x1a\n") + "a cover image");
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    std::string path;
+    for (int attempt = 0; attempt < 50 && path.empty(); ++attempt) {
+        const BrowseReply all = SoapBrowse("music_all");
+        const std::size_t at = all.raw.find("/media/art/");
+        if (at != std::string::npos)
+            path = all.raw.substr(at, all.raw.find("&lt;", at) - at);
+        else
+            std::this_thread::sleep_for(std::chrono::milliseconds(100));
+    }
+    ASSERT_EQ(path.size() > 4 ? path.substr(path.size() - 4) : "", ".png") << path;
+    const HttpReply first = HttpGet("http://127.0.0.1:50003" + path);
+    ASSERT_EQ(first.status, 200);
+    const auto header = [](const std::string& headers, const std::string& name) {
+        const std::size_t at = headers.find("\r\n" + name + ": ");
+        if (at == std::string::npos)
+            return std::string();
+        const std::size_t start = at + name.size() + 4;
+        return headers.substr(start, headers.find("\r\n", start) - start);
+    };
+    const std::string tag = header(first.headers, "ETag");
+    const std::string modified = header(first.headers, "Last-Modified");
+    ASSERT_FALSE(tag.empty()) << first.headers;
+    EXPECT_EQ(tag.front(), '"');
+    EXPECT_FALSE(modified.empty()) << first.headers;
+    const auto ask = [&](const std::string& condition) {
+        return RawHttpExchange("127.0.0.1", 50003,
+                               "GET " + path + " HTTP/1.1\r\nHost: 127.0.0.1\r\n" + condition +
+                                   "\r\nConnection: close\r\n\r\n");
+    };
+    const std::string byTag = ask("If-None-Match: " + tag);
+    EXPECT_EQ(byTag.rfind("HTTP/1.1 304", 0), 0u) << byTag;
+    EXPECT_EQ(byTag.find("a cover image"), std::string::npos);
+    const std::string byTime = ask("If-Modified-Since: " + modified);
+    EXPECT_EQ(byTime.rfind("HTTP/1.1 304", 0), 0u) << byTime;
+    const std::string otherTag = ask("If-None-Match: \"another\"");
+    EXPECT_EQ(otherTag.rfind("HTTP/1.1 200", 0), 0u) << otherTag;
+    EXPECT_NE(otherTag.find("a cover image"), std::string::npos);
+    // The audio is not made conditional: a track's reply is the same as before.
+    const BrowseReply all = SoapBrowse("music_all");
+    const DidlEntry* fourth = FindTitle(all, "Fourth");
+    ASSERT_NE(fourth, nullptr);
+    EXPECT_EQ(header(HttpGet(fourth->res).headers, "ETag"), "");
+}
+
 TEST_F(LocalMediaServer, TheProjectsBrowseLibraryListsEveryCategory) {
     for (const char* category : kCategories) {
         SCOPED_TRACE(category);

@@ -6,6 +6,8 @@ import { createListener, isListable } from "./listen.js";
 import { failureCode, readApiReply, splitTracks, isBrowsedLibraryNode } from "./failures.js";
 import { createPlaylists } from "./playlists.js";
 import { createRadio, listedRadioNode } from "./radio.js";
+import { createCovers } from "./covers.js";
+import { createNav } from "./nav.js";
 
 const CGI = "webapi/audiotree.cgi";
 const API = "webapi/library.cgi";
@@ -28,6 +30,8 @@ const page = {
   errorOf: 0,     // the action whose failure the status line shows (0: none)
   playlists: null, // the playlist editor (playlists.js)
   radio: null,    // the internet radio pane (radio.js)
+  covers: null,   // cover art (covers.js)
+  nav: null,      // breadcrumb, history and the kept tree (nav.js)
 };
 // A user action starts: its number, by which its outcome is ordered among the others. What one
 // gesture starts (a click lists a node and opens it) is one action: its parts share the number
@@ -250,7 +254,8 @@ function toggle(li) {
 }
 
 // `keyboard`: moved to by the arrow keys, so the pane lists it only once the keys rest.
-function select(li, { keyboard = false } = {}) {
+// `record`: a view of its own in the browser's history (false when the history moves to it).
+function select(li, { keyboard = false, record = true } = {}) {
   for (const old of document.querySelectorAll('li[aria-selected="true"]')) old.setAttribute("aria-selected", "false");
   li.setAttribute("aria-selected", "true");
   const row = li.querySelector(":scope > .row");
@@ -259,8 +264,8 @@ function select(li, { keyboard = false } = {}) {
   $("hint").hidden = true;
   $("selected").hidden = false;
   $("selected-text").textContent = decodeEntities(node.text);
-  $("selected-id").textContent = typeof node.id === "string" ? node.id : "";
   $("selected-icon").src = safeIcon(node.icon) ?? BLANK;
+  if (record) page.nav?.treeSelected(li, { keyboard });
   if (page.listener) {
     page.radio?.select(node.id, decodeEntities(node.text));
     const listed = listedRadioNode(node.id);
@@ -417,7 +422,13 @@ async function start() {
       return rendered.length > 0 ? rendered.map((c) => nodeData.get(c)) : nodesOf(nodeData.get(li)?.children);
     },
   });
+  page.covers = createCovers({ labels: page.labels });
   page.listener = createListener({
+    extendList: (...args) => page.covers.extendList(...args),
+    decorateContainers: (...args) => page.covers.decorateContainers(...args),
+    decorateCover: (...args) => page.covers.decorateRow(...args),
+    onPlay: (track) => page.covers.playing(track),
+    openContainer: (...args) => page.nav.open(...args),
     decorateRow: (...args) => page.playlists.decorateRow(...args),
     onListed: (...args) => page.playlists.listed(...args),
     labels: page.labels,
@@ -438,6 +449,13 @@ async function start() {
     drawRandom: () => draw(true),
   });
   page.radio = createRadio({ labels: page.labels, listener: page.listener, showStatus, showFailure });
+  page.nav = createNav({
+    labels: page.labels,
+    listener: page.listener,
+    findItem: (id) => [...document.querySelectorAll("#tree li[role=treeitem]")].find((li) => li.dataset.id === id) ?? null,
+    selectItem: (li, options) => select(li, options),
+    expandItem: (li) => expand(li),
+  });
 
   const tree = $("tree");
   tree.addEventListener("click", (event) => {
@@ -459,6 +477,7 @@ async function start() {
   else showFailure(reply);
   $("rerandom").disabled = false;
   document.body.dataset.ready = "true";
+  page.nav.start();
   setInterval(keepAlive, KEEPALIVE_MS);
 }
 

@@ -27,7 +27,12 @@ const $ = (id) => document.getElementById(id);
 
 // `decorateRow(row, track, index, node)` and `onListed(node, title, list)`: the playlist editor's
 // hooks (playlists.js), called for each drawn row and after each listing.
-export function createListener({ labels, onFailure, onStatus, onSuccess = () => {}, begin = () => 0, drawRandom = async () => false, decorateRow = () => {}, onListed = () => {} }) {
+// The cover art's hooks (covers.js): `extendList(node, reply, signal)` adds to a list before it is
+// drawn, `decorateContainers(list, albums)` after its containers are drawn, `decorateCover(row,
+// track)` for each drawn row, `onPlay(track)` when a track starts. `openContainer(node, title,
+// object)`: what a click on a container of the list does (navigation, nav.js); lists it by default.
+export function createListener({ labels, onFailure, onStatus, onSuccess = () => {}, begin = () => 0, drawRandom = async () => false, decorateRow = () => {}, onListed = () => {},
+  extendList = async (node, reply) => reply, decorateContainers = () => {}, decorateCover = () => {}, onPlay = () => {}, openContainer = null }) {
   const state = {
     list: { node: "", containers: [], tracks: [] }, // what the pane shows
     queue: [],          // the tracks being played, in order
@@ -103,6 +108,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
     // The user's Random 100 before the first draw: drawn now, as "New Random 100" does.
     if (request === state.request && reply.kind === "list" && reply.body.drawn === false && (await drawRandom()))
       if (request === state.request) reply = await fetchList(node, object, controller.signal);
+    if (request === state.request && reply.kind === "list") reply = await extendList(node, reply, controller.signal);
     if (request !== state.request || reply.kind === "aborted") return;
     state.abort = null;
     listing.removeAttribute("aria-busy");
@@ -118,7 +124,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
     const tracks = Array.isArray(reply.body.tracks) ? reply.body.tracks : [];
     const containers = Array.isArray(reply.body.containers) ? reply.body.containers : [];
     showState("", false);
-    setList({ node, containers, tracks });
+    setList({ node, containers, tracks, albums: reply.body.albums });
     onListed(node, title, state.list);
     listing.dataset.state = "loaded";
     listing.dataset.node = node;
@@ -149,12 +155,13 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
         button.dataset.node = String(c.node ?? "");
         const object = typeof c.object === "string" ? c.object : undefined;
         if (object !== undefined) button.dataset.object = object;
-        button.addEventListener("click", () => show(String(c.node), String(c.title ?? ""), object));
+        button.addEventListener("click", () => (openContainer ?? show)(String(c.node), String(c.title ?? ""), object));
         li.append(button);
         return li;
       }),
     );
     containers.hidden = list.containers.length === 0;
+    decorateContainers(list, list.albums);
     $("list-count").textContent = labels.trackCount.replace("{count}", String(list.tracks.length));
     state.cursor = -1;
     $("play-all").disabled = list.tracks.length === 0;
@@ -202,6 +209,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
       row.append(cell);
     }
     row.title = String(track.title ?? "");
+    decorateCover(row, track);
     decorateRow(row, track, index, state.list.node);
     return row;
   }
@@ -224,6 +232,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
     $("now-playing").textContent = [track.title, track.artist].filter(Boolean).join(" — ");
     $("player").dataset.stream = String(track.stream ?? track.url);
     $("player").dataset.index = String(index);
+    onPlay(track);
     drawRows();
   }
 
