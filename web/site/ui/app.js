@@ -6,6 +6,9 @@ import { createListener, isListable } from "./listen.js";
 import { failureCode, readApiReply, splitTracks, isBrowsedLibraryNode } from "./failures.js";
 import { createPlaylists } from "./playlists.js";
 import { createRadio, listedRadioNode } from "./radio.js";
+import { createQueue } from "./queue.js";
+import { createSession } from "./session.js";
+import { createDrawer } from "./phone.js";
 
 const CGI = "webapi/audiotree.cgi";
 const API = "webapi/library.cgi";
@@ -417,7 +420,12 @@ async function start() {
       return rendered.length > 0 ? rendered.map((c) => nodeData.get(c)) : nodesOf(nodeData.get(li)?.children);
     },
   });
+  // The play queue that the player plays, the system's media controls, the phone's tree drawer.
+  page.queue = createQueue({ labels: page.labels, onStatus: showStatus });
+  createDrawer({ labels: page.labels, chosen: (id) => isListable(listedRadioNode(id)) });
   page.listener = createListener({
+    queue: page.queue,
+    onPlayerLoad: (item) => page.session?.loaded(item),
     decorateRow: (...args) => page.playlists.decorateRow(...args),
     onListed: (...args) => page.playlists.listed(...args),
     labels: page.labels,
@@ -437,6 +445,8 @@ async function start() {
     onStatus: showStatus,
     drawRandom: () => draw(true),
   });
+  page.session = createSession({ audio: $("audio"), queue: page.queue });
+  page.queue.restore();
   page.radio = createRadio({ labels: page.labels, listener: page.listener, showStatus, showFailure });
 
   const tree = $("tree");
