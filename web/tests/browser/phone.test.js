@@ -182,12 +182,6 @@ test("the Media Session names the playing track and plays, pauses, skips and see
   await page.evaluate(() => window.mediaHandlers.pause({ action: "pause" }));
   await page.waitForSelector("#player[data-state=paused]");
   assert.equal((await metadata()).state, "paused");
-  await page.evaluate(() => window.mediaHandlers.seekto({ action: "seekto", seekTime: 0.5 }));
-  await page.waitForFunction(() => Math.abs(document.getElementById("audio").currentTime - 0.5) < 0.05);
-  await page.evaluate(() => window.mediaHandlers.seekbackward({ action: "seekbackward" }));
-  await page.waitForFunction(() => document.getElementById("audio").currentTime === 0);
-  await page.evaluate(() => window.mediaHandlers.seekforward({ action: "seekforward", seekOffset: 0.25 }));
-  await page.waitForFunction(() => Math.abs(document.getElementById("audio").currentTime - 0.25) < 0.05);
   await page.evaluate(() => window.mediaHandlers.play({ action: "play" }));
   await page.waitForSelector("#player[data-state=playing]");
 
@@ -197,5 +191,14 @@ test("the Media Session names the playing track and plays, pauses, skips and see
   await page.evaluate(() => window.mediaHandlers.previoustrack({ action: "previoustrack" }));
   await page.waitForFunction((s) => document.getElementById("player").dataset.stream === s, rows[1].stream);
   assert.equal((await metadata()).title, rows[1].title);
+  // Seeking, paused: the position the control names, or 10 s back (clamped at the start).
+  await page.evaluate(() => window.mediaHandlers.pause({ action: "pause" }));
+  await page.waitForSelector("#player[data-state=paused]");
+  await page.evaluate(() => window.mediaHandlers.seekto({ action: "seekto", seekTime: 0.5 }));
+  await page.waitForFunction(() => Math.abs(document.getElementById("audio").currentTime - 0.5) < 0.05);
+  await page.evaluate(() => window.mediaHandlers.seekbackward({ action: "seekbackward" }));
+  await page.waitForFunction(() => document.getElementById("audio").currentTime === 0);
+  await page.evaluate(() => window.mediaHandlers.seekforward({ action: "seekforward", seekOffset: 0.25 }));
+  await page.waitForFunction(() => Math.abs(document.getElementById("audio").currentTime - 0.25) < 0.05);
   assert.deepEqual(page.problems, []);
 });
