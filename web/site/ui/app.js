@@ -8,6 +8,9 @@ import { createPlaylists } from "./playlists.js";
 import { createRadio, listedRadioNode } from "./radio.js";
 import { createCovers } from "./covers.js";
 import { createNav } from "./nav.js";
+import { createQueue } from "./queue.js";
+import { createSession } from "./session.js";
+import { createDrawer } from "./phone.js";
 
 const CGI = "webapi/audiotree.cgi";
 const API = "webapi/library.cgi";
@@ -423,12 +426,17 @@ async function start() {
     },
   });
   page.covers = createCovers({ labels: page.labels });
+  // The play queue that the player plays, the system's media controls, the phone's tree drawer.
+  page.queue = createQueue({ labels: page.labels, onStatus: showStatus });
+  createDrawer({ labels: page.labels, chosen: (id) => isListable(listedRadioNode(id)) });
   page.listener = createListener({
     extendList: (...args) => page.covers.extendList(...args),
     decorateContainers: (...args) => page.covers.decorateContainers(...args),
     decorateCover: (...args) => page.covers.decorateRow(...args),
     onPlay: (track) => page.covers.playing(track),
     openContainer: (...args) => page.nav.open(...args),
+    queue: page.queue,
+    onPlayerLoad: (item) => page.session?.loaded(item),
     decorateRow: (...args) => page.playlists.decorateRow(...args),
     onListed: (...args) => page.playlists.listed(...args),
     labels: page.labels,
@@ -448,6 +456,8 @@ async function start() {
     onStatus: showStatus,
     drawRandom: () => draw(true),
   });
+  page.session = createSession({ audio: $("audio"), queue: page.queue, coverUrl: (item) => (typeof item?.stream === "string" ? page.covers.coverUrl(item) : "") });
+  page.queue.restore();
   page.radio = createRadio({ labels: page.labels, listener: page.listener, showStatus, showFailure });
   page.nav = createNav({
     labels: page.labels,

@@ -4,7 +4,7 @@
 import { failureCode, readApiReply } from "./failures.js";
 
 const API = "webapi/library.cgi";
-const ROW_HEIGHT = 28; // px; .track in app.css has the same height
+const ROW_HEIGHT = 28; // px; .track in app.css has the same height (--track-height where a layout sets it)
 const OVERSCAN = 8;    // rows drawn above and below the visible ones
 
 // Which tree nodes hold tracks or containers that the API lists.
@@ -26,16 +26,17 @@ export function formatDuration(seconds) {
 const $ = (id) => document.getElementById(id);
 
 // `decorateRow(row, track, index, node)` and `onListed(node, title, list)`: the playlist editor's
-// hooks (playlists.js), called for each drawn row and after each listing.
+// hooks (playlists.js), called for each drawn row and after each listing. `queue`: the play queue
+// (queue.js), which the player plays; without one the listed rows are played as they are.
 // The cover art's hooks (covers.js): `extendList(node, reply, signal)` adds to a list before it is
 // drawn, `decorateContainers(list, albums)` after its containers are drawn, `decorateCover(row,
 // track)` for each drawn row, `onPlay(track)` when a track starts. `openContainer(node, title,
 // object)`: what a click on a container of the list does (navigation, nav.js); lists it by default.
-export function createListener({ labels, onFailure, onStatus, onSuccess = () => {}, begin = () => 0, drawRandom = async () => false, decorateRow = () => {}, onListed = () => {},
-  extendList = async (node, reply) => reply, decorateContainers = () => {}, decorateCover = () => {}, onPlay = () => {}, openContainer = null }) {
+export function createListener({ onPlayerLoad = () => {}, labels, onFailure, onStatus, onSuccess = () => {}, begin = () => 0, drawRandom = async () => false, decorateRow = () => {}, onListed = () => {},
+  extendList = async (node, reply) => reply, decorateContainers = () => {}, decorateCover = () => {}, onPlay = () => {}, openContainer = null, queue = null }) {
   const state = {
     list: { node: "", containers: [], tracks: [] }, // what the pane shows
-    queue: [],          // the tracks being played, in order
+    queue: [],          // the tracks being played, in order (no play queue given)
     queueNode: "",      // the node the queue came from
     index: -1,          // the playing track in the queue
     cursor: -1,         // the row that the keyboard is on
@@ -46,6 +47,10 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
   const audio = $("audio");
   const viewport = $("tracks");
   const spacer = $("tracks-spacer");
+  // The rows' height: the layout's (a phone's rows are taller), else ROW_HEIGHT.
+  let rowHeight = ROW_HEIGHT;
+  const measureRows = () => { rowHeight = Number.parseFloat(getComputedStyle(viewport).getPropertyValue("--track-height")) || ROW_HEIGHT; };
+  measureRows();
 
   // `object`: a container of a media server on the network (its root when absent).
   async function fetchList(node, object, signal) {
@@ -118,6 +123,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
       if (code) listing.dataset.error = code;
       showState((code && labels.failures?.[code]) || reply.message || labels.badReply, true);
       onListed(node, title, state.list);
+      queue?.listed(state.list);
       onFailure(reply, ticket, node);
       return;
     }
@@ -126,6 +132,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
     showState("", false);
     setList({ node, containers, tracks, albums: reply.body.albums });
     onListed(node, title, state.list);
+    queue?.listed(state.list);
     listing.dataset.state = "loaded";
     listing.dataset.node = node;
     listing.dataset.loaded = String(Number(listing.dataset.loaded ?? 0) + 1);
@@ -165,7 +172,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
     $("list-count").textContent = labels.trackCount.replace("{count}", String(list.tracks.length));
     state.cursor = -1;
     $("play-all").disabled = list.tracks.length === 0;
-    spacer.style.height = `${list.tracks.length * ROW_HEIGHT}px`;
+    spacer.style.height = `${list.tracks.length * rowHeight}px`;
     viewport.hidden = list.tracks.length === 0;
     viewport.scrollTop = 0;
     viewport.setAttribute("aria-rowcount", String(list.tracks.length));
@@ -175,8 +182,8 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
   // Draws the rows that the viewport shows, reusing nothing: a window is at most a few dozen rows.
   function drawRows() {
     const tracks = state.list.tracks;
-    const first = Math.max(0, Math.floor(viewport.scrollTop / ROW_HEIGHT) - OVERSCAN);
-    const visible = Math.ceil((viewport.clientHeight || 400) / ROW_HEIGHT) + 2 * OVERSCAN;
+    const first = Math.max(0, Math.floor(viewport.scrollTop / rowHeight) - OVERSCAN);
+    const visible = Math.ceil((viewport.clientHeight || 400) / rowHeight) + 2 * OVERSCAN;
     const last = Math.min(tracks.length, first + visible);
     const rows = [];
     for (let i = first; i < last; i++) rows.push(trackRow(tracks[i], i));
@@ -190,7 +197,7 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
     row.setAttribute("aria-rowindex", String(index + 1));
     row.dataset.index = String(index);
     row.dataset.stream = String(track.stream ?? "");
-    row.style.top = `${index * ROW_HEIGHT}px`;
+    row.style.top = `${index * rowHeight}px`;
     if (isPlaying(index)) row.classList.add("playing");
     if (index === state.cursor) {
       row.classList.add("cursor");
@@ -211,41 +218,77 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
     row.title = String(track.title ?? "");
     decorateCover(row, track);
     decorateRow(row, track, index, state.list.node);
+    queue?.decorateRow(row, track, index, state.list.node);
     return row;
   }
 
   function isPlaying(index) {
+    if (queue) return queue.isPlaying(state.list.node, index, state.list.tracks[index]);
     return state.queueNode === state.list.node && state.index === index && state.queue === state.list.tracks;
   }
 
   function play(tracks, node, index) {
+    if (queue) {
+      queue.replace(tracks, node, index);
+      return;
+    }
     state.queue = tracks;
     state.queueNode = node;
     state.index = index;
     const track = tracks[index];
     if (!track) return;
+    load(track, { autoplay: true });
+    $("player").dataset.index = String(index);
+  }
+
+  // Puts `track` in the player; `autoplay` plays it, else it waits paused at `time` seconds.
+  function load(track, { autoplay = true, time = 0 } = {}) {
     // A row that is not a library track (a station, another server's track) names its own URL.
+    audio.preload = autoplay ? "auto" : "metadata";
     audio.src = typeof track.url === "string" && track.url !== "" ? track.url : `media/${encodeURIComponent(String(track.stream))}`;
-    audio.play().catch(() => {
-      // a play() superseded by the next one, or refused: the audio element's events say so
-    });
+    if (autoplay) {
+      audio.play().catch(() => {
+        // a play() superseded by the next one, or refused: the audio element's events say so
+      });
+    } else {
+      $("player").dataset.state = "paused";
+      $("play").textContent = labels.play;
+      if (time > 0)
+        audio.addEventListener("loadedmetadata", () => {
+          if (audio.paused && audio.currentTime === 0) audio.currentTime = Math.min(time, Number.isFinite(audio.duration) ? audio.duration : time);
+        }, { once: true });
+    }
     $("now-playing").textContent = [track.title, track.artist].filter(Boolean).join(" — ");
     $("player").dataset.stream = String(track.stream ?? track.url);
-    $("player").dataset.index = String(index);
+    $("player").dataset.index = String(queue ? queue.model.position() : state.index);
     onPlay(track);
+    drawRows();
+    onPlayerLoad(track);
+  }
+  function stop() {
+    audio.pause();
+    audio.removeAttribute("src");
+    audio.load();
+    $("now-playing").textContent = "";
+    delete $("player").dataset.stream;
+    delete $("player").dataset.index;
+    $("player").dataset.state = "stopped";
+    $("time").textContent = "0:00 / 0:00";
+    $("seek").value = "0";
     drawRows();
   }
 
   function moveCursor(index) {
     state.cursor = index;
-    const top = index * ROW_HEIGHT;
+    const top = index * rowHeight;
     if (top < viewport.scrollTop) viewport.scrollTop = top;
-    else if (top + ROW_HEIGHT > viewport.scrollTop + viewport.clientHeight) viewport.scrollTop = top + ROW_HEIGHT - viewport.clientHeight;
+    else if (top + rowHeight > viewport.scrollTop + viewport.clientHeight) viewport.scrollTop = top + rowHeight - viewport.clientHeight;
     drawRows();
     viewport.setAttribute("aria-activedescendant", "track-cursor");
   }
 
   function step(delta) {
+    if (queue) return queue.step(delta);
     const next = state.index + delta;
     if (next >= 0 && next < state.queue.length) play(state.queue, state.queueNode, next);
   }
@@ -257,19 +300,27 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
   }
 
   viewport.addEventListener("scroll", () => requestAnimationFrame(drawRows), { passive: true });
-  window.addEventListener("resize", drawRows);
+  window.addEventListener("resize", () => {
+    measureRows();
+    spacer.style.height = `${state.list.tracks.length * rowHeight}px`;
+    drawRows();
+  });
   spacer.addEventListener("click", (event) => {
     const row = event.target.closest(".track");
     if (!row) return;
     state.cursor = Number(row.dataset.index);
     play(state.list.tracks, state.list.node, state.cursor);
   });
-  $("play-all").addEventListener("click", () => play(state.list.tracks, state.list.node, 0));
+  // "Play all": the list from its first track, or (in shuffle) from any.
+  $("play-all").addEventListener("click", () => {
+    if (queue) queue.replace(state.list.tracks, state.list.node, -1);
+    else play(state.list.tracks, state.list.node, 0);
+  });
   // The keyboard in the list: arrows move over the rows, Enter or Space plays the row.
   viewport.addEventListener("keydown", (event) => {
     const count = state.list.tracks.length;
     if (count === 0) return;
-    const page = Math.max(1, Math.floor(viewport.clientHeight / ROW_HEIGHT) - 1);
+    const page = Math.max(1, Math.floor(viewport.clientHeight / rowHeight) - 1);
     const moves = { ArrowDown: 1, ArrowUp: -1, PageDown: page, PageUp: -page, Home: -count, End: count };
     if (event.key in moves) {
       moveCursor(Math.min(count - 1, Math.max(0, (state.cursor < 0 ? -1 : state.cursor) + moves[event.key])));
@@ -284,7 +335,8 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
   $("next").addEventListener("click", () => step(1));
   $("play").addEventListener("click", () => {
     if (!audio.src) {
-      if (state.list.tracks.length > 0) play(state.list.tracks, state.list.node, 0);
+      if (queue?.hasItems()) queue.step(0);
+      else if (state.list.tracks.length > 0) play(state.list.tracks, state.list.node, 0);
     } else if (audio.paused) {
       audio.play().catch(() => {});
     } else {
@@ -309,7 +361,8 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
   });
   audio.addEventListener("ended", () => {
     $("player").dataset.state = "ended";
-    step(1);
+    if (queue) queue.ended();
+    else step(1);
   });
   audio.addEventListener("error", () => {
     $("player").dataset.state = "error";
@@ -323,5 +376,8 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
   $("seek").setAttribute("aria-label", labels.seek);
   $("volume").setAttribute("aria-label", labels.volume);
 
-  return { show, hide, reload };
+  // The player as the play queue drives it.
+  const player = { load, stop, redraw: drawRows, list: () => state.list };
+  queue?.attach(player);
+  return { show, hide, reload, player };
 }

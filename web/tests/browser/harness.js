@@ -28,13 +28,15 @@ export async function close(browser) {
   await browser?.close();
 }
 
-// A logged-in page of `user` with the tree loaded. `query` is appended to the URL.
-export async function openTree(browser, user = "demo", { query = "", locale = "en-US" } = {}) {
+// A logged-in page of `user` with the tree loaded. `query` is appended to the URL; `device`: more
+// options of the browser context (a phone's viewport, touch).
+export async function openTree(browser, user = "demo", { query = "", locale = "en-US", device = {} } = {}) {
   const context = await browser.newContext({
     baseURL,
     locale,
     httpCredentials: { username: user, password },
     viewport: { width: 1000, height: 760 },
+    ...device,
   });
   const page = await context.newPage();
   const problems = [];
