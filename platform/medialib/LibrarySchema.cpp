@@ -77,6 +77,7 @@ CREATE TABLE search_album (
   id INTEGER PRIMARY KEY, album TEXT NOT NULL, artist TEXT NOT NULL, tracks INTEGER NOT NULL,
   UNIQUE (album, artist)
 );
+CREATE INDEX search_album_artist ON search_album(artist);
 CREATE VIRTUAL TABLE search_album_text USING fts5(
   album, artist, content='search_album', content_rowid='id',
   tokenize='unicode61 remove_diacritics 2', prefix='1 2 3'
@@ -147,6 +148,7 @@ bool EnsureSearchIndex(Database& db) {
     for (const auto& [type, name] : {std::pair<const char*, const char*>{"table", "track_search"},
                                      {"table", "search_album"},
                                      {"table", "search_album_text"},
+                                     {"index", "search_album_artist"},
                                      {"trigger", "track_search_insert"},
                                      {"trigger", "track_search_change"},
                                      {"trigger", "track_search_delete"},

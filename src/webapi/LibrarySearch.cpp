@@ -1,5 +1,6 @@
 #include "src/webapi/LibrarySearch.h"
 
+#include <algorithm>
 #include <cctype>
 #include <set>
 #include <utility>
@@ -60,7 +61,7 @@ bool AppendTracks(sqlite::Database& db, const std::string& match, std::set<std::
     // thousands for a word of one letter, where the first few dozen are what is shown.
     Statement stmt = db.Prepare(
         "SELECT t.id, t.path, t.title, t.artist, t.album, t.duration_ms FROM track_search s "
-        "JOIN track t ON t.id = s.rowid WHERE track_search MATCH ?1 LIMIT ?2");
+        "CROSS JOIN track t ON t.id = s.rowid WHERE track_search MATCH ?1 LIMIT ?2");
     if (!stmt)
         return false;
     stmt.Bind(1, std::string_view(match));
@@ -81,11 +82,22 @@ bool AppendTracks(sqlite::Database& db, const std::string& match, std::set<std::
     return step == SQLITE_ROW || step == SQLITE_DONE;
 }
 
+bool LessByName(const std::string& a, const std::string& b) {
+    const auto lower = [](unsigned char c) { return static_cast<char>(std::tolower(c)); };
+    for (std::size_t i = 0; i < a.size() && i < b.size(); ++i) {
+        const char x = lower(a[i]), y = lower(b[i]);
+        if (x != y)
+            return static_cast<unsigned char>(x) < static_cast<unsigned char>(y);
+    }
+    return a.size() != b.size() ? a.size() < b.size() : a < b;
+}
+
+// The first albums of the index's order (never all matches sorted: a word of one letter matches
+// most of a large library), then those in name order.
 bool FindAlbums(sqlite::Database& db, const std::string& match, SearchResult& result) {
     Statement stmt = db.Prepare(
-        "SELECT a.album, a.artist, a.tracks FROM search_album_text s JOIN search_album a "
-        "ON a.id = s.rowid WHERE search_album_text MATCH ?1 "
-        "ORDER BY a.album COLLATE NOCASE, a.album, a.artist LIMIT ?2");
+        "SELECT a.album, a.artist, a.tracks FROM search_album_text s CROSS JOIN search_album a "
+        "ON a.id = s.rowid WHERE search_album_text MATCH ?1 LIMIT ?2");
     if (!stmt)
         return false;
     stmt.Bind(1, std::string_view(match));
@@ -103,16 +115,19 @@ bool FindAlbums(sqlite::Database& db, const std::string& match, SearchResult& re
         album.node = AlbumNode(album.artist, album.title);
         result.albums.push_back(std::move(album));
     }
+    std::sort(result.albums.begin(), result.albums.end(), [](const AlbumHit& a, const AlbumHit& b) {
+        return a.title != b.title ? LessByName(a.title, b.title) : a.artist < b.artist;
+    });
     return step == SQLITE_ROW || step == SQLITE_DONE;
 }
 
 bool FindArtists(sqlite::Database& db, const std::string& match, SearchResult& result) {
     // The album artists that the tree lists: those of at least one album.
     Statement stmt = db.Prepare(
-        "SELECT a.artist, COUNT(*) FROM search_album_text s JOIN search_album a "
-        "ON a.id = s.rowid WHERE search_album_text MATCH ?1 AND a.artist <> '' "
-        "GROUP BY a.artist ORDER BY a.artist COLLATE NOCASE, a.artist LIMIT ?2");
-    if (!stmt)
+        "SELECT DISTINCT a.artist FROM search_album_text s CROSS JOIN search_album a "
+        "ON a.id = s.rowid WHERE search_album_text MATCH ?1 AND a.artist <> '' LIMIT ?2");
+    Statement albums = db.Prepare("SELECT COUNT(*) FROM search_album WHERE artist = ?1");
+    if (!stmt || !albums)
         return false;
     stmt.Bind(1, "{artist} : (" + match + ")");
     stmt.Bind(2, static_cast<std::int64_t>(kMaxSearchArtists + 1));
@@ -124,10 +139,14 @@ bool FindArtists(sqlite::Database& db, const std::string& match, SearchResult& r
         }
         ArtistHit artist;
         artist.name = stmt.ColumnText(0);
-        artist.albums = stmt.ColumnInt64(1);
+        albums.Reset();
+        albums.Bind(1, std::string_view(artist.name));
+        artist.albums = albums.Step() == SQLITE_ROW ? albums.ColumnInt64(0) : 0;
         artist.node = ArtistNode(artist.name);
         result.artists.push_back(std::move(artist));
     }
+    std::sort(result.artists.begin(), result.artists.end(),
+              [](const ArtistHit& a, const ArtistHit& b) { return LessByName(a.name, b.name); });
     return step == SQLITE_ROW || step == SQLITE_DONE;
 }
 
@@ -188,9 +207,8 @@ SearchStatus SearchLibrary(sqlite::Database& db, const std::vector<std::string>&
         return SearchStatus::ok;
     const std::string match = MatchExpression(words);
     std::set<std::int64_t> seen;
-    const bool ok = AppendTracks(db, "{title} : (" + match + ")", seen, result) &&
-                    (result.moreTracks || AppendTracks(db, match, seen, result)) &&
-                    FindAlbums(db, match, result) && FindArtists(db, match, result);
+    const bool ok = AppendTracks(db, match, seen, result) && FindAlbums(db, match, result) &&
+                    FindArtists(db, match, result);
     return ok ? SearchStatus::ok : SearchStatus::failed;
 }
 

@@ -61,9 +61,11 @@ struct SearchResult {
 enum class SearchStatus { ok, noIndex, failed };
 
 // Searches the library open in `db` for `words`: tracks whose title, artist, album or genre hold
-// words beginning with each of them (those matched in the title first), albums whose name and
-// album artist do, artists (album artists, as the tree lists them) whose name does. Albums and
-// artists are in name order (letter case ignored). No words: an empty result.
+// words beginning with each of them, albums whose name and album artist do, artists (album
+// artists, as the tree lists them) whose name does. Each group holds the first matches of the
+// index's order (never all matches ranked or sorted: a word of one letter matches most of a large
+// library); the albums and artists among them are then put in name order (ASCII letter case
+// ignored). No words: an empty result.
 SearchStatus SearchLibrary(sqlite::Database& db, const std::vector<std::string>& words,
                            SearchResult& result);
 

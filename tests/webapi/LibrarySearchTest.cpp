@@ -118,13 +118,16 @@ TEST_F(LibrarySearchIndex, SeveralWordsMustAllBeFound) {
     EXPECT_EQ(Titles("beat miles"), Names{});
 }
 
-TEST_F(LibrarySearchIndex, TracksWithTheWordsInTheirTitleComeFirst) {
+TEST_F(LibrarySearchIndex, TracksComeInTheLibrarysOrderAlbumsAndArtistsByName) {
     Add({"/volume1/music/1.mp3", "Other", "Beat Club", "Club Mix", "", ""});
-    Add({"/volume1/music/2.mp3", "Beat Goes On", "Someone", "Single", "", ""});
+    Add({"/volume1/music/2.mp3", "Beat Goes On", "Someone", "Beats", "", ""});
     const SearchResult result = Find("beat");
     ASSERT_EQ(result.tracks.size(), 2u);
-    EXPECT_EQ(result.tracks[0].title, "Beat Goes On");
-    EXPECT_EQ(result.tracks[1].title, "Other");
+    EXPECT_EQ(result.tracks[0].title, "Other");
+    EXPECT_EQ(result.tracks[1].title, "Beat Goes On");
+    ASSERT_EQ(result.albums.size(), 2u);
+    EXPECT_EQ(result.albums[0].title, "Beats");
+    EXPECT_EQ(result.albums[1].title, "Club Mix");
 }
 
 TEST_F(LibrarySearchIndex, TrackHitsAreRowsThePagePlays) {

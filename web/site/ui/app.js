@@ -6,6 +6,7 @@ import { createListener, isListable } from "./listen.js";
 import { failureCode, readApiReply, splitTracks, isBrowsedLibraryNode } from "./failures.js";
 import { createPlaylists } from "./playlists.js";
 import { createRadio, listedRadioNode } from "./radio.js";
+import { createSearch } from "./search.js";
 
 const CGI = "webapi/audiotree.cgi";
 const API = "webapi/library.cgi";
@@ -438,6 +439,12 @@ async function start() {
     drawRandom: () => draw(true),
   });
   page.radio = createRadio({ labels: page.labels, listener: page.listener, showStatus, showFailure });
+  createSearch({
+    labels: page.labels,
+    playTracks: (tracks, index) => page.listener.playTracks(tracks, index),
+    openNode: (node, title) => page.listener.show(node, title),
+    onFailure: (reply) => { if (failureCode(reply) === "login_expired") showFailure(reply); },
+  });
 
   const tree = $("tree");
   tree.addEventListener("click", (event) => {

@@ -3,6 +3,7 @@
 import { FAILURE_WORDS } from "./words/failures.js";
 import { PLAYLIST_WORDS } from "./words/playlists.js";
 import { RADIO_WORDS } from "./words/radio.js";
+import { SEARCH_WORDS } from "./words/search.js";
 export const LABELS = {
   enu: {
     title: "Harmona Audio", tree: "Audio sources", rerandom: "New Random 100",
@@ -75,7 +76,7 @@ export const LABELS = {
 };
 
 // Each feature's own words (words/*.js), one dictionary per language code, merged in.
-for (const words of [FAILURE_WORDS, PLAYLIST_WORDS, RADIO_WORDS])
+for (const words of [FAILURE_WORDS, PLAYLIST_WORDS, RADIO_WORDS, SEARCH_WORDS])
   for (const [code, dictionary] of Object.entries(words)) LABELS[code] = { ...LABELS[code], ...dictionary };
 
 // The page's BCP 47 tag for a language code (the html lang attribute).

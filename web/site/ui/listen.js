@@ -314,5 +314,8 @@ export function createListener({ labels, onFailure, onStatus, onSuccess = () => 
   $("seek").setAttribute("aria-label", labels.seek);
   $("volume").setAttribute("aria-label", labels.volume);
 
-  return { show, hide, reload };
+  // A list of rows found elsewhere (the search) played from one of them.
+  const playTracks = (tracks, index) => play(tracks, "search", index);
+
+  return { show, hide, reload, playTracks };
 }
