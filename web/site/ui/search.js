@@ -215,9 +215,9 @@ export function createSearch({ labels, playTracks, openNode, onFailure = () => {
       panel.replaceChildren();
       state.options = [];
       delete panel.dataset.query;
-      panel.dataset.state = queryWords(query).length > 0 ? "refused" : "idle";
       if (queryWords(query).length > 0) showProblem(query, labels.searchTooLong);
       else close();
+      panel.dataset.state = queryWords(query).length > 0 ? "refused" : "idle";
       return;
     }
     state.timer = setTimeout(() => send(query), SEARCH_DEBOUNCE_MS);
