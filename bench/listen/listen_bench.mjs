@@ -6,6 +6,7 @@
 import { launch, close, openTree, item } from "../../web/tests/browser/harness.js";
 import { measurePlaylists } from "./playlists_bench.mjs";
 import { measureCovers } from "./covers_bench.mjs";
+import { fillLibrary, measureSearchApi, measureSearchPage, QUERIES } from "./search_bench.mjs";
 import { writeFileSync, chownSync, statSync, mkdirSync } from "node:fs";
 
 const rounds = Number(process.env.BENCH_ROUNDS ?? 15);
@@ -83,8 +84,17 @@ for (let i = 0; i < rounds; i++) {
   remotePlay.push((await timed(remoteTrack)).ms);
 }
 
+// The search, over a library of 100,000 tracks, beside the listing of the Bench folder again.
+const searchTracks = fillLibrary();
+const searchList = [];
+const search = await measureSearchApi({
+  timed, rounds,
+  between: async () => searchList.push((await timed(`webapi/library.cgi?action=list&node=${encodeURIComponent(node)}`)).ms),
+});
+
 const browser = await launch();
 const clicks = [];
+let searchPage = [];
 try {
   const page = await openTree(browser, process.env.HARMONA_USER);
   const open = async (id) => {
@@ -120,6 +130,7 @@ try {
   // The page must not have drawn all rows.
   const drawn = await page.locator("#tracks .track").count();
   console.log(`rows in the document after the click: ${drawn} of ${apiTracks}`);
+  searchPage = await measureSearchPage({ page, rounds });
 } finally {
   await close(browser);
 }
@@ -140,3 +151,11 @@ line("library.cgi radio_add (500th station)", radioAdd);
 line("library.cgi radio_remove", radioRemove);
 line(`library.cgi list, same folder on a network server`, remote);
 line("library.cgi remote_stream of one of its tracks", remotePlay);
+const listed = median(searchList);
+const searchLine = (name, values) =>
+  console.log(`${name.padEnd(44)} median ${median(values).toFixed(1).padStart(7)} ms  ` +
+    `min ${Math.min(...values).toFixed(1).padStart(7)} ms  x${(median(values) / listed).toFixed(2)} of the listing`);
+console.log(`search over ${searchTracks} tracks (library.cgi list of the folder in the same rounds: median ${listed.toFixed(1)} ms)`);
+searchLine("library.cgi search, all queries", search.all);
+for (const q of QUERIES) searchLine(`  q="${q}" (${search.found[q]} tracks/albums/artists)`, search.times[q]);
+searchLine("page: keystroke to search results drawn", searchPage);

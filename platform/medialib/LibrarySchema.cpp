@@ -1,5 +1,9 @@
 #include "platform/medialib/LibrarySchema.h"
 
+#include <string>
+#include <string_view>
+#include <utility>
+
 namespace harmona::medialib {
 using sqlite::Database;
 using sqlite::Statement;
@@ -50,6 +54,112 @@ bool AddLaterColumns(Database& db) {
     return true;
 }
 
+// The search index: the words of every track's title, artist, album and genre (track_search), and
+// one row per album as the media server groups them (name and album artist, the track's artist
+// when it has none) with the words of both (search_album, search_album_text). Triggers on the
+// track table keep all three in step with every insert, change and removal of a track, whoever
+// writes it; a move (a new path) changes no word and touches none of them.
+constexpr const char* kAlbumArtistOfNew = "COALESCE(NULLIF(new.album_artist, ''), new.artist, '')";
+constexpr const char* kSearchSchema = R"SQL(
+DROP TRIGGER IF EXISTS track_search_insert;
+DROP TRIGGER IF EXISTS track_search_change;
+DROP TRIGGER IF EXISTS track_search_delete;
+DROP TRIGGER IF EXISTS search_album_insert;
+DROP TRIGGER IF EXISTS search_album_delete;
+DROP TABLE IF EXISTS track_search;
+DROP TABLE IF EXISTS search_album_text;
+DROP TABLE IF EXISTS search_album;
+CREATE VIRTUAL TABLE track_search USING fts5(
+  title, artist, album, genre, content='track', content_rowid='id',
+  tokenize='unicode61 remove_diacritics 2', prefix='1 2 3'
+);
+CREATE TABLE search_album (
+  id INTEGER PRIMARY KEY, album TEXT NOT NULL, artist TEXT NOT NULL, tracks INTEGER NOT NULL,
+  UNIQUE (album, artist)
+);
+CREATE INDEX search_album_artist ON search_album(artist);
+CREATE VIRTUAL TABLE search_album_text USING fts5(
+  album, artist, content='search_album', content_rowid='id',
+  tokenize='unicode61 remove_diacritics 2', prefix='1 2 3'
+);
+INSERT INTO track_search (track_search) VALUES ('rebuild');
+INSERT INTO search_album (album, artist, tracks)
+  SELECT album, COALESCE(NULLIF(album_artist, ''), artist, ''), COUNT(*) FROM track
+  WHERE album <> '' GROUP BY 1, 2;
+INSERT INTO search_album_text (search_album_text) VALUES ('rebuild');
+CREATE TRIGGER search_album_insert AFTER INSERT ON search_album BEGIN
+  INSERT INTO search_album_text (rowid, album, artist) VALUES (new.id, new.album, new.artist);
+END;
+CREATE TRIGGER search_album_delete AFTER DELETE ON search_album BEGIN
+  INSERT INTO search_album_text (search_album_text, rowid, album, artist)
+    VALUES ('delete', old.id, old.album, old.artist);
+END;
+CREATE TRIGGER track_search_insert AFTER INSERT ON track BEGIN
+  INSERT INTO track_search (rowid, title, artist, album, genre)
+    VALUES (new.id, new.title, new.artist, new.album, new.genre);
+  INSERT INTO search_album (album, artist, tracks)
+    SELECT new.album, @NEW@, 1 WHERE new.album <> ''
+    ON CONFLICT (album, artist) DO UPDATE SET tracks = tracks + 1;
+END;
+CREATE TRIGGER track_search_change AFTER UPDATE OF id, title, artist, album, album_artist, genre
+ON track BEGIN
+  INSERT INTO track_search (track_search, rowid, title, artist, album, genre)
+    VALUES ('delete', old.id, old.title, old.artist, old.album, old.genre);
+  UPDATE search_album SET tracks = tracks - 1 WHERE album = old.album AND artist = @OLD@;
+  DELETE FROM search_album WHERE album = old.album AND artist = @OLD@ AND tracks <= 0;
+  INSERT INTO track_search (rowid, title, artist, album, genre)
+    VALUES (new.id, new.title, new.artist, new.album, new.genre);
+  INSERT INTO search_album (album, artist, tracks)
+    SELECT new.album, @NEW@, 1 WHERE new.album <> ''
+    ON CONFLICT (album, artist) DO UPDATE SET tracks = tracks + 1;
+END;
+CREATE TRIGGER track_search_delete AFTER DELETE ON track BEGIN
+  INSERT INTO track_search (track_search, rowid, title, artist, album, genre)
+    VALUES ('delete', old.id, old.title, old.artist, old.album, old.genre);
+  UPDATE search_album SET tracks = tracks - 1 WHERE album = old.album AND artist = @OLD@;
+  DELETE FROM search_album WHERE album = old.album AND artist = @OLD@ AND tracks <= 0;
+END;
+)SQL";
+
+std::string SearchSchema() {
+    std::string sql = kSearchSchema;
+    const std::string albumArtistOfNew = kAlbumArtistOfNew;
+    std::string albumArtistOfOld = albumArtistOfNew;
+    for (std::size_t at = 0; (at = albumArtistOfOld.find("new.", at)) != std::string::npos;)
+        albumArtistOfOld.replace(at, 4, "old.");
+    for (const auto& [mark, text] : {std::pair<std::string, std::string>{"@NEW@", albumArtistOfNew},
+                                     {"@OLD@", albumArtistOfOld}}) {
+        for (std::size_t at = 0; (at = sql.find(mark, at)) != std::string::npos; at += text.size())
+            sql.replace(at, mark.size(), text);
+    }
+    return sql;
+}
+
+bool HasSchemaObject(Database& db, const char* type, const char* name) {
+    Statement stmt = db.Prepare("SELECT 1 FROM sqlite_master WHERE type = ?1 AND name = ?2");
+    return stmt && stmt.Bind(1, std::string_view(type)) == SQLITE_OK &&
+           stmt.Bind(2, std::string_view(name)) == SQLITE_OK && stmt.Step() == SQLITE_ROW;
+}
+
+// The search index is made (and filled from the track table) when one of its parts is missing:
+// a library of an indexer that had none gets it once, without reading a tag, and an index left
+// without its triggers (the track table made anew by hand) is made again rather than trusted.
+bool EnsureSearchIndex(Database& db) {
+    for (const auto& [type, name] : {std::pair<const char*, const char*>{"table", "track_search"},
+                                     {"table", "search_album"},
+                                     {"table", "search_album_text"},
+                                     {"index", "search_album_artist"},
+                                     {"trigger", "track_search_insert"},
+                                     {"trigger", "track_search_change"},
+                                     {"trigger", "track_search_delete"},
+                                     {"trigger", "search_album_insert"},
+                                     {"trigger", "search_album_delete"}}) {
+        if (!HasSchemaObject(db, type, name))
+            return db.Execute(SearchSchema().c_str()) == SQLITE_OK;
+    }
+    return true;
+}
+
 int UserVersion(Database& db) {
     Statement stmt = db.Prepare("PRAGMA user_version");
     if (!stmt || stmt.Step() != SQLITE_ROW)
@@ -79,7 +189,7 @@ bool EnsureLibrarySchema(Database& db) {
         return false;
     if (!(db.Execute("BEGIN IMMEDIATE") == SQLITE_OK))
         return false;
-    if (!(db.Execute(kSchema) == SQLITE_OK) || !AddLaterColumns(db)) {
+    if (!(db.Execute(kSchema) == SQLITE_OK) || !AddLaterColumns(db) || !EnsureSearchIndex(db)) {
         db.Execute("ROLLBACK");
         return false;
     }

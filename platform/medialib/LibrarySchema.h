@@ -12,7 +12,10 @@ namespace harmona::medialib {
 inline constexpr int kLibrarySchemaVersion = 1;
 
 // Creates whatever of the schema is missing (tables, indexes, user_version) in one transaction;
-// rows already there, the playlist tables' included, are never touched. False on failure, or when
+// rows already there, the playlist tables' included, are never touched. The search index
+// (platform/README.md, "Search index": full-text tables and the triggers that keep them in step
+// with the track table) is made anew and filled from the track table when any part of it is
+// missing. False on failure, or when
 // the file carries a user_version other than 0 or 1.
 bool EnsureLibrarySchema(sqlite::Database& db);
 

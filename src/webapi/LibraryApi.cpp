@@ -23,6 +23,7 @@
 #include "src/webapi/PlaylistEdit.h"
 #include "src/webapi/RadioApi.h"
 #include "src/webapi/RemoteMedia.h"
+#include "src/webapi/SearchAction.h"
 #include "src/webapi/ServiceProbe.h"
 
 namespace harmona::webapi {
@@ -92,6 +93,8 @@ int LibraryApi::Process() {
         return EditSmartPlaylist(action);
     if (IsRadioAction(action))
         return ServeRadioAction(*this, webMan, action);
+    if (action == kSearchAction)
+        return ServeSearch(*this, webMan);
     if (action == kRemoteStreamAction)
         return ServeRemoteStream(*this, webMan, permission_);
     if (IsCoverArtAction(action))

@@ -11,6 +11,7 @@ import { createNav } from "./nav.js";
 import { createQueue } from "./queue.js";
 import { createSession } from "./session.js";
 import { createDrawer } from "./phone.js";
+import { createSearch } from "./search.js";
 
 const CGI = "webapi/audiotree.cgi";
 const API = "webapi/library.cgi";
@@ -465,6 +466,12 @@ async function start() {
     findItem: (id) => [...document.querySelectorAll("#tree li[role=treeitem]")].find((li) => li.dataset.id === id) ?? null,
     selectItem: (li, options) => select(li, options),
     expandItem: (li) => expand(li),
+  });
+  createSearch({
+    labels: page.labels,
+    playTracks: (tracks, index) => page.listener.playTracks(tracks, index),
+    openNode: (node, title) => page.listener.show(node, title),
+    onFailure: (reply) => { if (failureCode(reply) === "login_expired") showFailure(reply); },
   });
 
   const tree = $("tree");

@@ -6,6 +6,7 @@ import { RADIO_WORDS } from "./words/radio.js";
 import { COVER_WORDS } from "./words/covers.js";
 import { NAV_WORDS } from "./words/nav.js";
 import { QUEUE_WORDS } from "./words/queue.js";
+import { SEARCH_WORDS } from "./words/search.js";
 export const LABELS = {
   enu: {
     title: "Harmona Audio", tree: "Audio sources", rerandom: "New Random 100",
@@ -78,7 +79,7 @@ export const LABELS = {
 };
 
 // Each feature's own words (words/*.js), one dictionary per language code, merged in.
-for (const words of [FAILURE_WORDS, PLAYLIST_WORDS, RADIO_WORDS, COVER_WORDS, NAV_WORDS, QUEUE_WORDS])
+for (const words of [FAILURE_WORDS, PLAYLIST_WORDS, RADIO_WORDS, COVER_WORDS, NAV_WORDS, QUEUE_WORDS, SEARCH_WORDS])
   for (const [code, dictionary] of Object.entries(words)) LABELS[code] = { ...LABELS[code], ...dictionary };
 
 // The page's BCP 47 tag for a language code (the html lang attribute).

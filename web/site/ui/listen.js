@@ -379,5 +379,8 @@ export function createListener({ onPlayerLoad = () => {}, labels, onFailure, onS
   // The player as the play queue drives it.
   const player = { load, stop, redraw: drawRows, list: () => state.list };
   queue?.attach(player);
-  return { show, hide, reload, player };
+  // A list of rows found elsewhere (the search) played from one of them.
+  const playTracks = (tracks, index) => play(tracks, "search", index);
+
+  return { show, hide, reload, player, playTracks };
 }
