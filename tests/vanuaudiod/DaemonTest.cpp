@@ -3,7 +3,9 @@
 // (MiniDLNA) and scripted media servers over a veth link.
 #include <grp.h>
 #include <gtest/gtest.h>
+#include <net/if.h>
 #include <signal.h>
+#include <sys/ioctl.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>
@@ -1060,7 +1062,73 @@ void ExpectFoundAgainAndByTheScan(FakeMediaServers& lan, const std::string& udn,
     EXPECT_GT(lan.SearchesSeen(), before) << "no search reached the LAN after: " << fault;
 }
 
+// The interface's flags as the kernel reports them (IFF_UP, IFF_RUNNING: up with a carrier); 0
+// when it cannot say.
+unsigned InterfaceFlags(const char* interfaceName) {
+    const int fd = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    ifreq request{};
+    std::strncpy(request.ifr_name, interfaceName, IFNAMSIZ - 1);
+    const bool asked = fd >= 0 && ioctl(fd, SIOCGIFFLAGS, &request) == 0;
+    if (fd >= 0)
+        close(fd);
+    return asked ? static_cast<unsigned short>(request.ifr_flags) : 0u;
+}
+
 }  // namespace
+
+// The cable (or the switch port, or the Wi-Fi association) goes and comes back while the
+// interface stays up with its address: GUPnP sees nothing, so the daemon follows the carrier
+// itself, says so in its log, and searches again when it returns.
+TEST_F(AudioDaemon, AfterItsLinkLosesItsCarrierAndGetsItBackALanServerIsListedAgain) {
+    FakeMediaServers lan(peer_);
+    {
+        const ScopedLeakSuppressions suppressions(SourceDir() +
+                                                  "/tests/vanuaudiod/gupnp-link-change.supp");
+        daemon_ = StartDaemon();
+    }
+    ASSERT_NO_FATAL_FAILURE(ListBeforeTheFault(lan, "uuid:lan"));
+    std::this_thread::sleep_for(std::chrono::milliseconds(1500));  // the link in use a while
+    ASSERT_TRUE(peer_.RunOnPeer("ip link set vb down"));
+    for (int waited = 0; (InterfaceFlags(kHostInterface) & IFF_RUNNING) != 0 && waited < 2000;
+         waited += 50)
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    // Up, with its address, and no carrier.
+    ASSERT_EQ(InterfaceFlags(kHostInterface) & (IFF_UP | IFF_RUNNING), unsigned{IFF_UP});
+    ASSERT_NO_FATAL_FAILURE(ExpireDuringTheFault(lan, "uuid:lan"));
+    EXPECT_TRUE(WaitForLog("network: va lost its carrier", 3000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    const auto end = FaultClock::now();
+    ASSERT_TRUE(peer_.RunOnPeer("ip link set vb up && ip route replace 224.0.0.0/4 dev vb"));
+    ExpectFoundAgainAndByTheScan(lan, "uuid:lan", end, "carrier lost for about 4 s");
+    EXPECT_TRUE(WaitForLog("network: va has its carrier again; searching for media servers", 1000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    const std::string log = ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(CountOf(log, "lost its carrier"), 1) << log;
+    EXPECT_EQ(log.find(" gone"), std::string::npos) << "the addresses stayed: " << log;
+}
+
+// Started with its cable out (or its switch still starting): the interface is up with its
+// address, and the search at start reaches no one.
+TEST_F(AudioDaemon, StartedWithoutACarrierItFindsTheLanServersWhenTheLinkComesUp) {
+    FakeMediaServers lan(peer_);
+    lan.Add("uuid:lan", FakeMediaServers::DescriptionXml("uuid:lan", "LAN Server", "/cd"));
+    lan.AnswerSearches("uuid:lan", 1800);
+    ASSERT_TRUE(peer_.RunOnPeer("ip link set vb down"));
+    {
+        const ScopedLeakSuppressions suppressions(SourceDir() +
+                                                  "/tests/vanuaudiod/gupnp-link-change.supp");
+        daemon_ = StartDaemon();
+    }
+    ASSERT_EQ(InterfaceFlags(kHostInterface) & (IFF_UP | IFF_RUNNING), unsigned{IFF_UP});
+    EXPECT_TRUE(WaitForLog("network: va has no carrier; searching again when it has one", 3000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(Reply(Call(16, "0 10"))["total"], 0);
+    const auto end = FaultClock::now();
+    ASSERT_TRUE(peer_.RunOnPeer("ip link set vb up && ip route replace 224.0.0.0/4 dev vb"));
+    ExpectFoundAgainAndByTheScan(lan, "uuid:lan", end, "no carrier at start, then the link up");
+    EXPECT_TRUE(WaitForLog("network: va has its carrier again; searching for media servers", 1000))
+        << ReadFile("/tmp/vanuaudiod.log");
+}
 
 // As DHCP clients and network managers renew into another address: the new one arrives, then the
 // old one goes (the kernel promotes the secondary, as those hosts have it).
