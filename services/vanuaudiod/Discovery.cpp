@@ -3,7 +3,9 @@
 #include <arpa/inet.h>
 #include <libgssdp/gssdp.h>
 #include <libgupnp/gupnp.h>
+#include <net/if.h>
 #include <netinet/in.h>
+#include <sys/ioctl.h>
 #include <sys/socket.h>
 #include <syslog.h>
 #include <unistd.h>
@@ -100,6 +102,17 @@ std::string MulticastRouteProblem(GInetAddress* address) {
     return problem;
 }
 
+// Whether `interfaceName` is up and has its carrier (IFF_RUNNING: a cable in, a switch port up, a
+// Wi-Fi association). True when the kernel cannot be asked, so that a failed question never
+// reads as a lost link.
+bool HasCarrier(const harmona::io::FileDescriptor& fd, const std::string& interfaceName) {
+    ifreq request{};
+    std::strncpy(request.ifr_name, interfaceName.c_str(), IFNAMSIZ - 1);
+    if (!fd || ioctl(fd.Get(), SIOCGIFFLAGS, &request) != 0)
+        return true;
+    return (request.ifr_flags & IFF_UP) != 0 && (request.ifr_flags & IFF_RUNNING) != 0;
+}
+
 }  // namespace
 
 // Everything below runs on the discovery thread.
@@ -115,6 +128,7 @@ class Discovery::Worker {
         expiry_ = Source::Timeout(1000, [this] {
             Expire();
             FlushRefusalCount();
+            FollowCarriers();
             return true;
         });
         research_ = Source::Timeout(options.researchSeconds * 1000, [this] {
@@ -182,6 +196,44 @@ class Discovery::Worker {
         addresses_.erase(found);
         // Another address of the network may answer differently: look again.
         RequestSearch();
+    }
+
+    // GUPnP follows an interface's administrative state only: a link that loses its carrier (a
+    // cable pulled, a switch restarted, a Wi-Fi association lost) keeps its contexts, and nothing
+    // tells. Searches sent meanwhile reach no one, and a server that expired or arrived meanwhile
+    // would wait for the periodic search; so the carrier of every interface with an address is
+    // looked at each second, its loss logged, and its return searches at once.
+    void FollowCarriers() {
+        std::map<std::string, bool> now;
+        for (const auto& [context, address] : addresses_)
+            now.emplace(address->interfaceName, true);
+        bool search = false;
+        for (auto& [interfaceName, running] : now) {
+            running = HasCarrier(flagsSocket_, interfaceName);
+            const auto before = carrier_.find(interfaceName);
+            if (before == carrier_.end()) {
+                // Newly followed: its context has just searched, which reached no one without a
+                // carrier.
+                if (!running)
+                    syslog(LOG_WARNING,
+                           "network: %s has no carrier; searching again when it has one",
+                           interfaceName.c_str());
+                continue;
+            }
+            if (before->second == running)
+                continue;
+            if (!running) {
+                syslog(LOG_WARNING, "network: %s lost its carrier; searching again when it is back",
+                       interfaceName.c_str());
+            } else {
+                syslog(LOG_INFO, "network: %s has its carrier again; searching for media servers",
+                       interfaceName.c_str());
+                search = true;
+            }
+        }
+        carrier_ = std::move(now);
+        if (search)
+            RequestSearch();
     }
 
     // Link-local locations are taken only on an interface that has nothing better.
@@ -419,6 +471,9 @@ class Discovery::Worker {
     Clock::time_point lastSearch_{};
     std::map<std::pair<std::string, std::string>, Clock::time_point> departed_;
     bool routeMissing_ = false;
+    // Interface name -> whether it had its carrier at the last look (interfaces with an address).
+    std::map<std::string, bool> carrier_;
+    const harmona::io::FileDescriptor flagsSocket_{socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0)};
     Clock::time_point refusalWindowStart_{};
     int refusalLines_ = 0;
     int refusalsUnlogged_ = 0;

@@ -55,20 +55,37 @@ PeerNetwork::PeerNetwork() {
         ADD_FAILURE() << "could not make the peer's network namespace";
         return;
     }
+    ok_ = Link();
+}
+
+bool PeerNetwork::Link(const std::function<void()>& peerReady) {
     const std::string peer = std::to_string(holder_.pid());
-    ok_ = RunCommand("ip link add va type veth peer name vb netns " + peer) &&
-          RunCommand("echo 0 > /proc/sys/net/ipv6/conf/va/accept_dad") &&
-          RunCommand("ip addr add 10.77.0.1/24 dev va && ip link set va up") &&
-          // More addresses of this host, for scripted servers beyond what one address may
-          // announce.
-          RunCommand("for n in 11 12 13 14 15 16 17; do ip addr add 10.77.0.$n/24 dev va; done") &&
-          // A route for multicast, as a LAN host has with its default route (without one the
-          // daemon warns).
-          RunCommand("ip route add 224.0.0.0/4 dev va") &&
-          RunCommand("nsenter -t " + peer +
-                     " -n sh -c 'echo 0 > /proc/sys/net/ipv6/conf/vb/accept_dad && ip link set lo "
-                     "up && ip addr add 10.77.0.2/24 dev vb && ip link set vb up && ip route add "
-                     "224.0.0.0/4 dev vb'");
+    if (!RunCommand("ip link add va type veth peer name vb netns " + peer) ||
+        !RunCommand("nsenter -t " + peer +
+                    " -n sh -c 'echo 0 > /proc/sys/net/ipv6/conf/vb/accept_dad && ip link set lo "
+                    "up && ip addr add 10.77.0.2/24 dev vb && ip link set vb up && ip route add "
+                    "224.0.0.0/4 dev vb'"))
+        return false;
+    if (peerReady)
+        peerReady();
+    return RunCommand("echo 0 > /proc/sys/net/ipv6/conf/va/accept_dad") &&
+           RunCommand("ip addr add 10.77.0.1/24 dev va && ip link set va up") &&
+           // More addresses of this host, for scripted servers beyond what one address may
+           // announce.
+           RunCommand("for n in 11 12 13 14 15 16 17; do ip addr add 10.77.0.$n/24 dev va; done") &&
+           // A route for multicast, as a LAN host has with its default route (without one the
+           // daemon warns).
+           RunCommand("ip route add 224.0.0.0/4 dev va");
+}
+
+bool PeerNetwork::Unlink() {
+    return RunCommand("ip link del va");
+}
+
+bool PeerNetwork::RunOnPeer(const std::string& command) {
+    // The tests' commands hold no single quotes.
+    return RunCommand("nsenter -t " + std::to_string(holder_.pid()) + " -n sh -c '" + command +
+                      "'");
 }
 
 PeerNetwork::~PeerNetwork() {

@@ -4,6 +4,7 @@
 // second "host" on an Ethernet-like link, so that SSDP multicast and byebye travel as on a LAN).
 #pragma once
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -37,6 +38,19 @@ class PeerNetwork {
     explicit operator bool() const { return ok_; }
     // Runs a program on the peer host.
     Service SpawnOnPeer(const std::vector<std::string>& argv, const std::string& logPath);
+    // A process in the peer host's network namespace (/proc/<pid>/ns/net), for sockets of its
+    // own there.
+    pid_t PeerPid() const { return holder_.pid(); }
+    // Removes the link (both ends: this host's interface is gone, as a NIC not yet probed or a
+    // USB adapter unplugged), and makes it again as the constructor did; false (and a failed test)
+    // when a command fails. The peer's side is ready first: `peerReady`, when given, runs once
+    // the peer has its address on the link and before this host's interface has one (what is
+    // already on the LAN when a host's interface arrives).
+    bool Unlink();
+    bool Link(const std::function<void()>& peerReady = nullptr);
+    // Runs a shell command on the peer host (its network: `ip link set vb down`, ...); a failure
+    // fails the test.
+    bool RunOnPeer(const std::string& command);
 
   private:
     io::ChildProcess holder_;

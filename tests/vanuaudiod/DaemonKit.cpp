@@ -16,6 +16,7 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <functional>
 
 #include "tests/harness/Fixtures.h"
 
@@ -30,6 +31,26 @@ using SteadyClock = std::chrono::steady_clock;
 
 // The device type every fake announces, searches look for and answers name.
 const std::string kType = "urn:schemas-upnp-org:device:MediaServer:1";
+
+// Runs `make` in the network namespace of process `netnsOf` (on a thread of its own that enters
+// it), or here when `netnsOf` is 0: a socket belongs to the network it was made in wherever it is
+// used later.
+int MakeSocketIn(pid_t netnsOf, const std::function<int()>& make) {
+    if (netnsOf <= 0)
+        return make();
+    int made = -1;
+    std::thread([&] {
+        const std::string path = "/proc/" + std::to_string(netnsOf) + "/ns/net";
+        const int ns = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+        if (ns >= 0 && setns(ns, CLONE_NEWNET) == 0)
+            made = make();
+        else
+            ADD_FAILURE() << "cannot enter " << path << ": " << std::strerror(errno);
+        if (ns >= 0)
+            close(ns);
+    }).join();
+    return made;
+}
 
 }  // namespace
 
@@ -234,7 +255,17 @@ Process StartRygel(PeerNetwork& peer, const std::string& friendlyName, int port)
 }
 
 FakeMediaServers::FakeMediaServers() {
-    listenFd_ = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    Open();
+}
+
+FakeMediaServers::FakeMediaServers(const PeerNetwork& peer)
+    : address_(kPeerAddress), netnsOf_(peer.PeerPid()) {
+    Open();
+}
+
+void FakeMediaServers::Open() {
+    listenFd_ =
+        MakeSocketIn(netnsOf_, [] { return socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0); });
     sockaddr_in address{};
     address.sin_family = AF_INET;
     address.sin_addr.s_addr = htonl(INADDR_ANY);  // every address the devices announce
@@ -246,9 +277,9 @@ FakeMediaServers::FakeMediaServers() {
     listen(listenFd_, 64);
 
     in_addr interfaceAddress{};
-    inet_pton(AF_INET, kHostAddress, &interfaceAddress);
+    inet_pton(AF_INET, address_.c_str(), &interfaceAddress);
 
-    ssdpFd_ = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    ssdpFd_ = MakeSocketIn(netnsOf_, [] { return socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0); });
     const int yes = 1;
     setsockopt(ssdpFd_, SOL_SOCKET, SO_REUSEADDR, &yes, sizeof(yes));
     sockaddr_in ssdp{};
@@ -279,14 +310,15 @@ int FakeMediaServers::SocketFrom(const std::string& address) {
     const auto found = udpFds_.find(address);
     if (found != udpFds_.end())
         return found->second;
-    const int fd = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    const int fd =
+        MakeSocketIn(netnsOf_, [] { return socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0); });
     sockaddr_in local{};
     local.sin_family = AF_INET;
     inet_pton(AF_INET, address.c_str(), &local.sin_addr);
     EXPECT_EQ(bind(fd, reinterpret_cast<sockaddr*>(&local), sizeof(local)), 0)
         << address << ": " << std::strerror(errno);
     in_addr interfaceAddress{};
-    inet_pton(AF_INET, kHostAddress, &interfaceAddress);
+    inet_pton(AF_INET, address_.c_str(), &interfaceAddress);
     setsockopt(fd, IPPROTO_IP, IP_MULTICAST_IF, &interfaceAddress, sizeof(interfaceAddress));
     const unsigned char loop = 1;
     setsockopt(fd, IPPROTO_IP, IP_MULTICAST_LOOP, &loop, sizeof(loop));
@@ -297,7 +329,7 @@ int FakeMediaServers::SocketFrom(const std::string& address) {
 std::string FakeMediaServers::AddressOf(const std::string& udn) const {
     std::lock_guard<std::mutex> lock(mutex_);
     const auto found = addresses_.find(udn);
-    return found == addresses_.end() ? kHostAddress : found->second;
+    return found == addresses_.end() ? address_ : found->second;
 }
 
 void FakeMediaServers::AnswerSearches(const std::string& udn, int maxAgeSeconds) {
@@ -369,8 +401,9 @@ std::string FakeMediaServers::Add(const std::string& udn, const std::string& des
     paths_[udn] = path;
     // Sixteen devices per address, as one host may announce: the first on the host's own
     // address, the next ones on its further addresses.
-    addresses_[udn] = index < kDevicesPerAddress
-                          ? kHostAddress
+    // A peer host has its one address.
+    addresses_[udn] = index < kDevicesPerAddress || netnsOf_ > 0
+                          ? address_
                           : "10.77.0." + std::to_string(10 + index / kDevicesPerAddress);
     descriptions_[path] = descriptionXml;
     return path;
@@ -380,7 +413,7 @@ std::string FakeMediaServers::Location(const std::string& udn) const {
     std::lock_guard<std::mutex> lock(mutex_);
     const auto found = paths_.find(udn);
     const auto address = addresses_.find(udn);
-    return "http://" + (address == addresses_.end() ? kHostAddress : address->second) + ":" +
+    return "http://" + (address == addresses_.end() ? address_ : address->second) + ":" +
            std::to_string(port_) + (found == paths_.end() ? "/none.xml" : found->second);
 }
 

@@ -102,9 +102,13 @@ Process StartRygel(PeerNetwork& peer, const std::string& friendlyName, int port)
 // ephemeral port) and its SSDP NOTIFY datagrams are sent to the multicast group on va (looped
 // back to this host's listeners), for as many devices as the test adds. The first 16 devices
 // announce from 10.77.0.1, the next ones from the host's further addresses 10.77.0.11 to .17.
+// Made with a peer network, it is a host of the LAN instead: its sockets are the peer's (vb,
+// 10.77.0.2, every device announcing from there), so that it is heard only over the link, and
+// whatever happens to this host's addresses leaves it alone.
 class FakeMediaServers {
   public:
     FakeMediaServers();
+    explicit FakeMediaServers(const PeerNetwork& peer);
     ~FakeMediaServers();
     FakeMediaServers(const FakeMediaServers&) = delete;
     FakeMediaServers& operator=(const FakeMediaServers&) = delete;
@@ -128,6 +132,7 @@ class FakeMediaServers {
     int SearchesSeen() const { return searchesSeen_; }
 
   private:
+    void Open();
     void Serve();
     void Notify(const std::string& udn, const char* nts, int maxAgeSeconds);
     void AnswerSearch();
@@ -138,7 +143,9 @@ class FakeMediaServers {
     int SocketFrom(const std::string& address);
     std::string AddressOf(const std::string& udn) const;
 
-    int ssdpFd_ = -1;  // bound to port 1900, member of the SSDP group on va
+    std::string address_ = kHostAddress;  // the host the devices live on
+    pid_t netnsOf_ = 0;                   // its network namespace's process (0: this one)
+    int ssdpFd_ = -1;  // bound to port 1900, member of the SSDP group on the host's interface
     std::atomic<int> searchesSeen_{0};
     std::map<std::string, int> searchAnswers_;  // udn -> max-age
     sockaddr_in lastSearcher_{};

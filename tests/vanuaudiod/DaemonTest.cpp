@@ -3,18 +3,22 @@
 // (MiniDLNA) and scripted media servers over a veth link.
 #include <grp.h>
 #include <gtest/gtest.h>
+#include <net/if.h>
 #include <signal.h>
+#include <sys/ioctl.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <chrono>
 #include <cstdlib>
 #include <cstring>
 #include <future>
 #include <iostream>
+#include <memory>
 #include <thread>
 
 #include "platform/dma/DMABrowse.h"
@@ -977,4 +981,244 @@ TEST_F(AudioDaemon, RygelIsListedUnderItsOwnNameThroughTheCgiAndGoesWithItsByeby
     Process rygel = StartRygel(peer_, "Porch Rygel", 49600);
     ExpectListedUnderItsNameAndGoneAfterItsByebye(rygel, "Porch Rygel", 49600,
                                                   "/tmp/rygel-49600/out.log");
+}
+
+// The faults of a home network on this host's side of the link, with the media servers on a LAN
+// host at the other end (a peer namespace whose devices answer searches): a server is listed
+// after a fault only when the daemon's SSDP reaches the LAN again from where the host is now.
+// Each test prints how long after the fault the server was listed again.
+namespace {
+
+using FaultClock = std::chrono::steady_clock;
+
+// A server of the LAN is listed again within this time of the end of each fault, without the
+// scan button.
+constexpr int kRecoveryBoundMs = 5000;
+// What the LAN's server announces before a fault: short enough to expire while the fault lasts,
+// so that a listing after it is a new finding and not the old entry.
+constexpr int kShortMaxAgeSeconds = 2;
+
+long MsSince(FaultClock::time_point start) {
+    return static_cast<long>(
+        std::chrono::duration_cast<std::chrono::milliseconds>(FaultClock::now() - start).count());
+}
+
+bool HasUdn(const Json::Value& list, const std::string& udn) {
+    for (const Json::Value& server : list) {
+        if (server["udn"].asString() == udn)
+            return true;
+    }
+    return false;
+}
+
+// Whether `udn` is listed (`listed`) or not within `timeoutMs`.
+bool WaitUntilListed(const std::string& udn, bool listed, long timeoutMs) {
+    Json::Value reply;
+    const std::string text =
+        WaitForList([&](const Json::Value& l) { return HasUdn(l, udn) == listed; },
+                    static_cast<int>(std::max(timeoutMs, 0L)));
+    return ParseJson(text, reply) && HasUdn(reply["list"], udn) == listed;
+}
+
+// The LAN's server `udn`, listed from its NOTIFY before the fault.
+void ListBeforeTheFault(FakeMediaServers& lan, const std::string& udn) {
+    lan.Add(udn, FakeMediaServers::DescriptionXml(udn, "LAN Server", "/cd"));
+    lan.Alive(udn, kShortMaxAgeSeconds);
+    ASSERT_TRUE(WaitUntilListed(udn, true, 5000)) << ReadFile("/tmp/vanuaudiod.log");
+}
+
+// During the fault: the server's entry expires, and from now on it answers searches (as every
+// server does; it does not announce again, as a server that did not see the fault would not).
+void ExpireDuringTheFault(FakeMediaServers& lan, const std::string& udn) {
+    ASSERT_TRUE(WaitUntilListed(udn, false, kShortMaxAgeSeconds * 1000 + 3000))
+        << "the entry did not expire during the fault";
+    lan.AnswerSearches(udn, 1800);
+}
+
+// After a fault that ended at `end`: the LAN's server `udn` is listed again within the bound, by
+// the daemon's own search (no button pressed), and the recovery time is printed; then the scan
+// button (command 14) finds a server that answers searches only from then on.
+void ExpectFoundAgainAndByTheScan(FakeMediaServers& lan, const std::string& udn,
+                                  FaultClock::time_point end, const std::string& fault) {
+    const bool listed = WaitUntilListed(udn, true, kRecoveryBoundMs - MsSince(end));
+    const long recoveryMs = MsSince(end);
+    EXPECT_TRUE(listed) << udn << " not listed within " << kRecoveryBoundMs
+                        << " ms of the end of: " << fault
+                        << " (searches heard on the LAN: " << lan.SearchesSeen() << ")\n"
+                        << ReadFile("/tmp/vanuaudiod.log");
+    if (listed)
+        std::cout << "[ recovery ] vanuaudiod, " << fault << ": listed again " << recoveryMs
+                  << " ms after\n";
+    // Past the repeats of the search that found it, so that only the scan can find the next one.
+    std::this_thread::sleep_for(std::chrono::milliseconds(2500));
+    const std::string scanned = "uuid:lan-scanned";
+    lan.Add(scanned, FakeMediaServers::DescriptionXml(scanned, "LAN Scanned", "/cd"));
+    lan.AnswerSearches(scanned, 1800);
+    const int before = lan.SearchesSeen();
+    EXPECT_EQ(Call(14).reply, "{\"success\": true}");
+    EXPECT_TRUE(WaitUntilListed(scanned, true, 5000))
+        << "the scan found nothing after: " << fault << "\n"
+        << ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_GT(lan.SearchesSeen(), before) << "no search reached the LAN after: " << fault;
+}
+
+// The interface's flags as the kernel reports them (IFF_UP, IFF_RUNNING: up with a carrier); 0
+// when it cannot say.
+unsigned InterfaceFlags(const char* interfaceName) {
+    const int fd = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    ifreq request{};
+    std::strncpy(request.ifr_name, interfaceName, IFNAMSIZ - 1);
+    const bool asked = fd >= 0 && ioctl(fd, SIOCGIFFLAGS, &request) == 0;
+    if (fd >= 0)
+        close(fd);
+    return asked ? static_cast<unsigned short>(request.ifr_flags) : 0u;
+}
+
+}  // namespace
+
+// The cable (or the switch port, or the Wi-Fi association) goes and comes back while the
+// interface stays up with its address: GUPnP sees nothing, so the daemon follows the carrier
+// itself, says so in its log, and searches again when it returns.
+TEST_F(AudioDaemon, AfterItsLinkLosesItsCarrierAndGetsItBackALanServerIsListedAgain) {
+    FakeMediaServers lan(peer_);
+    {
+        const ScopedLeakSuppressions suppressions(SourceDir() +
+                                                  "/tests/vanuaudiod/gupnp-link-change.supp");
+        daemon_ = StartDaemon();
+    }
+    ASSERT_NO_FATAL_FAILURE(ListBeforeTheFault(lan, "uuid:lan"));
+    std::this_thread::sleep_for(std::chrono::milliseconds(1500));  // the link in use a while
+    ASSERT_TRUE(peer_.RunOnPeer("ip link set vb down"));
+    for (int waited = 0; (InterfaceFlags(kHostInterface) & IFF_RUNNING) != 0 && waited < 2000;
+         waited += 50)
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    // Up, with its address, and no carrier.
+    ASSERT_EQ(InterfaceFlags(kHostInterface) & (IFF_UP | IFF_RUNNING), unsigned{IFF_UP});
+    ASSERT_NO_FATAL_FAILURE(ExpireDuringTheFault(lan, "uuid:lan"));
+    EXPECT_TRUE(WaitForLog("network: va lost its carrier", 3000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    const auto end = FaultClock::now();
+    ASSERT_TRUE(peer_.RunOnPeer("ip link set vb up && ip route replace 224.0.0.0/4 dev vb"));
+    ExpectFoundAgainAndByTheScan(lan, "uuid:lan", end, "carrier lost for about 4 s");
+    EXPECT_TRUE(WaitForLog("network: va has its carrier again; searching for media servers", 1000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    const std::string log = ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(CountOf(log, "lost its carrier"), 1) << log;
+    EXPECT_EQ(log.find(" gone"), std::string::npos) << "the addresses stayed: " << log;
+}
+
+// Started with its cable out (or its switch still starting): the interface is up with its
+// address, and the search at start reaches no one.
+TEST_F(AudioDaemon, StartedWithoutACarrierItFindsTheLanServersWhenTheLinkComesUp) {
+    FakeMediaServers lan(peer_);
+    lan.Add("uuid:lan", FakeMediaServers::DescriptionXml("uuid:lan", "LAN Server", "/cd"));
+    lan.AnswerSearches("uuid:lan", 1800);
+    ASSERT_TRUE(peer_.RunOnPeer("ip link set vb down"));
+    {
+        const ScopedLeakSuppressions suppressions(SourceDir() +
+                                                  "/tests/vanuaudiod/gupnp-link-change.supp");
+        daemon_ = StartDaemon();
+    }
+    ASSERT_EQ(InterfaceFlags(kHostInterface) & (IFF_UP | IFF_RUNNING), unsigned{IFF_UP});
+    EXPECT_TRUE(WaitForLog("network: va has no carrier; searching again when it has one", 3000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    EXPECT_EQ(Reply(Call(16, "0 10"))["total"], 0);
+    const auto end = FaultClock::now();
+    ASSERT_TRUE(peer_.RunOnPeer("ip link set vb up && ip route replace 224.0.0.0/4 dev vb"));
+    ExpectFoundAgainAndByTheScan(lan, "uuid:lan", end, "no carrier at start, then the link up");
+    EXPECT_TRUE(WaitForLog("network: va has its carrier again; searching for media servers", 1000))
+        << ReadFile("/tmp/vanuaudiod.log");
+}
+
+// As DHCP clients and network managers renew into another address: the new one arrives, then the
+// old one goes (the kernel promotes the secondary, as those hosts have it).
+TEST_F(AudioDaemon, AfterANewAddressIsAddedBeforeTheOldGoesALanServerIsListedAgain) {
+    // One address on the interface, so that the change is the host's only one.
+    ASSERT_TRUE(
+        RunCommand("for n in 11 12 13 14 15 16 17; do ip addr del 10.77.0.$n/24 dev va; "
+                   "done && echo 1 > /proc/sys/net/ipv4/conf/va/promote_secondaries"));
+    FakeMediaServers lan(peer_);
+    daemon_ = StartDaemon();
+    ASSERT_NO_FATAL_FAILURE(ListBeforeTheFault(lan, "uuid:lan"));
+    ASSERT_TRUE(RunCommand("ip addr add 10.77.0.3/24 dev va"));
+    ASSERT_TRUE(WaitForLog("network: searching for media servers on va (10.77.0.3)", 5000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    ASSERT_NO_FATAL_FAILURE(ExpireDuringTheFault(lan, "uuid:lan"));
+    const auto end = FaultClock::now();
+    ASSERT_TRUE(RunCommand("ip addr del 10.77.0.1/24 dev va"));
+    ExpectFoundAgainAndByTheScan(lan, "uuid:lan", end,
+                                 "new address added, then the old one removed");
+    EXPECT_TRUE(WaitForLog("network: va (10.77.0.1) gone", 1000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    const Json::Value list = Reply(Call(16, "0 10"))["list"];
+    ASSERT_EQ(list.size(), 2u) << list;
+    EXPECT_EQ(list[0]["ip"], kPeerAddress);
+}
+
+// The other order: the old address goes first and the interface is without one for a moment.
+TEST_F(AudioDaemon, AfterTheOldAddressGoesBeforeANewOneIsAddedALanServerIsListedAgain) {
+    ASSERT_TRUE(
+        RunCommand("for n in 11 12 13 14 15 16 17; do ip addr del 10.77.0.$n/24 dev va; done"));
+    FakeMediaServers lan(peer_);
+    daemon_ = StartDaemon();
+    ASSERT_NO_FATAL_FAILURE(ListBeforeTheFault(lan, "uuid:lan"));
+    ASSERT_TRUE(RunCommand("ip addr del 10.77.0.1/24 dev va"));
+    ASSERT_TRUE(WaitForLog("network: va (10.77.0.1) gone", 5000))
+        << ReadFile("/tmp/vanuaudiod.log");
+    ASSERT_NO_FATAL_FAILURE(ExpireDuringTheFault(lan, "uuid:lan"));
+    const auto end = FaultClock::now();
+    ASSERT_TRUE(
+        RunCommand("ip addr add 10.77.0.3/24 dev va && ip route replace 224.0.0.0/4 dev va"));
+    ExpectFoundAgainAndByTheScan(lan, "uuid:lan", end, "old address removed, then a new one added");
+    EXPECT_TRUE(WaitForLog("network: searching for media servers on va (10.77.0.3)", 1000))
+        << ReadFile("/tmp/vanuaudiod.log");
+}
+
+// Started at boot before the network: its interface is there, with its address, but down.
+TEST_F(AudioDaemon, StartedWhileItsInterfaceIsDownItFindsTheLanServersWhenItComesUp) {
+    FakeMediaServers lan(peer_);
+    lan.Add("uuid:lan", FakeMediaServers::DescriptionXml("uuid:lan", "LAN Server", "/cd"));
+    lan.AnswerSearches("uuid:lan", 1800);
+    ASSERT_TRUE(RunCommand("ip link set va down"));
+    {
+        const ScopedLeakSuppressions suppressions(SourceDir() +
+                                                  "/tests/vanuaudiod/gupnp-link-change.supp");
+        daemon_ = StartDaemon(kHostInterface, false);
+    }
+    const Json::Value empty = Reply(Call(16, "0 10"));
+    EXPECT_EQ(empty["success"], true);
+    EXPECT_EQ(empty["total"], 0);
+    std::this_thread::sleep_for(std::chrono::seconds(1));
+    const auto end = FaultClock::now();
+    ASSERT_TRUE(RunCommand("ip link set va up && ip route replace 224.0.0.0/4 dev va"));
+    ExpectFoundAgainAndByTheScan(lan, "uuid:lan", end, "interface down at start, then up");
+    EXPECT_TRUE(WaitForLog("network: searching for media servers on va (10.77.0.1)", 1000))
+        << ReadFile("/tmp/vanuaudiod.log");
+}
+
+// Started at boot before the network: its interface does not exist yet (a driver not loaded, a
+// USB adapter plugged in later); the LAN is there when it arrives.
+TEST_F(AudioDaemon, StartedBeforeItsInterfaceExistsItFindsTheLanServersOnceItIsMade) {
+    ASSERT_TRUE(peer_.Unlink());
+    {
+        const ScopedLeakSuppressions suppressions(SourceDir() +
+                                                  "/tests/vanuaudiod/gupnp-link-change.supp");
+        daemon_ = StartDaemon(kHostInterface, false);
+    }
+    const Json::Value empty = Reply(Call(16, "0 10"));
+    EXPECT_EQ(empty["success"], true);
+    EXPECT_EQ(empty["total"], 0);
+    std::this_thread::sleep_for(std::chrono::seconds(1));
+    std::unique_ptr<FakeMediaServers> lan;
+    FaultClock::time_point end;  // when this host's side of the link gets its address
+    ASSERT_TRUE(peer_.Link([&] {
+        lan = std::make_unique<FakeMediaServers>(peer_);
+        lan->Add("uuid:lan", FakeMediaServers::DescriptionXml("uuid:lan", "LAN Server", "/cd"));
+        lan->AnswerSearches("uuid:lan", 1800);
+        end = FaultClock::now();
+    }));
+    ASSERT_NE(lan, nullptr);
+    ExpectFoundAgainAndByTheScan(*lan, "uuid:lan", end, "interface created after the start");
+    EXPECT_TRUE(WaitForLog("network: searching for media servers on va (10.77.0.1)", 1000))
+        << ReadFile("/tmp/vanuaudiod.log");
 }
