@@ -1,6 +1,6 @@
 // The HTTP plugin: one POST with libcurl, with the time limits and the streaming reply of
 // HttpPost.h, and one GET of a media resource (HttpGet.h). Built as a MODULE and loaded on demand
-// (see HttpPost.h for why).
+// (see HttpPost.h for why). The GET speaks HTTPS only when its caller allows it.
 #include <cstdio>
 #include <cstring>
 
@@ -161,7 +161,8 @@ bool ConfigureGet(harmona::curl::Easy& easy, const harmona_http_get_request* req
                   harmona::curl::StringList& headers, GetState& state) {
     bool ok = true;
     ok &= easy.SetOption(CURLOPT_URL, request->url) == CURLE_OK;
-    ok &= easy.SetOption(CURLOPT_PROTOCOLS_STR, "http") == CURLE_OK;
+    ok &= easy.SetOption(CURLOPT_PROTOCOLS_STR, request->allowHttps != 0 ? "http,https" : "http") ==
+          CURLE_OK;
     ok &= easy.SetOption(CURLOPT_FOLLOWLOCATION, 0L) == CURLE_OK;
     ok &= easy.SetOption(CURLOPT_NOPROXY, "*") == CURLE_OK;
     ok &= easy.SetOption(CURLOPT_NOSIGNAL, 1L) == CURLE_OK;
