@@ -365,6 +365,27 @@ TEST_F(RadioDirectory, TuningInNeverFetchesAnAddressFromTheRequest) {
             << request.target;
 }
 
+TEST_F(RadioDirectory, TuningInFromAnotherSiteOrWithoutALoginFetchesNothing) {
+    Configure(kListUrl);
+    Serve(StationList(StationRow("5", "Five", "", "")), Pls("http://198.51.100.20/five"));
+    const std::string query =
+        Query({{"action", "radio_tunein"}, {"node", "inetradio_sc"}, {"station", "5"}});
+    CgiRequest crossSite;
+    crossSite.program = LibraryCgiProgram();
+    crossSite.queryString = query;
+    crossSite.extraEnv["HTTP_SEC_FETCH_SITE"] = "cross-site";
+    CgiRequest anonymous;
+    anonymous.program = LibraryCgiProgram();
+    anonymous.queryString = query;
+    anonymous.hasRemoteUser = false;
+    for (const CgiRequest& request : {crossSite, anonymous}) {
+        const CgiResult r = RunCgi(request);
+        EXPECT_NE(r.Header("Status").find("401"), std::string::npos) << r.output;
+        EXPECT_EQ(r.Header("Location"), "");
+    }
+    EXPECT_TRUE(directory.Requests().empty());
+}
+
 TEST_F(RadioDirectory, TuningInWhenTheDirectoryIsDownSaysSo) {
     Configure("http://127.0.0.1:50079/list.xml");
     ExpectError(TuneIn("inetradio_sc", "5"), "503", "directory_unreachable");
