@@ -22,7 +22,7 @@ struct harmona_http_reply_head {
 typedef int (*harmona_http_head)(void* context, const harmona_http_reply_head* head);
 
 struct harmona_http_get_request {
-    const char* url;             // absolute http:// URL
+    const char* url;             // absolute http:// URL (https:// too with allowHttps)
     const char* const* headers;  // extra request header lines ("Name: value")
     size_t headerCount;
     long connectTimeoutMs;   // no connection within this: failure
@@ -31,6 +31,7 @@ struct harmona_http_get_request {
     harmona_http_head head;  // called once, before the body
     harmona_http_sink sink;  // the body, piece by piece (HttpPost.h)
     void* context;           // passed to head and sink
+    int allowHttps;  // nonzero: https:// URLs too (certificates checked); 0: plain HTTP only
 };
 
 struct harmona_http_get_result {
@@ -41,8 +42,8 @@ struct harmona_http_get_result {
     char error[256];  // why the transfer failed, NUL-terminated
 };
 
-// Sends the GET (plain HTTP, no redirect, no proxy) and streams the reply. 0 when a whole reply
-// arrived (whatever its status), nonzero on any failure.
+// Sends the GET (plain HTTP unless allowHttps, no redirect, no proxy) and streams the reply. 0 when
+// a whole reply arrived (whatever its status), nonzero on any failure.
 typedef int harmona_http_get_fn(const harmona_http_get_request* request,
                                 harmona_http_get_result* result);
 int harmona_http_get(const harmona_http_get_request* request, harmona_http_get_result* result);

@@ -1,6 +1,6 @@
 // The HTTP plugin: one POST with libcurl, with the time limits and the streaming reply of
 // HttpPost.h, and one GET of a media resource (HttpGet.h). Built as a MODULE and loaded on demand
-// (see HttpPost.h for why).
+// (see HttpPost.h for why). The GET speaks HTTPS only when its caller allows it.
 #include <cstdio>
 #include <cstring>
 
@@ -184,6 +184,9 @@ size_t WriteBody(char* data, size_t size, size_t count, void* context) {
 bool ConfigureGet(Session& session, const harmona_http_get_request* request, GetState& state) {
     harmona::curl::Easy& easy = session.easy;
     bool ok = ConfigureShared(session, request, WriteBody, &state);
+    // A radio directory's list may be on https; a media server's resources never are.
+    if (request->allowHttps != 0)
+        ok &= easy.SetOption(CURLOPT_PROTOCOLS_STR, "http,https") == CURLE_OK;
     ok &= easy.SetOption(CURLOPT_HTTPGET, 1L) == CURLE_OK;
     ok &= easy.SetOption(CURLOPT_HTTP_CONTENT_DECODING, 0L) == CURLE_OK;
     // Less than one byte a second for the stall time: the server hangs.

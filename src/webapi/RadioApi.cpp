@@ -6,6 +6,7 @@
 
 #include "platform/radio/RadioStations.h"
 #include "src/webapi/ApiError.h"
+#include "src/webapi/RadioDirectory.h"
 
 namespace harmona::webapi {
 
@@ -13,16 +14,13 @@ namespace {
 
 inline constexpr std::string_view kUserDefinedNode = "inetradio_userdefined";
 inline constexpr std::string_view kFavoriteNode = "inetradio_favorite";
-inline constexpr std::string_view kShoutcastNode = "inetradio_sc";
-inline constexpr std::string_view kRadioIoNode = "inetradio_rio";
 
 inline constexpr std::string_view kAddAction = "radio_add";
 inline constexpr std::string_view kRemoveAction = "radio_remove";
 inline constexpr std::string_view kFavoriteAction = "radio_favorite";
 
-// The errors, with fixed line numbers that log readers match on.
-constexpr ApiError kDirectoryUnreachable{kStatusUnavailable, kSystemSection, kSystemText, 401,
-                                         "directory_unreachable"};
+// The errors, with fixed line numbers that log readers match on (401 and 411 on are the
+// directories', RadioDirectory.cpp).
 constexpr ApiError kStationsUnreadable{kStatusServerError, kSystemSection, kSystemText, 402,
                                        "stations_unreadable"};
 constexpr ApiError kNotPost{kStatusMethodNotAllowed, kSystemSection, kSystemText, 403,
@@ -105,14 +103,13 @@ int ChangeStation(ActionHandler& handler, WebMan& webMan, std::string_view actio
 }  // namespace
 
 bool IsRadioNode(std::string_view node) {
-    return node == kUserDefinedNode || node == kFavoriteNode || node == kShoutcastNode ||
-           node == kRadioIoNode;
+    return node == kUserDefinedNode || node == kFavoriteNode || IsDirectoryNode(node);
 }
 
 int ListRadioNode(ActionHandler& handler, WebMan& webMan, const std::string& node,
                   Json::Value& reply) {
-    if (node == kShoutcastNode || node == kRadioIoNode)
-        return AnswerError(handler, webMan, kDirectoryUnreachable);
+    if (IsDirectoryNode(node))
+        return ListDirectory(handler, webMan, node, reply);
     const radio::StationList list = radio::ReadStations(webMan.GetPreferenceDir());
     if (list.status != radio::ReadStatus::ok)
         return AnswerError(handler, webMan, kStationsUnreadable);
@@ -125,10 +122,14 @@ int ListRadioNode(ActionHandler& handler, WebMan& webMan, const std::string& nod
 }
 
 bool IsRadioAction(std::string_view action) {
-    return action == kAddAction || action == kRemoveAction || action == kFavoriteAction;
+    return action == kAddAction || action == kRemoveAction || action == kFavoriteAction ||
+           action == kTuneInAction;
 }
 
 int ServeRadioAction(ActionHandler& handler, WebMan& webMan, std::string_view action) {
+    // Tuning in changes nothing: the page's audio element asks for it with a GET.
+    if (action == kTuneInAction)
+        return ServeTuneIn(handler, webMan);
     if (!IsPostRequest())
         return AnswerError(handler, webMan, kNotPost);
     if (action == kAddAction)

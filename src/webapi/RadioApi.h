@@ -2,8 +2,9 @@
 // favourites among them as rows the page plays, the changes to them, and the directory sources.
 //   action=list&node=inetradio_userdefined      the user's stations, in the order they were added
 //   action=list&node=inetradio_favorite         those marked as favourites
-//   action=list&node=inetradio_sc|inetradio_rio 503 "directory_unreachable": these directories are
-//                                               on the internet and no client for them is built in
+//   action=list&node=inetradio_sc|inetradio_rio the stations of a directory on the network
+//   action=radio_tunein&node=&station=          302 to a directory station's stream
+//                                               (both in RadioDirectory.h)
 //   POST action=radio_add&name=&url=            adds a station; {"station": row}
 //   POST action=radio_remove&station=<id>       removes one
 //   POST action=radio_favorite&station=<id>&favorite=1|0

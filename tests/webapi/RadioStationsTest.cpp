@@ -260,6 +260,10 @@ TEST_F(RadioStations, AStationsPathThatCannotBeReadGivesAnErrorNotAnEmptyList) {
 }
 
 TEST_F(RadioStations, DirectorySourcesOnTheInternetSayTheyCannotBeReached) {
+    // Their lists are set to addresses where nobody listens.
+    WriteFile(kAudioConf,
+              "radio_shoutcast_list=http://127.0.0.1:9/sc.xml\n"
+              "radio_radioio_list=http://127.0.0.1:9/rio.xml\n");
     for (const char* node : {"inetradio_sc", "inetradio_rio"}) {
         const CgiResult r = ListNode(node);
         ExpectError(r, "503", "directory_unreachable");

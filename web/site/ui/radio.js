@@ -1,7 +1,8 @@
 // Internet radio in the pane: the user's own stations ("User Defined") and favourites, listed by
 // webapi/library.cgi and played by the pane's player straight from the station (each row's "url");
-// a form to add a station, and per station a favourite mark and a remove button. The directory
-// sources on the internet say so in the pane when library.cgi cannot reach them.
+// a form to add a station, and per station a favourite mark and a remove button. A station
+// directory's rows come from library.cgi too and play through its tune-in (each row's "url"); when a
+// directory has no list (not set up, out of reach, an unreadable reply) the pane's notice says why.
 const API = "webapi/library.cgi";
 const USER_DEFINED = "inetradio_userdefined";
 const FAVORITES = "inetradio_favorite";

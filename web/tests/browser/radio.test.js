@@ -5,7 +5,7 @@
 import { test, before, after } from "node:test";
 import assert from "node:assert/strict";
 import { createServer } from "node:http";
-import { existsSync, readFileSync } from "node:fs";
+import { existsSync, readFileSync, rmSync, writeFileSync } from "node:fs";
 import { launch, close, openTree, item, screenshot } from "./harness.js";
 
 let browser;
@@ -120,7 +120,12 @@ test("a URL that is not http or https is refused in the user's language and noth
   assert.deepEqual(page.problems.filter((p) => !p.includes("400")), []);
 });
 
-test("the directory sources on the internet say in the pane that they cannot be reached", async () => {
+test("the directory sources on the internet say in the pane that they cannot be reached", async (t) => {
+  // Their station lists are set to an address where nobody listens.
+  const conf = "/var/packages/Harmona/etc/audio.conf";
+  const saved = existsSync(conf) ? readFileSync(conf, "utf8") : null;
+  writeFileSync(conf, "radio_shoutcast_list=http://127.0.0.1:9/sc.xml\nradio_radioio_list=http://127.0.0.1:9/rio.xml\n");
+  t.after(() => (saved === null ? rmSync(conf, { force: true }) : writeFileSync(conf, saved)));
   const page = await openTree(browser, "demo");
   for (const id of ["inetradio_sc", "inetradio_rio"]) {
     await item(page, id).locator(":scope > .row .label").click();

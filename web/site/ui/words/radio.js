@@ -14,6 +14,8 @@ export const RADIO_WORDS = {
     radio_stations_full: "You have 500 stations already. Remove one first.",
     radio_stations_unwritable: "Your stations could not be saved. Please try again later.",
     radio_stations_unreadable: "Your stations could not be read.",
+    radio_directory_not_configured: "This station directory is not set up. The owner can set the address of its station list in the settings (audio.conf).",
+    radio_directory_invalid: "This station directory answered with something that is not a station list it can read.",
   },
   ger: {
     radioName: "Name des Senders", radioUrl: "Stream-URL (http:// oder https://)", radioAdd: "Sender hinzufügen",
@@ -28,6 +30,8 @@ export const RADIO_WORDS = {
     radio_stations_full: "Sie haben bereits 500 Sender. Entfernen Sie zuerst einen.",
     radio_stations_unwritable: "Ihre Sender konnten nicht gespeichert werden. Bitte versuchen Sie es später erneut.",
     radio_stations_unreadable: "Ihre Sender konnten nicht gelesen werden.",
+    radio_directory_not_configured: "Dieses Senderverzeichnis ist nicht eingerichtet. Der Besitzer kann die Adresse seiner Senderliste in den Einstellungen (audio.conf) festlegen.",
+    radio_directory_invalid: "Dieses Senderverzeichnis hat mit etwas geantwortet, das keine lesbare Senderliste ist.",
   },
   fre: {
     radioName: "Nom de la station", radioUrl: "URL du flux (http:// ou https://)", radioAdd: "Ajouter la station",
@@ -42,6 +46,8 @@ export const RADIO_WORDS = {
     radio_stations_full: "Vous avez déjà 500 stations. Supprimez-en une d'abord.",
     radio_stations_unwritable: "Vos stations n'ont pas pu être enregistrées. Veuillez réessayer plus tard.",
     radio_stations_unreadable: "Vos stations n'ont pas pu être lues.",
+    radio_directory_not_configured: "Cet annuaire de stations n'est pas configuré. Le propriétaire peut définir l'adresse de sa liste de stations dans les réglages (audio.conf).",
+    radio_directory_invalid: "Cet annuaire de stations a répondu par autre chose qu'une liste de stations lisible.",
   },
   spn: {
     radioName: "Nombre de la emisora", radioUrl: "URL del flujo (http:// o https://)", radioAdd: "Añadir emisora",
@@ -56,6 +62,8 @@ export const RADIO_WORDS = {
     radio_stations_full: "Ya tiene 500 emisoras. Elimine una primero.",
     radio_stations_unwritable: "No se han podido guardar sus emisoras. Inténtelo de nuevo más tarde.",
     radio_stations_unreadable: "No se han podido leer sus emisoras.",
+    radio_directory_not_configured: "Este directorio de emisoras no está configurado. El propietario puede indicar la dirección de su lista de emisoras en los ajustes (audio.conf).",
+    radio_directory_invalid: "Este directorio de emisoras ha respondido con algo que no es una lista de emisoras legible.",
   },
   ita: {
     radioName: "Nome della stazione", radioUrl: "URL del flusso (http:// o https://)", radioAdd: "Aggiungi stazione",
@@ -70,6 +78,8 @@ export const RADIO_WORDS = {
     radio_stations_full: "Ci sono già 500 stazioni. Rimuoverne prima una.",
     radio_stations_unwritable: "Impossibile salvare le stazioni. Riprovare più tardi.",
     radio_stations_unreadable: "Impossibile leggere le stazioni.",
+    radio_directory_not_configured: "Questo elenco di stazioni non è configurato. Il proprietario può impostare l'indirizzo dell'elenco nelle impostazioni (audio.conf).",
+    radio_directory_invalid: "Questo elenco di stazioni ha risposto con qualcosa che non è un elenco di stazioni leggibile.",
   },
   jpn: {
     radioName: "局名", radioUrl: "ストリーム URL (http:// または https://)", radioAdd: "局を追加",
@@ -84,6 +94,8 @@ export const RADIO_WORDS = {
     radio_stations_full: "局はすでに 500 あります。先に 1 つ削除してください。",
     radio_stations_unwritable: "局を保存できませんでした。しばらくしてからもう一度お試しください。",
     radio_stations_unreadable: "局を読み込めませんでした。",
+    radio_directory_not_configured: "この局ディレクトリは設定されていません。所有者が設定 (audio.conf) で局リストのアドレスを指定できます。",
+    radio_directory_invalid: "この局ディレクトリの応答は、読み取れる局リストではありませんでした。",
   },
   chs: {
     radioName: "电台名称", radioUrl: "流 URL (http:// 或 https://)", radioAdd: "添加电台",
@@ -98,6 +110,8 @@ export const RADIO_WORDS = {
     radio_stations_full: "您已有 500 个电台。请先删除一个。",
     radio_stations_unwritable: "无法保存您的电台。请稍后再试。",
     radio_stations_unreadable: "无法读取您的电台。",
+    radio_directory_not_configured: "此电台目录尚未设置。所有者可以在设置 (audio.conf) 中指定其电台列表的地址。",
+    radio_directory_invalid: "此电台目录的应答不是可读取的电台列表。",
   },
   cht: {
     radioName: "電台名稱", radioUrl: "串流 URL (http:// 或 https://)", radioAdd: "新增電台",
@@ -112,5 +126,7 @@ export const RADIO_WORDS = {
     radio_stations_full: "您已有 500 個電台。請先移除一個。",
     radio_stations_unwritable: "無法儲存您的電台。請稍後再試。",
     radio_stations_unreadable: "無法讀取您的電台。",
+    radio_directory_not_configured: "此電台目錄尚未設定。擁有者可以在設定 (audio.conf) 中指定其電台清單的位址。",
+    radio_directory_invalid: "此電台目錄的回應不是可讀取的電台清單。",
   },
 };
