@@ -89,6 +89,9 @@ fetch_all() {  # page size (0: as many as the server gives) -> requests
 }
 
 echo "server pid $server, VmRSS at start $(rss) KiB (peak $(hwm) KiB)"
+for p in $mediad $(pgrep -P "$mediad"); do
+    echo "-- Pss of process $p ($(tr '\0' ' ' </proc/$p/cmdline | cut -c1-40)): $(awk '/^Pss:/ {print $2}' /proc/$p/smaps_rollup) KiB; $(pss_by_kind "$p")"
+done
 malloc_stats start
 for pass in $(seq 1 "$passes"); do
     whole=$(fetch_all 0)

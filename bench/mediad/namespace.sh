@@ -38,3 +38,25 @@ private_packages() {
     done
     mkdir -p /var/packages
 }
+
+# Where a process's Pss is (KiB), from /proc/<pid>/smaps: its heap (the [heap] mapping and anonymous
+# mappings other than thread stacks, which hold the allocator's arenas and its mapped blocks), its
+# stacks (the main thread's and the anonymous mappings below a guard page, as threads get them),
+# the libraries and other files it maps, and the rest ([vdso] and the like).
+pss_by_kind() {  # pid
+    awk '
+        /^[0-9a-f]+-[0-9a-f]+ / {
+            split($1, range, "-"); perms = $2; name = $6
+            if (name == "[heap]") kind = "heap"
+            else if (name == "[stack]") kind = "stacks"
+            else if (name ~ /^\//) kind = "files"
+            else if (name == "") kind = (range[1] == guardEnd ? "stacks" : "heap")
+            else kind = "other"
+            if (perms == "---p" && name == "") guardEnd = range[2]; else guardEnd = ""
+            next
+        }
+        /^Pss:/ { pss[kind] += $2 }
+        END {
+            printf "heap %d, stacks %d, files %d, other %d KiB\n", pss["heap"], pss["stacks"], pss["files"], pss["other"]
+        }' "/proc/$1/smaps"
+}

@@ -82,12 +82,14 @@ struct SortValues {
 SortValues ValuesOf(const LibraryView& view, const ViewChild& child) {
     if (child.track) {
         const ViewTrack& track = view.tracks()[child.index];
-        return {view.Text(track.title), view.Text(track.artist), view.Text(track.album),
-                track.trackNo, track.year};
+        const TrackNumbers numbers = view.Numbers(track);
+        return {view.Text(track.title), view.Text(track.artist), view.AlbumOf(track),
+                numbers.trackNo, numbers.year};
     }
     const ViewContainer& container = view.containers()[child.index];
     return {view.Text(container.title), view.Text(container.artist),
-            container.album() ? view.Text(container.title) : std::string_view(), 0, container.year};
+            container.album() ? view.Text(container.title) : std::string_view(), 0,
+            view.YearOf(container)};
 }
 
 int CompareBy(SortKey key, const SortValues& a, const SortValues& b) {
@@ -139,8 +141,9 @@ void AppendTrackIn(std::string& out, const LibraryView& view, uint32_t container
                    const ViewTrack& track, std::string_view mediaBase) {
     const std::string containerId(view.Text(view.containers()[container].id));
     const bool own = container == view.allMusic();
-    AppendItemStart(out, TrackIdIn(containerId, track.id), containerId,
-                    own ? std::string() : TrackId(track.id));
+    const int64_t id = view.IdOf(track);
+    AppendItemStart(out, TrackIdIn(containerId, id), containerId,
+                    own ? std::string() : TrackId(id));
     view.AppendTrackBody(out, track, mediaBase);
     out += kItemEnd;
 }
@@ -339,13 +342,18 @@ std::shared_ptr<const LibraryView> ContentDirectory::CurrentView() const {
             return view_;
     }
     std::shared_ptr<const LibraryView> fresh = LibraryView::Load(dbPath_, sharePath_);
+    if (!fresh)
+        return nullptr;  // tried again on the next call
+    // Only the thread that holds loadMutex_ changes view_ and loaded_: read here without mutex_,
+    // so that requests answered from the last view meanwhile do not wait for the comparison.
+    const bool changed = loaded_ && view_ && fresh->updateId() != view_->updateId();
+    const std::string changedContainers =
+        changed ? fresh->ChangedContainers(view_.get(), kMaxContainerUpdates) : std::string();
     std::shared_ptr<const LibraryView> before;
     {
         std::lock_guard<std::mutex> lock(mutex_);
-        if (!fresh)
-            return nullptr;  // tried again on the next call
-        if (loaded_ && view_ && fresh->updateId() != view_->updateId())
-            containerUpdateIds_ = fresh->ChangedContainers(view_.get(), kMaxContainerUpdates);
+        if (changed)
+            containerUpdateIds_ = changedContainers;
         before = std::move(view_);
         view_ = fresh;
         stamp_ = now;

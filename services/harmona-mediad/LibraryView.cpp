@@ -10,6 +10,9 @@
 
 namespace harmona::mediad {
 
+static_assert(sizeof(ViewTrack) == 52, "a track of the view takes 52 bytes");
+static_assert(sizeof(ViewContainer) == 48, "a container of the view takes 48 bytes");
+
 int CompareNoCase(std::string_view a, std::string_view b) {
     const std::size_t common = std::min(a.size(), b.size());
     for (std::size_t i = 0; i < common; ++i) {
@@ -79,49 +82,76 @@ void LibraryView::AppendContainerElement(std::string& out, uint32_t index,
     fields.childCount = container.childCount;
     if (container.album()) {
         fields.artist = Text(container.artist);
-        fields.year = container.year;
+        fields.year = YearOf(container);
     }
-    fields.artTrack = container.artTrack;
+    fields.artTrack = ArtTrackOf(container);
     fields.artExtension = ArtExtension(container.art);
     AppendContainer(out, fields, mediaBase);
+}
+
+TrackNumbers LibraryView::Numbers(const ViewTrack& track) const {
+    if (track.wide()) {
+        const auto index = static_cast<uint32_t>(&track - tracks_.data());
+        const auto found = std::lower_bound(wideNumbers_.begin(), wideNumbers_.end(), index,
+                                            [](const std::pair<uint32_t, TrackNumbers>& entry,
+                                               uint32_t x) { return entry.first < x; });
+        if (found != wideNumbers_.end() && found->first == index)
+            return found->second;
+    }
+    TrackNumbers numbers;
+    numbers.id = track.id;
+    numbers.year = track.year;
+    numbers.trackNo = track.trackNo;
+    numbers.durationMs = track.durationMs;
+    numbers.size = static_cast<int64_t>(track.sizePlusOne) - 1;
+    numbers.fileType = track.fileType;
+    return numbers;
 }
 
 const ViewTrack* LibraryView::FindTrack(int64_t id) const {
     const auto found =
         std::lower_bound(tracks_.begin(), tracks_.end(), id,
-                         [](const ViewTrack& track, int64_t x) { return track.id < x; });
-    return found == tracks_.end() || found->id != id ? nullptr : &*found;
+                         [this](const ViewTrack& track, int64_t x) { return IdOf(track) < x; });
+    return found == tracks_.end() || IdOf(*found) != id ? nullptr : &*found;
 }
 
 void LibraryView::AppendTrackBody(std::string& out, const ViewTrack& track,
                                   std::string_view mediaBase) const {
+    const TrackNumbers numbers = Numbers(track);
     TrackFields fields;
-    fields.id = track.id;
+    fields.id = numbers.id;
     fields.title = Text(track.title);
     fields.artist = Text(track.artist);
-    fields.album = Text(track.album);
-    fields.genre = Text(track.genre);
-    fields.year = track.year;
-    fields.trackNo = track.trackNo;
-    fields.durationMs = track.durationMs;
-    fields.size = track.size;
-    const ViewFileType& type = fileTypes_[track.fileType];
+    fields.album = AlbumOf(track);
+    fields.genre = GenreOf(track);
+    fields.year = numbers.year;
+    fields.trackNo = numbers.trackNo;
+    fields.durationMs = numbers.durationMs;
+    fields.size = numbers.size;
+    const ViewFileType& type = fileTypes_[numbers.fileType];
     fields.protocolInfo = type.protocolInfo;
     fields.streamExtension = type.streamExtension;
     fields.artExtension = ArtExtension(track.art);
     AppendTrackItemBody(out, fields, mediaBase);
 }
 
+// An album's containers in "Albums", "Album Artists" and "Latest Albums" have the same title and
+// artist, each text kept once in the view: the same references.
 bool LibraryView::Lists(uint32_t container, const ViewTrack& track) const {
     if (container == kNoIndex)
         return false;
     if (container == allMusic_)
         return true;
     if (container == random_)
-        return track.inRandom;
-    return container == track.folderIn || container == track.albumIn ||
-           container == track.artistAlbumIn || container == track.latestAlbumIn ||
-           container == track.genreIn;
+        return track.inRandom();
+    if (container == track.folderIn || container == track.albumIn || container == track.genreIn)
+        return true;
+    if (track.albumIn == kNoIndex || !containers_[container].album())
+        return false;
+    const ViewContainer& album = containers_[track.albumIn];
+    const ViewContainer& other = containers_[container];
+    return other.title.offset == album.title.offset && other.title.size == album.title.size &&
+           other.artist.offset == album.artist.offset && other.artist.size == album.artist.size;
 }
 
 }  // namespace harmona::mediad

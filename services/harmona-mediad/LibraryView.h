@@ -12,6 +12,7 @@
 #include <memory>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "services/harmona-mediad/LibraryReader.h"
@@ -33,16 +34,31 @@ struct ViewFileType {
 // The extension of art's URL ("png", "jpg"; "" for none).
 std::string_view ArtExtension(TrackArt art);
 
+// 52 bytes: the numbers as narrow as real tags and files have them. A track whose id, year,
+// number, duration, size or file type does not fit is marked wide, and LibraryView keeps its
+// numbers as read.
+// Its album and genre are the titles of the containers that list it (albumIn, genreIn).
 struct ViewTrack {
-    int64_t id = 0;
-    TextRef title, artist, album, genre;  // as indexed
-    int64_t year = 0, trackNo = 0, durationMs = 0, size = -1;
-    // The containers that list this track (kNoIndex when none).
-    uint32_t folderIn = kNoIndex, albumIn = kNoIndex, artistAlbumIn = kNoIndex,
-             latestAlbumIn = kNoIndex, genreIn = kNoIndex;
-    uint32_t fileType = 0;  // into LibraryView::fileTypes
+    uint32_t id = 0;
+    TextRef title, artist;  // as indexed
+    int32_t year = 0, trackNo = 0, durationMs = 0;
+    uint32_t sizePlusOne = 0;  // 0: the size is not known
+    // The containers that list this track (kNoIndex when none): its folder, its album in
+    // "Albums" (the same album in "Album Artists" and "Latest Albums" has the same title and
+    // artist), its genre.
+    uint32_t folderIn = kNoIndex, albumIn = kNoIndex, genreIn = kNoIndex;
+    uint16_t fileType = 0;  // into LibraryView::fileTypes
     TrackArt art = TrackArt::none;
-    bool inRandom = false;
+    uint8_t flags = 0;
+    static constexpr uint8_t kInRandom = 1, kWide = 2;
+    bool inRandom() const { return (flags & kInRandom) != 0; }
+    bool wide() const { return (flags & kWide) != 0; }
+};
+
+// A track's numbers as library.db has them, and its file type.
+struct TrackNumbers {
+    int64_t id = 0, year = 0, trackNo = 0, durationMs = 0, size = -1;
+    uint32_t fileType = 0;
 };
 
 // Four bytes: every track is a child of several containers.
@@ -54,17 +70,17 @@ struct ViewChild {
 // What a container is, which names its upnp:class.
 enum class ContainerKind : uint8_t { folder, album, artist, genre };
 
+// 48 bytes. An album's year and art are those of two of its tracks (by index).
 struct ViewContainer {
     TextRef id, title;
     TextRef artist;              // albums: the album artist
     uint32_t parent = kNoIndex;  // kNoIndex: the root, whose parentID is "-1"
     uint32_t firstChild = 0;     // into LibraryView's children, in the default order
     uint32_t childCount = 0;
+    uint32_t yearTrack = kNoIndex;  // albums: the track of the latest year (kNoIndex: none past 0)
+    uint32_t artTrack = kNoIndex;   // albums: the track whose art is the album's
     ContainerKind kind = ContainerKind::folder;
     TrackArt art = TrackArt::none;  // albums: the art of track artTrack
-    int64_t year = 0;               // albums: the latest year of their tracks
-    int64_t artTrack = 0;
-    uint64_t contentHash = 0;  // of the children and their metadata: what GENA reports
     bool album() const { return kind == ContainerKind::album; }
 };
 
@@ -80,6 +96,24 @@ class LibraryView {
     const std::vector<ViewContainer>& containers() const { return containers_; }
     const std::vector<ViewTrack>& tracks() const { return tracks_; }
     const std::vector<ViewFileType>& fileTypes() const { return fileTypes_; }
+    TrackNumbers Numbers(const ViewTrack& track) const;
+    int64_t IdOf(const ViewTrack& track) const {
+        return track.wide() ? Numbers(track).id : static_cast<int64_t>(track.id);
+    }
+    std::string_view AlbumOf(const ViewTrack& track) const {
+        return track.albumIn == kNoIndex ? std::string_view()
+                                         : Text(containers_[track.albumIn].title);
+    }
+    int64_t YearOf(const ViewContainer& container) const {
+        return container.yearTrack == kNoIndex ? 0 : Numbers(tracks_[container.yearTrack]).year;
+    }
+    int64_t ArtTrackOf(const ViewContainer& container) const {
+        return container.artTrack == kNoIndex ? 0 : IdOf(tracks_[container.artTrack]);
+    }
+    std::string_view GenreOf(const ViewTrack& track) const {
+        return track.genreIn == kNoIndex ? std::string_view()
+                                         : Text(containers_[track.genreIn].title);
+    }
     std::string_view Text(TextRef ref) const {
         return std::string_view(text_).substr(ref.offset, ref.size);
     }
@@ -106,6 +140,9 @@ class LibraryView {
     // "id,updateId,..." of the containers that are new or whose content differs from `previous`
     // (at most `limit` of them, the higher ones in the tree first); "" when none did.
     std::string ChangedContainers(const LibraryView* previous, std::size_t limit) const;
+    // A hash of each container's content (its children and their metadata), by index: made
+    // when a library change is compared, not kept.
+    std::vector<uint64_t> ContentHashes() const;
 
   private:
     friend class LibraryViewBuilder;
@@ -113,6 +150,8 @@ class LibraryView {
     uint64_t serial_ = 0;
     std::vector<ViewContainer> containers_;
     std::vector<ViewTrack> tracks_;  // by id
+    // The numbers of the wide tracks, by their index in tracks_.
+    std::vector<std::pair<uint32_t, TrackNumbers>> wideNumbers_;
     std::vector<ViewFileType> fileTypes_;
     std::string text_;
     std::vector<ViewChild> children_;       // of every container, one after the other

@@ -88,15 +88,24 @@ void LibraryViewBuilder::Build() {
     for (std::size_t i = 0; i < rows_.size(); ++i) {
         const LibraryRow& row = rows_[i];
         ViewTrack& track = view_.tracks_[i];
-        track.id = row.id;
         track.title = AddText(R(row.title));
         track.artist = SharedText(R(row.artist));
-        track.album = SharedText(R(row.album));
-        track.genre = SharedText(R(row.genre));
-        track.year = row.year;
-        track.trackNo = row.trackNo;
-        track.durationMs = row.durationMs;
-        track.size = row.size;
+        const auto fits = [](int64_t n) { return n >= INT32_MIN && n <= INT32_MAX; };
+        if (row.id >= 0 && row.id <= UINT32_MAX && fits(row.year) && fits(row.trackNo) &&
+            fits(row.durationMs) && row.size >= -1 && row.size < UINT32_MAX &&
+            row.fileType <= UINT16_MAX) {
+            track.id = static_cast<uint32_t>(row.id);
+            track.year = static_cast<int32_t>(row.year);
+            track.trackNo = static_cast<int32_t>(row.trackNo);
+            track.durationMs = static_cast<int32_t>(row.durationMs);
+            track.sizePlusOne = static_cast<uint32_t>(row.size + 1);
+            track.fileType = static_cast<uint16_t>(row.fileType);
+        } else {
+            track.flags |= ViewTrack::kWide;
+            view_.wideNumbers_.emplace_back(static_cast<uint32_t>(i),
+                                            TrackNumbers{row.id, row.year, row.trackNo,
+                                                         row.durationMs, row.size, row.fileType});
+        }
     }
     TypeTracks();
     RankTitles();
@@ -119,7 +128,6 @@ void LibraryViewBuilder::Build() {
     view_.text_.shrink_to_fit();
     FlattenChildren();
     IndexContainers();
-    HashContents();
 }
 
 TextRef LibraryViewBuilder::AddText(std::string_view text) {
@@ -245,14 +253,18 @@ void LibraryViewBuilder::BuildAlbums() {
         const std::string albumArtist(R(row.albumArtist.size != 0 ? row.albumArtist : row.artist));
         const auto [it, added] = byKey.emplace(std::make_pair(name, albumArtist), albums_.size());
         if (added)
-            albums_.push_back(LibraryAlbum{name, albumArtist, {}, 0, 0, TrackArt::none, 0});
+            albums_.push_back(
+                LibraryAlbum{name, albumArtist, {}, 0, 0, kNoIndex, TrackArt::none, kNoIndex});
         LibraryAlbum& album = albums_[it->second];
         album.tracks.push_back(i);
-        album.year = std::max(album.year, row.year);
+        if (row.year > album.year) {
+            album.year = row.year;
+            album.yearTrack = i;
+        }
         album.latestAdded = std::max(album.latestAdded, row.added);
         if (album.art == TrackArt::none && row.art != TrackArt::none) {
             album.art = row.art;
-            album.artTrack = row.id;
+            album.artTrack = i;
         }
     }
     std::vector<uint32_t> order(albums_.size());
@@ -266,23 +278,24 @@ void LibraryViewBuilder::BuildAlbums() {
         SortTracks(album.tracks, true);
 
     const auto addAlbum = [&](const LibraryAlbum& album, const std::string& id, uint32_t parent,
-                              uint32_t ViewTrack::*in) {
+                              bool listsTracks) {
         const uint32_t index = AddContainer(id, parent, album.name, ContainerKind::album);
         ViewContainer& container = view_.containers_[index];
         container.artist = SharedText(album.albumArtist);
-        container.year = album.year;
+        container.yearTrack = album.yearTrack;
         if (album.art != TrackArt::none) {
             container.art = album.art;
             container.artTrack = album.artTrack;
         }
         AddChild(parent, {index, false});
         AddTrackChildren(index, album.tracks);
-        for (const uint32_t track : album.tracks)
-            view_.tracks_[track].*in = index;
+        if (listsTracks) {
+            for (const uint32_t track : album.tracks)
+                view_.tracks_[track].albumIn = index;
+        }
     };
     for (const uint32_t a : order)
-        addAlbum(albums_[a], AlbumId(albums_[a].albumArtist, albums_[a].name), category_[2],
-                 &ViewTrack::albumIn);
+        addAlbum(albums_[a], AlbumId(albums_[a].albumArtist, albums_[a].name), category_[2], true);
 
     // Album artists, each with its albums; albums without an album artist belong to none.
     std::map<std::string, std::vector<uint32_t>> byArtist;
@@ -303,7 +316,7 @@ void LibraryViewBuilder::BuildAlbums() {
         AddChild(category_[3], {index, false});
         for (const uint32_t a : artist->second)
             addAlbum(albums_[a], ArtistAlbumId(albums_[a].albumArtist, albums_[a].name), index,
-                     &ViewTrack::artistAlbumIn);
+                     false);
     }
 
     std::vector<uint32_t> latest = order;
@@ -313,7 +326,7 @@ void LibraryViewBuilder::BuildAlbums() {
     latest.resize(std::min(latest.size(), kLatestAlbumCount));
     for (const uint32_t a : latest)
         addAlbum(albums_[a], LatestAlbumId(albums_[a].albumArtist, albums_[a].name), category_[6],
-                 &ViewTrack::latestAlbumIn);
+                 false);
 }
 
 void LibraryViewBuilder::BuildGenres() {
@@ -352,7 +365,7 @@ void LibraryViewBuilder::BuildAllMusicAndRandom() {
     for (std::size_t i = 0; i < count; ++i) {
         const std::size_t pick = i + SplitMix(state) % (drawn.size() - i);
         std::swap(drawn[i], drawn[pick]);
-        view_.tracks_[drawn[i]].inRandom = true;
+        view_.tracks_[drawn[i]].flags |= ViewTrack::kInRandom;
     }
     drawn.resize(count);
     AddTrackChildren(category_[5], drawn);

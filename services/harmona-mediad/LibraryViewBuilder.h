@@ -22,8 +22,9 @@ struct LibraryAlbum {
     std::string name, albumArtist;
     std::vector<uint32_t> tracks;
     int64_t year = 0, latestAdded = 0;
+    uint32_t yearTrack = kNoIndex;  // the first track of that year (kNoIndex while it is 0)
     TrackArt art = TrackArt::none;  // of its first track that has one
-    int64_t artTrack = 0;
+    uint32_t artTrack = kNoIndex;
 };
 
 // The folder of every track in the share, gathered while library.db gives the paths in their
@@ -88,7 +89,6 @@ class LibraryViewBuilder {
     void TypeTracks();
     void IndexContainers();
     // Content hashes (LibraryViewChanges.cpp); after the rendering, which they cover.
-    void HashContents();
 
     LibraryView& view_;
     std::vector<LibraryRow> rows_;

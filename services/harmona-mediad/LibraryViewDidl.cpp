@@ -17,10 +17,8 @@ void LibraryViewBuilder::TypeTracks() {
             medialib::StreamExtensionOf(path)});
     }
     std::vector<std::string>().swap(typePaths_);
-    for (std::size_t i = 0; i < rows_.size(); ++i) {
-        view_.tracks_[i].fileType = rows_[i].fileType;
+    for (std::size_t i = 0; i < rows_.size(); ++i)
         view_.tracks_[i].art = rows_[i].art;
-    }
 }
 
 // Ids in byte order, the first of equal ids first (there are none: every id names one object).

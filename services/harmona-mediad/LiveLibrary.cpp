@@ -43,6 +43,70 @@ int MillisecondsUntil(Clock::time_point now, Clock::time_point when) {
 
 }  // namespace
 
+std::vector<FolderWatches::Entry>::iterator FolderWatches::Lookup(int wd) {
+    const auto found = std::lower_bound(entries_.begin(), entries_.end(), wd,
+                                        [](const Entry& entry, int x) { return entry.wd < x; });
+    return found != entries_.end() && found->wd == wd ? found : entries_.end();
+}
+
+void FolderWatches::Set(int wd, std::string_view folder) {
+    auto found = Lookup(wd);
+    if (found == entries_.end()) {
+        const auto at = std::lower_bound(entries_.begin(), entries_.end(), wd,
+                                         [](const Entry& entry, int x) { return entry.wd < x; });
+        found = entries_.insert(at, Entry{wd, kErased, 0});
+    }
+    if (found->offset != kErased) {
+        liveText_ -= found->size;
+        --live_;
+    }
+    found->offset = static_cast<uint32_t>(text_.size());
+    found->size = static_cast<uint32_t>(folder.size());
+    text_ += folder;
+    liveText_ += folder.size();
+    ++live_;
+}
+
+bool FolderWatches::Find(int wd, std::string* folder) const {
+    const auto found = const_cast<FolderWatches*>(this)->Lookup(wd);
+    if (found == entries_.end() || found->offset == kErased)
+        return false;
+    folder->assign(text_, found->offset, found->size);
+    return true;
+}
+
+void FolderWatches::Erase(int wd) {
+    const auto found = Lookup(wd);
+    if (found == entries_.end() || found->offset == kErased)
+        return;
+    liveText_ -= found->size;
+    --live_;
+    found->offset = kErased;
+    if (entries_.size() - live_ > live_ || text_.size() - liveText_ > liveText_ + 4096)
+        Compact();
+}
+
+void FolderWatches::Clear() {
+    std::vector<Entry>().swap(entries_);
+    std::string().swap(text_);
+    live_ = liveText_ = 0;
+}
+
+void FolderWatches::Compact() {
+    std::vector<Entry> entries;
+    entries.reserve(live_);
+    std::string text;
+    text.reserve(liveText_);
+    for (const Entry& entry : entries_) {
+        if (entry.offset == kErased)
+            continue;
+        entries.push_back(Entry{entry.wd, static_cast<uint32_t>(text.size()), entry.size});
+        text.append(text_, entry.offset, entry.size);
+    }
+    entries_.swap(entries);
+    text_.swap(text);
+}
+
 LiveLibrary::LiveLibrary(LiveLibraryOptions options) : options_(std::move(options)) {}
 
 LiveLibrary::~LiveLibrary() {
@@ -77,7 +141,7 @@ void LiveLibrary::Stop() {
     inotifyFd_.Reset();
     wakeFd_.Reset();
     std::lock_guard<std::mutex> lock(watchesMutex_);
-    watches_.clear();
+    watches_.Clear();
 }
 
 std::size_t LiveLibrary::watchedFolders() const {
@@ -145,7 +209,7 @@ void LiveLibrary::ReadEvents() {
             }
             if ((event->mask & IN_IGNORED) != 0) {
                 std::lock_guard<std::mutex> lock(watchesMutex_);
-                watches_.erase(event->wd);
+                watches_.Erase(event->wd);
                 continue;
             }
             const char* name = event->len > 0 ? event->name : "";
@@ -153,15 +217,14 @@ void LiveLibrary::ReadEvents() {
                 continue;
             changed = true;
             if ((event->mask & IN_ISDIR) != 0 && (event->mask & (IN_CREATE | IN_MOVED_TO)) != 0) {
-                std::string parent;
+                std::string relative;
+                bool watched;
                 {
                     std::lock_guard<std::mutex> lock(watchesMutex_);
-                    const auto found = watches_.find(event->wd);
-                    if (found != watches_.end())
-                        parent = found->second;
+                    watched = watches_.Find(event->wd, &relative);
                 }
-                if (!parent.empty()) {
-                    const std::string relative = parent.substr(options_.sharePath.size());
+                if (watched) {
+                    const std::string parent = options_.sharePath + relative;
                     const int depth =
                         static_cast<int>(std::count(relative.begin(), relative.end(), '/') + 1);
                     WatchTree(parent + "/" + name, depth);
@@ -218,7 +281,7 @@ void LiveLibrary::WatchTree(const std::string& path, int depth) {
     }
     {
         std::lock_guard<std::mutex> lock(watchesMutex_);
-        watches_[wd] = path;
+        watches_.Set(wd, std::string_view(path).substr(options_.sharePath.size()));
     }
     // Not through a link swapped in since the watch was set: only the share's own folders.
     io::FileDescriptor fd(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));

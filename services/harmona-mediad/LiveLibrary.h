@@ -10,11 +10,13 @@
 #include <atomic>
 #include <chrono>
 #include <cstddef>
+#include <cstdint>
 #include <functional>
 #include <mutex>
 #include <string>
+#include <string_view>
 #include <thread>
-#include <unordered_map>
+#include <vector>
 
 #include "common/io/FileDescriptor.h"
 #include "services/harmona-index/Indexer.h"
@@ -35,6 +37,36 @@ struct LiveLibraryOptions {
     std::chrono::milliseconds unwatchedRescan{std::chrono::minutes(10)};
     // Called on the live library's thread after every pass (changed or not).
     std::function<void(const index::IndexReport&)> onIndexed;
+};
+
+// The folder of each inotify watch, compact: a share of 20,000 folders takes about 30 bytes a
+// folder (its path within the share in one block of text, a sorted array of watch descriptors)
+// where a hash map of strings took about 120. Watch descriptors grow as watches are added, so an
+// addition is an append; a removal marks its entry, and the table is rebuilt once as much is
+// unused as used.
+class FolderWatches {
+  public:
+    // Watch `wd` is of `folder` (a watch set again on a folder replaces its folder).
+    void Set(int wd, std::string_view folder);
+    // False when `wd` is not in the table.
+    bool Find(int wd, std::string* folder) const;
+    void Erase(int wd);
+    void Clear();
+    std::size_t size() const { return live_; }
+    // Bytes of the text block and the array as allocated: what the table holds.
+    std::size_t heldBytes() const { return text_.capacity() + entries_.capacity() * sizeof(Entry); }
+
+  private:
+    struct Entry {
+        int wd;
+        uint32_t offset, size;  // into text_; offset kErased: removed
+    };
+    static constexpr uint32_t kErased = 0xffffffffU;
+    std::vector<Entry>::iterator Lookup(int wd);
+    void Compact();
+    std::vector<Entry> entries_;  // by wd
+    std::string text_;
+    std::size_t live_ = 0, liveText_ = 0;
 };
 
 class LiveLibrary {
@@ -68,7 +100,7 @@ class LiveLibrary {
     std::atomic<bool> stopping_{false};
     std::atomic<std::size_t> passes_{0};
     mutable std::mutex watchesMutex_;
-    std::unordered_map<int, std::string> watches_;  // watch descriptor -> folder
+    FolderWatches watches_;  // the share's folders below sharePath ("" for the share itself)
     bool watchLimitLogged_ = false;
     bool watchesComplete_ = true;
     bool pending_ = false;

@@ -581,6 +581,72 @@ TEST(TrackMetadata, DateCreatorTrackNumberAndTheFoldersCoverArt) {
     EXPECT_EQ(alpha->artist, "Band A");
 }
 
+// Numbers past 32 bits (an id, a size of 6 GB, a track number and a duration as an older or
+// foreign indexer may have written them) reach every reply as library.db has them, beside a
+// track of ordinary numbers and one whose size is not known.
+TEST(TrackMetadata, NumbersPastThirtyTwoBitsReachRepliesAsIndexed) {
+    WriteLibrary({{std::string(kShare) + "/Band/Big/big.flac", "Big", "Band", "Big", "Band", "Rock",
+                   2001, 3000000000LL, 1},
+                  {std::string(kShare) + "/Band/Big/small.mp3", "Small", "Band", "Big", "Band",
+                   "Rock", 1999, 2, 2},
+                  {std::string(kShare) + "/Band/Big/unknown.mp3", "Unknown", "Band", "Big", "Band",
+                   "Rock", 1998, 3, 3}});
+    {
+        sqlite::Database db = sqlite::Database::Open(kLibraryDb, SQLITE_OPEN_READWRITE, 1000);
+        ASSERT_TRUE(db);
+        ASSERT_EQ(db.Execute("UPDATE track SET id = 5000000000, size = 6000000000, duration_ms = "
+                             "3000000000 WHERE title = 'Big'"),
+                  SQLITE_OK);
+        ASSERT_EQ(db.Execute("UPDATE track SET size = 4294967294, duration_ms = 61000 WHERE "
+                             "title = 'Small'"),
+                  SQLITE_OK);
+        ASSERT_EQ(db.Execute("UPDATE track SET size = NULL WHERE title = 'Unknown'"), SQLITE_OK);
+        ASSERT_TRUE(medialib::BumpLibraryUpdateCount(db));
+    }
+    const ContentDirectory directory = Directory();
+    const std::vector<DidlObjectRecord> all = Objects(Browse(directory, "music_all"));
+    ASSERT_EQ(all.size(), 3u);
+    const DidlObjectRecord* big = FindTitle(all, "Big");
+    ASSERT_NE(big, nullptr);
+    EXPECT_EQ(big->id, "track:5000000000");
+    EXPECT_EQ(big->trackNumber, "3000000000");
+    EXPECT_EQ(big->size, "6000000000");
+    EXPECT_EQ(big->duration, "833:20:00.000");
+    EXPECT_EQ(big->res, std::string(kMediaBase) + "5000000000.flac");
+    EXPECT_EQ(big->album, "Big");
+    EXPECT_EQ(big->genre, "Rock");
+    EXPECT_EQ(big->date, "2001-01-01");
+    const DidlObjectRecord* small = FindTitle(all, "Small");
+    ASSERT_NE(small, nullptr);
+    EXPECT_EQ(small->size, "4294967294");
+    EXPECT_EQ(small->duration, "0:01:01.000");
+    EXPECT_EQ(small->trackNumber, "2");
+    const DidlObjectRecord* unknown = FindTitle(all, "Unknown");
+    ASSERT_NE(unknown, nullptr);
+    EXPECT_EQ(unknown->size, "");
+
+    const std::vector<DidlObjectRecord> meta = Objects(Browse(directory, "track:5000000000", true));
+    ASSERT_EQ(meta.size(), 1u);
+    EXPECT_EQ(meta[0].size, "6000000000");
+    // In its album, under its artist and among the latest albums, by the number sorted among
+    // the others.
+    for (const std::string& category :
+         {std::string("music_album"), std::string("music_aa"), std::string("music_latestalbum")}) {
+        std::vector<DidlObjectRecord> level = Objects(Browse(directory, category));
+        ASSERT_EQ(level.size(), 1u) << category;
+        if (category == "music_aa") {
+            level = Objects(Browse(directory, level[0].id));
+            ASSERT_EQ(level.size(), 1u);
+        }
+        const std::vector<DidlObjectRecord> tracks = Objects(Browse(directory, level[0].id));
+        EXPECT_EQ(Titles(tracks), (std::vector<std::string>{"Small", "Unknown", "Big"}))
+            << category;
+        const BrowseResult item = Browse(directory, level[0].id + "/track:5000000000", true);
+        ASSERT_EQ(item.error, 0) << category;
+        EXPECT_EQ(Objects(item)[0].trackNumber, "3000000000");
+    }
+}
+
 // --- Update ids -------------------------------------------------------------------------------
 
 TEST(UpdateIds, OnlyAnIndexerPassThatChangedSomethingMovesTheSystemUpdateId) {

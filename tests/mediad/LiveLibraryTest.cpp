@@ -35,6 +35,66 @@ namespace {
 using harmona::mediad::ContentDirectory;
 using harmona::mediad::LiveLibrary;
 using harmona::mediad::LiveLibraryOptions;
+
+// --- The table of watched folders ---------------------------------------------------------------
+
+std::string FolderOf(int i) {
+    return "/Artist " + std::to_string(i % 200) + "/Folder " + std::to_string(i / 200);
+}
+
+TEST(FolderWatches, EveryFolderIsFoundByItsWatchUntilItIsErasedThroughEveryRebuild) {
+    harmona::mediad::FolderWatches watches;
+    constexpr int kFolders = 5000;
+    for (int wd = 1; wd <= kFolders; ++wd)
+        watches.Set(wd, FolderOf(wd));
+    watches.Set(kFolders + 10, "");  // the share itself
+    watches.Set(7, "/moved here");   // a watch set again on a folder that moved
+    EXPECT_EQ(watches.size(), static_cast<std::size_t>(kFolders + 1));
+    std::string folder;
+    ASSERT_TRUE(watches.Find(kFolders + 10, &folder));
+    EXPECT_EQ(folder, "");
+    ASSERT_TRUE(watches.Find(7, &folder));
+    EXPECT_EQ(folder, "/moved here");
+    EXPECT_FALSE(watches.Find(kFolders + 1, &folder));
+    // Erased one by one from the middle out, far past the points where the table is rebuilt.
+    for (int wd = kFolders / 2; wd >= 1; --wd) {
+        if (wd != 7)
+            watches.Erase(wd);
+        watches.Erase(kFolders + 1 - wd);
+        if (wd % 250 != 0)
+            continue;
+        for (int other = 1; other <= kFolders; ++other) {
+            const bool erased = other != 7 && other >= wd && other <= kFolders + 1 - wd;
+            ASSERT_EQ(watches.Find(other, &folder), !erased) << other;
+            if (!erased) {
+                ASSERT_EQ(folder, other == 7 ? "/moved here" : FolderOf(other)) << other;
+            }
+        }
+    }
+    EXPECT_EQ(watches.size(), 2u);
+    ASSERT_TRUE(watches.Find(kFolders + 10, &folder));
+    EXPECT_EQ(folder, "");
+    watches.Erase(12345);  // never set: nothing happens
+    watches.Set(kFolders + 3, "/new");
+    ASSERT_TRUE(watches.Find(kFolders + 3, &folder));
+    EXPECT_EQ(folder, "/new");
+    EXPECT_EQ(watches.size(), 3u);
+    watches.Clear();
+    EXPECT_EQ(watches.size(), 0u);
+    EXPECT_FALSE(watches.Find(7, &folder));
+}
+
+// A share of 20,000 folders of ordinary names: about 45 bytes a folder as allocated, room to grow
+// included (a hash map of path strings took about 120 of the live library's heap).
+TEST(FolderWatches, TwentyThousandFoldersTakeAtMostSixtyFourBytesEach) {
+    harmona::mediad::FolderWatches watches;
+    constexpr int kFolders = 20000;
+    for (int wd = 1; wd <= kFolders; ++wd)
+        watches.Set(wd, FolderOf(wd));
+    EXPECT_EQ(watches.size(), static_cast<std::size_t>(kFolders));
+    EXPECT_LE(watches.heldBytes(), 64u * kFolders);
+}
+
 using namespace std::chrono_literals;
 
 // Every wait of these tests ends after this long: a change must show well within it.

@@ -185,12 +185,12 @@ void SetUpNetwork() {
     VethPair("hm0", "192.0.2.1", "hm1", "192.0.2.2");
 }
 
-bool ServerProcess::Start(const std::vector<std::string>& extraArgs) {
+bool ServerProcess::Start(const std::vector<std::string>& extraArgs, int readyMs) {
     std::vector<std::string> argv = {HARMONA_MEDIAD_PATH, "--interface", kInterface};
     argv.insert(argv.end(), extraArgs.begin(), extraArgs.end());
     service_ = Service::Start(argv, "/tmp/harmona-mediad.log");
     const pid_t pid = service_.pid();
-    return service_.WaitUntilReady([pid] { return PidFileNames(kPidFile, pid); }, 10000);
+    return service_.WaitUntilReady([pid] { return PidFileNames(kPidFile, pid); }, readyMs);
 }
 
 int ServerProcess::Stop() {

@@ -52,12 +52,13 @@ void IndexStandardShare();
 void SetUpNetwork();
 
 // harmona-mediad as a child (its output in /tmp/harmona-mediad.log); Start waits until the pid
-// file names it (up to 10 s).
+// file names it (up to `readyMs`, 10 s unless given: the first load of a large library takes
+// longer on a busy machine).
 class ServerProcess {
   public:
     ~ServerProcess() { Stop(); }
     // `extraArgs` follow the kit's own (--interface).
-    bool Start(const std::vector<std::string>& extraArgs = {});
+    bool Start(const std::vector<std::string>& extraArgs = {}, int readyMs = 10000);
     // SIGTERM and wait (up to 10 s, then SIGKILL); the exit status, or -1.
     int Stop();
     pid_t pid() const { return service_.pid(); }
