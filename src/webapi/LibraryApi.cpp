@@ -23,6 +23,7 @@
 #include "src/webapi/RadioApi.h"
 #include "src/webapi/RemoteMedia.h"
 #include "src/webapi/ServiceProbe.h"
+#include "src/webapi/UserLanguage.h"
 
 namespace harmona::webapi {
 
@@ -93,6 +94,8 @@ int LibraryApi::Process() {
         return ServeRadioAction(*this, webMan, action);
     if (action == kRemoteStreamAction)
         return ServeRemoteStream(*this, webMan, permission_);
+    if (action == kLanguageAction)
+        return ServeLanguageAction(*this, webMan);
     return Fail(Failure::requestInvalid, kNotFoundSection, kNotFoundText, kUnknownActionLine);
 }
 
