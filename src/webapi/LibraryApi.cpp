@@ -25,6 +25,7 @@
 #include "src/webapi/RemoteMedia.h"
 #include "src/webapi/SearchAction.h"
 #include "src/webapi/ServiceProbe.h"
+#include "src/webapi/UserLanguage.h"
 
 namespace harmona::webapi {
 
@@ -99,6 +100,8 @@ int LibraryApi::Process() {
         return ServeRemoteStream(*this, webMan, permission_);
     if (IsCoverArtAction(action))
         return ServeCoverArtAction(*this, webMan, action);
+    if (action == kLanguageAction)
+        return ServeLanguageAction(*this, webMan);
     return Fail(Failure::requestInvalid, kNotFoundSection, kNotFoundText, kUnknownActionLine);
 }
 

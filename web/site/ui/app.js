@@ -12,6 +12,8 @@ import { createQueue } from "./queue.js";
 import { createSession } from "./session.js";
 import { createDrawer } from "./phone.js";
 import { createSearch } from "./search.js";
+import { installShortcuts } from "./keys.js";
+import { askLanguages, createLanguagePicker, treeTextTranslator } from "./language.js";
 
 const CGI = "webapi/audiotree.cgi";
 const API = "webapi/library.cgi";
@@ -29,6 +31,7 @@ const page = {
   fallback: {},  // the English ones, for a key that a language lacks
   labels: LABELS.enu,
   keepAlives: 0,
+  treeText: (text) => text, // a tree node's text in the page's language (language.js)
   listener: null, // the pane's listing and the player (listen.js)
   actions: 0,     // user actions so far: each gets the next number when it starts
   errorOf: 0,     // the action whose failure the status line shows (0: none)
@@ -165,8 +168,8 @@ function renderNode(node, depth) {
   if (node.iconCls === "x-tree-hide-icon" || !safeIcon(node.icon)) icon.classList.add("hidden");
   const label = document.createElement("span");
   label.className = "label";
-  label.textContent = decodeEntities(node.text);
-  row.title = decodeEntities(node.qtip ?? node.text);
+  label.textContent = page.treeText(decodeEntities(node.text), id);
+  row.title = page.treeText(decodeEntities(node.qtip ?? node.text), id);
   row.append(twisty, icon, label);
   li.append(row);
 
@@ -267,13 +270,14 @@ function select(li, { keyboard = false, record = true } = {}) {
   const node = nodeData.get(li);
   $("hint").hidden = true;
   $("selected").hidden = false;
-  $("selected-text").textContent = decodeEntities(node.text);
+  const title = page.treeText(decodeEntities(node.text), node.id);
+  $("selected-text").textContent = title;
   $("selected-icon").src = safeIcon(node.icon) ?? BLANK;
   if (record) page.nav?.treeSelected(li, { keyboard });
   if (page.listener) {
-    page.radio?.select(node.id, decodeEntities(node.text));
+    page.radio?.select(node.id, title);
     const listed = listedRadioNode(node.id);
-    if (isListable(listed)) page.listener.show(listed, decodeEntities(node.text), undefined, { defer: keyboard ? 300 : 0 });
+    if (isListable(listed)) page.listener.show(listed, title, undefined, { defer: keyboard ? 300 : 0 });
     else page.listener.hide();
   }
 }
@@ -369,14 +373,17 @@ async function keepAlive() {
 
 // --- start -----------------------------------------------------------------------------------------
 async function loadLanguage() {
+  const languages = await askLanguages();
+  if (languages) return languages;
   try {
     const response = await fetch(UILANG, { credentials: "same-origin", cache: "no-store" });
     const reply = await response.json();
-    if (typeof reply.language === "string" && /^[a-z]{3}$/.test(reply.language)) return reply.language;
+    if (typeof reply.language === "string" && /^[a-z]{3}$/.test(reply.language)) return { language: reply.language, tree: reply.language };
   } catch {
     // below
   }
-  return languageFromTags(navigator.languages?.length ? navigator.languages : [navigator.language]);
+  const language = languageFromTags(navigator.languages?.length ? navigator.languages : [navigator.language]);
+  return { language, tree: language };
 }
 async function loadTexts() {
   try {
@@ -388,8 +395,9 @@ async function loadTexts() {
 }
 
 async function start() {
-  const [language, texts] = await Promise.all([loadLanguage(), loadTexts()]);
+  const [{ language, tree: treeLanguage, saved }, texts] = await Promise.all([loadLanguage(), loadTexts()]);
   page.language = language;
+  page.treeText = treeTextTranslator(texts, treeLanguage, language);
   page.texts = texts[language] ?? texts.enu ?? {};
   page.fallback = texts.enu ?? {};
   page.labels = { ...LABELS.enu, ...(LABELS[language] ?? {}) };
@@ -441,6 +449,7 @@ async function start() {
     decorateRow: (...args) => page.playlists.decorateRow(...args),
     onListed: (...args) => page.playlists.listed(...args),
     labels: page.labels,
+    language: HTML_LANG[language] ?? "en",
     begin,
     onFailure: (reply, action, node) => {
       const radioWords = page.radio?.failure(reply);
@@ -473,6 +482,8 @@ async function start() {
     openNode: (node, title) => page.listener.show(node, title),
     onFailure: (reply) => { if (failureCode(reply) === "login_expired") showFailure(reply); },
   });
+  installShortcuts();
+  createLanguagePicker({ labels: page.labels, saved, showStatus, showFailure });
 
   const tree = $("tree");
   tree.addEventListener("click", (event) => {

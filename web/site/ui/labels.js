@@ -7,6 +7,7 @@ import { COVER_WORDS } from "./words/covers.js";
 import { NAV_WORDS } from "./words/nav.js";
 import { QUEUE_WORDS } from "./words/queue.js";
 import { SEARCH_WORDS } from "./words/search.js";
+import { A11Y_WORDS } from "./words/a11y.js";
 export const LABELS = {
   enu: {
     title: "Harmona Audio", tree: "Audio sources", rerandom: "New Random 100",
@@ -35,6 +36,8 @@ export const LABELS = {
     sessionExpired: "Votre connexion n'est plus valide. Rechargez la page pour vous reconnecter.",
     noReply: "Le serveur n'a pas répondu à cette requête (HTTP {status}).", badReply: "La réponse du serveur est illisible.",
     unknownError: "Erreur {sec} / {key}", offline: "Le serveur est injoignable.",
+    playAll: "Tout lire", play: "Lire", pause: "Pause", next: "Suivant", previous: "Précédent",
+    seek: "Position", volume: "Volume", trackCount: "{count} pistes", cannotPlay: "Cette piste ne peut pas être lue.",
   },
   spn: {
     title: "Harmona Audio", tree: "Fuentes de audio", rerandom: "Nuevo Aleatorio 100",
@@ -43,6 +46,8 @@ export const LABELS = {
     sessionExpired: "Su sesión ya no es válida. Vuelva a cargar la página para iniciar sesión.",
     noReply: "El servidor no respondió a esta solicitud (HTTP {status}).", badReply: "La respuesta del servidor no se puede leer.",
     unknownError: "Error {sec} / {key}", offline: "No se puede contactar con el servidor.",
+    playAll: "Reproducir todo", play: "Reproducir", pause: "Pausa", next: "Siguiente", previous: "Anterior",
+    seek: "Posición", volume: "Volumen", trackCount: "{count} pistas", cannotPlay: "Esta pista no se puede reproducir.",
   },
   ita: {
     title: "Harmona Audio", tree: "Sorgenti audio", rerandom: "Nuova Casuale 100",
@@ -51,6 +56,8 @@ export const LABELS = {
     sessionExpired: "L'accesso non è più valido. Ricaricare la pagina per accedere di nuovo.",
     noReply: "Il server non ha risposto a questa richiesta (HTTP {status}).", badReply: "La risposta del server non è leggibile.",
     unknownError: "Errore {sec} / {key}", offline: "Il server non è raggiungibile.",
+    playAll: "Riproduci tutto", play: "Riproduci", pause: "Pausa", next: "Successivo", previous: "Precedente",
+    seek: "Posizione", volume: "Volume", trackCount: "{count} brani", cannotPlay: "Questo brano non può essere riprodotto.",
   },
   jpn: {
     title: "Harmona オーディオ", tree: "オーディオソース", rerandom: "ランダム 100 を再作成",
@@ -59,6 +66,8 @@ export const LABELS = {
     sessionExpired: "ログインが無効になりました。ページを再読み込みしてログインしてください。",
     noReply: "サーバーがこの要求に応答しませんでした (HTTP {status})。", badReply: "サーバーの応答を読み取れません。",
     unknownError: "エラー {sec} / {key}", offline: "サーバーに接続できません。",
+    playAll: "すべて再生", play: "再生", pause: "一時停止", next: "次へ", previous: "前へ",
+    seek: "再生位置", volume: "音量", trackCount: "{count} 曲", cannotPlay: "このトラックは再生できません。",
   },
   chs: {
     title: "Harmona 音频", tree: "音频来源", rerandom: "重新生成随机 100",
@@ -67,6 +76,8 @@ export const LABELS = {
     sessionExpired: "您的登录已失效。请重新加载页面以登录。",
     noReply: "服务器未响应此请求 (HTTP {status})。", badReply: "无法读取服务器的响应。",
     unknownError: "错误 {sec} / {key}", offline: "无法连接服务器。",
+    playAll: "全部播放", play: "播放", pause: "暂停", next: "下一首", previous: "上一首",
+    seek: "播放位置", volume: "音量", trackCount: "{count} 首", cannotPlay: "无法播放此曲目。",
   },
   cht: {
     title: "Harmona 音訊", tree: "音訊來源", rerandom: "重新產生隨機 100",
@@ -75,11 +86,13 @@ export const LABELS = {
     sessionExpired: "您的登入已失效。請重新載入頁面以登入。",
     noReply: "伺服器未回應此要求 (HTTP {status})。", badReply: "無法讀取伺服器的回應。",
     unknownError: "錯誤 {sec} / {key}", offline: "無法連線至伺服器。",
+    playAll: "全部播放", play: "播放", pause: "暫停", next: "下一首", previous: "上一首",
+    seek: "播放位置", volume: "音量", trackCount: "{count} 首", cannotPlay: "無法播放此曲目。",
   },
 };
 
 // Each feature's own words (words/*.js), one dictionary per language code, merged in.
-for (const words of [FAILURE_WORDS, PLAYLIST_WORDS, RADIO_WORDS, COVER_WORDS, NAV_WORDS, QUEUE_WORDS, SEARCH_WORDS])
+for (const words of [FAILURE_WORDS, PLAYLIST_WORDS, RADIO_WORDS, COVER_WORDS, NAV_WORDS, QUEUE_WORDS, SEARCH_WORDS, A11Y_WORDS])
   for (const [code, dictionary] of Object.entries(words)) LABELS[code] = { ...LABELS[code], ...dictionary };
 
 // The page's BCP 47 tag for a language code (the html lang attribute).

@@ -5,7 +5,38 @@ import { failureCode, readApiReply } from "./failures.js";
 
 const API = "webapi/library.cgi";
 const ROW_HEIGHT = 28; // px; .track in app.css has the same height (--track-height where a layout sets it)
+const HEAD_HEIGHT = 28; // px; the column headers above the rows (.tracks-head in a11y.css)
 const OVERSCAN = 8;    // rows drawn above and below the visible ones
+// The list's columns: the class of their cells, the word of their header, how they sort.
+export const COLUMNS = [
+  { name: "number", word: "colNumber", sort: "number" },
+  { name: "title", word: "colTitle", sort: "text" },
+  { name: "artist", word: "colArtist", sort: "text" },
+  { name: "album", word: "colAlbum", sort: "text" },
+  { name: "duration", word: "colDuration", sort: "number" },
+];
+
+// The tracks in the order of a column (`direction` "ascending" or "descending"); the listing's own
+// order for the number column. Equal values keep the listing's order; empty texts and unknown
+// durations go last either way.
+export function sortedTracks(tracks, column, direction, collator = new Intl.Collator()) {
+  const indexed = tracks.map((track, index) => ({ track, index }));
+  const sign = direction === "descending" ? -1 : 1;
+  const key = (entry) => {
+    if (column === "number") return entry.index;
+    if (column === "duration") return Number.isFinite(entry.track.duration) && entry.track.duration >= 0 ? entry.track.duration : null;
+    const text = entry.track[column];
+    return typeof text === "string" && text !== "" ? text : null;
+  };
+  indexed.sort((a, b) => {
+    const x = key(a);
+    const y = key(b);
+    if (x === null || y === null) return x === y ? a.index - b.index : x === null ? 1 : -1;
+    const order = typeof x === "number" ? x - y : collator.compare(x, y);
+    return order !== 0 ? sign * order : a.index - b.index;
+  });
+  return indexed.map((entry) => entry.track);
+}
 
 // Which tree nodes hold tracks or containers that the API lists.
 export function isListable(id) {
@@ -32,10 +63,14 @@ const $ = (id) => document.getElementById(id);
 // drawn, `decorateContainers(list, albums)` after its containers are drawn, `decorateCover(row,
 // track)` for each drawn row, `onPlay(track)` when a track starts. `openContainer(node, title,
 // object)`: what a click on a container of the list does (navigation, nav.js); lists it by default.
-export function createListener({ onPlayerLoad = () => {}, labels, onFailure, onStatus, onSuccess = () => {}, begin = () => 0, drawRandom = async () => false, decorateRow = () => {}, onListed = () => {},
+// `language`: the page's language, for the order of a sorted column.
+export function createListener({ onPlayerLoad = () => {}, labels, language = "en", onFailure, onStatus, onSuccess = () => {}, begin = () => 0, drawRandom = async () => false, decorateRow = () => {}, onListed = () => {},
   extendList = async (node, reply) => reply, decorateContainers = () => {}, decorateCover = () => {}, onPlay = () => {}, openContainer = null, queue = null }) {
   const state = {
     list: { node: "", containers: [], tracks: [] }, // what the pane shows
+    view: [],           // its tracks in the order shown (sorted by a column, or as listed)
+    listed: new Map(),  // a track of the view -> its index in the listing's order
+    sort: { column: "", direction: "" }, // the column the view is sorted by ("" for none)
     queue: [],          // the tracks being played, in order (no play queue given)
     queueNode: "",      // the node the queue came from
     index: -1,          // the playing track in the queue
@@ -51,6 +86,34 @@ export function createListener({ onPlayerLoad = () => {}, labels, onFailure, onS
   let rowHeight = ROW_HEIGHT;
   const measureRows = () => { rowHeight = Number.parseFloat(getComputedStyle(viewport).getPropertyValue("--track-height")) || ROW_HEIGHT; };
   measureRows();
+
+  const collator = new Intl.Collator(language, { sensitivity: "base", numeric: true });
+
+  // The column headers: a row of its own above the rows, each header a button that sorts.
+  const head = document.createElement("div");
+  head.className = "tracks-head";
+  head.setAttribute("role", "rowgroup");
+  const headRow = document.createElement("div");
+  headRow.className = "track-head";
+  headRow.setAttribute("role", "row");
+  headRow.setAttribute("aria-rowindex", "1");
+  for (const column of COLUMNS) {
+    const header = document.createElement("div");
+    header.className = column.name;
+    header.setAttribute("role", "columnheader");
+    header.dataset.column = column.name;
+    const button = document.createElement("button");
+    button.type = "button";
+    button.className = "sort";
+    button.tabIndex = -1; // the list is one tab stop: the headers are reached with the arrow keys
+    button.textContent = labels[column.word];
+    button.addEventListener("click", () => sortBy(column.name));
+    header.append(button);
+    headRow.append(header);
+  }
+  head.append(headRow);
+  viewport.prepend(head);
+  viewport.setAttribute("aria-label", labels.trackList);
 
   // `object`: a container of a media server on the network (its root when absent).
   async function fetchList(node, object, signal) {
@@ -170,41 +233,82 @@ export function createListener({ onPlayerLoad = () => {}, labels, onFailure, onS
     containers.hidden = list.containers.length === 0;
     decorateContainers(list, list.albums);
     $("list-count").textContent = labels.trackCount.replace("{count}", String(list.tracks.length));
+    // Another node starts in its own order; the same one again (a reload) keeps the column.
+    if (list.node !== state.sortedNode) state.sort = { column: "", direction: "" };
+    state.sortedNode = list.node;
+    arrange();
     state.cursor = -1;
+    viewport.tabIndex = 0;
     $("play-all").disabled = list.tracks.length === 0;
     spacer.style.height = `${list.tracks.length * rowHeight}px`;
     viewport.hidden = list.tracks.length === 0;
     viewport.scrollTop = 0;
-    viewport.setAttribute("aria-rowcount", String(list.tracks.length));
+    viewport.setAttribute("aria-rowcount", String(list.tracks.length + 1));
+    drawRows();
+  }
+
+  // The view: the listing's tracks in the order of the sorted column, and each one's listed index.
+  function arrange() {
+    const tracks = state.list.tracks;
+    state.view = state.sort.column ? sortedTracks(tracks, state.sort.column, state.sort.direction, collator) : tracks;
+    state.listed = new Map(tracks.map((track, index) => [track, index]));
+    for (const header of head.querySelectorAll("[role=columnheader]")) {
+      if (header.dataset.column === state.sort.column) header.setAttribute("aria-sort", state.sort.direction);
+      else header.removeAttribute("aria-sort");
+    }
+  }
+
+  // A click on a column's header: sorted by it, ascending, then descending, then as listed.
+  function sortBy(column) {
+    const { column: now, direction } = state.sort;
+    if (now !== column) state.sort = { column, direction: "ascending" };
+    else if (direction === "ascending") state.sort = { column, direction: "descending" };
+    else state.sort = { column: "", direction: "" };
+    const focused = state.view[state.cursor];
+    arrange();
+    state.cursor = focused ? state.view.indexOf(focused) : -1;
     drawRows();
   }
 
   // Draws the rows that the viewport shows, reusing nothing: a window is at most a few dozen rows.
+  // The keyboard's row is drawn too when it is out of view, so that it keeps the focus.
   function drawRows() {
-    const tracks = state.list.tracks;
+    const tracks = state.view;
     const first = Math.max(0, Math.floor(viewport.scrollTop / rowHeight) - OVERSCAN);
     const visible = Math.ceil((viewport.clientHeight || 400) / rowHeight) + 2 * OVERSCAN;
     const last = Math.min(tracks.length, first + visible);
+    const hadFocus = spacer.contains(document.activeElement);
     const rows = [];
+    if (state.cursor >= 0 && state.cursor < first && state.cursor < tracks.length) rows.push(trackRow(tracks[state.cursor], state.cursor));
     for (let i = first; i < last; i++) rows.push(trackRow(tracks[i], i));
+    if (state.cursor >= last && state.cursor < tracks.length) rows.push(trackRow(tracks[state.cursor], state.cursor));
     spacer.replaceChildren(...rows);
+    headRow.classList.toggle("with-tools", spacer.querySelector(".track.with-tools") !== null);
+    if (hadFocus) focusCursor();
   }
 
+  // One row: a cell per column, then what the row hooks add (each a cell of its own). `index` is
+  // the row's place in the view; the number cell and the hooks get its place in the listing.
   function trackRow(track, index) {
+    const listed = state.listed.get(track) ?? index;
     const row = document.createElement("div");
     row.className = "track";
     row.setAttribute("role", "row");
-    row.setAttribute("aria-rowindex", String(index + 1));
+    row.setAttribute("aria-rowindex", String(index + 2)); // the header row is the first
+    row.tabIndex = index === state.cursor ? 0 : -1;
     row.dataset.index = String(index);
     row.dataset.stream = String(track.stream ?? "");
     row.style.top = `${index * rowHeight}px`;
-    if (isPlaying(index)) row.classList.add("playing");
+    if (isPlaying(track, index)) {
+      row.classList.add("playing");
+      row.setAttribute("aria-current", "true");
+    }
     if (index === state.cursor) {
       row.classList.add("cursor");
       row.id = "track-cursor";
     }
     for (const [name, text] of [
-      ["number", String(index + 1)],
+      ["number", String(listed + 1)],
       ["title", track.title],
       ["artist", track.artist],
       ["album", track.album],
@@ -212,19 +316,27 @@ export function createListener({ onPlayerLoad = () => {}, labels, onFailure, onS
     ]) {
       const cell = document.createElement("span");
       cell.className = name;
+      cell.setAttribute("role", "gridcell");
       cell.textContent = String(text ?? "");
       row.append(cell);
     }
     row.title = String(track.title ?? "");
     decorateCover(row, track);
-    decorateRow(row, track, index, state.list.node);
+    decorateRow(row, track, listed, state.list.node);
     queue?.decorateRow(row, track, index, state.list.node);
+    for (const cell of row.children) if (!cell.hasAttribute("role")) cell.setAttribute("role", "gridcell");
     return row;
   }
 
-  function isPlaying(index) {
-    if (queue) return queue.isPlaying(state.list.node, index, state.list.tracks[index]);
-    return state.queueNode === state.list.node && state.index === index && state.queue === state.list.tracks;
+  // Whether `track`, the row at `index` of the view, is the one playing.
+  function isPlaying(track, index) {
+    if (queue) return queue.isPlaying(state.list.node, index, track);
+    return state.queueNode === state.list.node && state.index >= 0 && state.queue[state.index] === track;
+  }
+
+  function focusCursor() {
+    const row = spacer.querySelector(".track.cursor");
+    if (row && document.activeElement !== row) row.focus({ preventScroll: true });
   }
 
   function play(tracks, node, index) {
@@ -278,13 +390,17 @@ export function createListener({ onPlayerLoad = () => {}, labels, onFailure, onS
     drawRows();
   }
 
+  // The keyboard's row: the list's one tab stop, scrolled into view (below the column headers) and
+  // focused.
   function moveCursor(index) {
     state.cursor = index;
+    viewport.tabIndex = -1;
     const top = index * rowHeight;
+    const room = Math.max(rowHeight, viewport.clientHeight - HEAD_HEIGHT);
     if (top < viewport.scrollTop) viewport.scrollTop = top;
-    else if (top + rowHeight > viewport.scrollTop + viewport.clientHeight) viewport.scrollTop = top + rowHeight - viewport.clientHeight;
+    else if (top + rowHeight > viewport.scrollTop + room) viewport.scrollTop = top + rowHeight - room;
     drawRows();
-    viewport.setAttribute("aria-activedescendant", "track-cursor");
+    focusCursor();
   }
 
   function step(delta) {
@@ -309,23 +425,44 @@ export function createListener({ onPlayerLoad = () => {}, labels, onFailure, onS
     const row = event.target.closest(".track");
     if (!row) return;
     state.cursor = Number(row.dataset.index);
-    play(state.list.tracks, state.list.node, state.cursor);
+    viewport.tabIndex = -1;
+    play(state.view, state.list.node, state.cursor);
+    // A button of the row (a hook's) keeps the focus it took; a click elsewhere focuses the row.
+    if (!event.target.closest("button")) focusCursor();
   });
-  // "Play all": the list from its first track, or (in shuffle) from any.
+  // "Play all": the list in the order shown from its first track, or (in shuffle) from any.
   $("play-all").addEventListener("click", () => {
-    if (queue) queue.replace(state.list.tracks, state.list.node, -1);
-    else play(state.list.tracks, state.list.node, 0);
+    if (queue) queue.replace(state.view, state.list.node, -1);
+    else play(state.view, state.list.node, 0);
   });
-  // The keyboard in the list: arrows move over the rows, Enter or Space plays the row.
+  // The keyboard in the list: the arrows, Page Up/Down, Home and End move over the rows (the focus
+  // goes with them), Enter plays the row. Space is the page's play/pause (keys.js).
   viewport.addEventListener("keydown", (event) => {
-    const count = state.list.tracks.length;
-    if (count === 0) return;
-    const page = Math.max(1, Math.floor(viewport.clientHeight / rowHeight) - 1);
+    const count = state.view.length;
+    if (count === 0 || event.altKey || event.metaKey) return;
+    // The column headers: Left and Right move between them, Down goes back to the rows.
+    if (head.contains(event.target)) {
+      const buttons = [...head.querySelectorAll("button.sort")];
+      const at = buttons.indexOf(event.target);
+      if (event.key === "ArrowLeft" || event.key === "ArrowRight") buttons[Math.min(buttons.length - 1, Math.max(0, at + (event.key === "ArrowLeft" ? -1 : 1)))].focus();
+      else if (event.key === "ArrowDown") moveCursor(Math.max(0, state.cursor));
+      else return;
+      event.preventDefault();
+      return;
+    }
+    if (event.target !== viewport && !event.target.classList.contains("track")) return; // a hook's button
+    // Up from the first row reaches the column headers.
+    if (event.key === "ArrowUp" && state.cursor === 0) {
+      head.querySelector(".title button.sort")?.focus();
+      event.preventDefault();
+      return;
+    }
+    const page = Math.max(1, Math.floor((viewport.clientHeight - HEAD_HEIGHT) / rowHeight) - 1);
     const moves = { ArrowDown: 1, ArrowUp: -1, PageDown: page, PageUp: -page, Home: -count, End: count };
     if (event.key in moves) {
       moveCursor(Math.min(count - 1, Math.max(0, (state.cursor < 0 ? -1 : state.cursor) + moves[event.key])));
-    } else if ((event.key === "Enter" || event.key === " ") && state.cursor >= 0) {
-      play(state.list.tracks, state.list.node, state.cursor);
+    } else if (event.key === "Enter" && state.cursor >= 0) {
+      play(state.view, state.list.node, state.cursor);
     } else {
       return;
     }
@@ -336,7 +473,7 @@ export function createListener({ onPlayerLoad = () => {}, labels, onFailure, onS
   $("play").addEventListener("click", () => {
     if (!audio.src) {
       if (queue?.hasItems()) queue.step(0);
-      else if (state.list.tracks.length > 0) play(state.list.tracks, state.list.node, 0);
+      else if (state.view.length > 0) play(state.view, state.list.node, Math.max(0, state.cursor));
     } else if (audio.paused) {
       audio.play().catch(() => {});
     } else {
