@@ -6,6 +6,8 @@
 #include <cstdlib>
 #include <vector>
 
+#include "common/util/Trim.h"
+
 namespace harmona::cgi {
 namespace {
 
@@ -28,14 +30,6 @@ constexpr LanguageTag kTags[] = {
 constexpr const char* kCodes[] = {"enu", "ger", "fre", "ita", "spn", "jpn", "dan",
                                   "nor", "sve", "nld", "rus", "plk", "ptb", "ptg",
                                   "hun", "trk", "csy", "chs", "cht", "krn", "tha"};
-
-std::string_view Trim(std::string_view s) {
-    while (!s.empty() && (s.front() == ' ' || s.front() == '\t'))
-        s.remove_prefix(1);
-    while (!s.empty() && (s.back() == ' ' || s.back() == '\t'))
-        s.remove_suffix(1);
-    return s;
-}
 
 bool EqualsIgnoreCase(std::string_view a, std::string_view b) {
     return a.size() == b.size() && strncasecmp(a.data(), b.data(), a.size()) == 0;
@@ -66,7 +60,7 @@ double QValue(std::string_view params) {
     double q = 1.0;
     while (!params.empty()) {
         const std::size_t semi = params.find(';');
-        const std::string_view param = Trim(params.substr(0, semi));
+        const std::string_view param = util::Trim(params.substr(0, semi));
         params = semi == std::string_view::npos ? std::string_view() : params.substr(semi + 1);
         if (param.size() < 2 || (param[0] != 'q' && param[0] != 'Q') || param[1] != '=')
             continue;
@@ -97,7 +91,7 @@ std::string LanguageFromAcceptLanguage(std::string_view header) {
         const std::string_view range = header.substr(0, comma);
         header = comma == std::string_view::npos ? std::string_view() : header.substr(comma + 1);
         const std::size_t semi = range.find(';');
-        const std::string_view tag = Trim(range.substr(0, semi));
+        const std::string_view tag = util::Trim(range.substr(0, semi));
         const double q = semi == std::string_view::npos ? 1.0 : QValue(range.substr(semi + 1));
         if (tag.empty() || q <= 0)
             continue;  // q=0 means "not acceptable"

@@ -9,26 +9,15 @@
 #include <string>
 
 #include "common/io/FileDescriptor.h"
+#include "common/util/Trim.h"
 
 namespace harmona::conf {
 namespace {
 
 constexpr std::string_view kUtf8Bom = "\xEF\xBB\xBF";
 
-bool IsBlank(char c) {
-    return c == ' ' || c == '\t' || c == '\r' || c == '\n' || c == '\v' || c == '\f';
-}
-
-std::string_view Trim(std::string_view s) {
-    while (!s.empty() && IsBlank(s.front()))
-        s.remove_prefix(1);
-    while (!s.empty() && IsBlank(s.back()))
-        s.remove_suffix(1);
-    return s;
-}
-
 void ParseLine(std::string_view line, ConfVisitor& visitor) {
-    const std::string_view trimmed = Trim(line);
+    const std::string_view trimmed = util::Trim(line, util::kAsciiWhiteSpace);
     if (trimmed.empty() || trimmed.front() == '#' || trimmed.front() == ';')
         return;
 
@@ -43,8 +32,8 @@ void ParseLine(std::string_view line, ConfVisitor& visitor) {
     const std::size_t eq = trimmed.find('=');
     if (eq == std::string_view::npos)
         return;  // any other line is ignored
-    const std::string_view key = Trim(trimmed.substr(0, eq));
-    std::string_view value = Trim(trimmed.substr(eq + 1));
+    const std::string_view key = util::Trim(trimmed.substr(0, eq), util::kAsciiWhiteSpace);
+    std::string_view value = util::Trim(trimmed.substr(eq + 1), util::kAsciiWhiteSpace);
     if (key.empty())
         return;
     if (value.size() >= 2 && value.front() == '"' && value.back() == '"')

@@ -10,6 +10,7 @@
 #include <cerrno>
 
 #include "common/io/ReplaceFile.h"
+#include "common/util/Trim.h"
 #include "common/util/Utf8.h"
 #include "platform/conf/ConfFile.h"
 
@@ -18,14 +19,6 @@ namespace {
 
 bool IsBlank(char c) {
     return c == ' ' || c == '\t' || c == '\r' || c == '\n' || c == '\v' || c == '\f';
-}
-
-std::string_view Trim(std::string_view s) {
-    while (!s.empty() && IsBlank(s.front()))
-        s.remove_prefix(1);
-    while (!s.empty() && IsBlank(s.back()))
-        s.remove_suffix(1);
-    return s;
 }
 
 // Temporary files begin so: no playlist file can have such a name (it does not end in ".m3u" or
@@ -79,7 +72,7 @@ std::vector<RawLine> SplitLines(std::string_view text) {
             content.remove_prefix(3);
         first = false;
         if (content.size() <= conf::kMaxLineBytes) {
-            const std::string_view trimmed = Trim(content);
+            const std::string_view trimmed = util::Trim(content, util::kAsciiWhiteSpace);
             const std::size_t close = trimmed.rfind(']');
             if (!trimmed.empty() && trimmed.front() == '[' && close != std::string_view::npos &&
                 close > 0)

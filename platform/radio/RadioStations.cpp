@@ -10,22 +10,13 @@
 #include "common/io/FileDescriptor.h"
 #include "common/io/ReplaceFile.h"
 #include "common/util/Number.h"
+#include "common/util/Trim.h"
 #include "common/util/Utf8.h"
 #include "platform/conf/ConfFile.h"
 
 namespace harmona::radio {
 
 namespace {
-
-constexpr const char* kSpace = " \t";
-
-std::string_view Trimmed(std::string_view text) {
-    const std::size_t first = text.find_first_not_of(kSpace);
-    if (first == std::string_view::npos)
-        return {};
-    const std::size_t last = text.find_last_not_of(kSpace);
-    return text.substr(first, last - first + 1);
-}
 
 bool StartsWithNoCase(std::string_view text, std::string_view prefix) {
     if (text.size() < prefix.size())
@@ -143,7 +134,7 @@ StationList ReadStations(const std::string& preferenceDir) {
 }
 
 std::optional<std::string> CleanStationName(std::string_view name) {
-    const std::string_view trimmed = Trimmed(name);
+    const std::string_view trimmed = util::Trim(name);
     if (trimmed.empty() || trimmed.size() > kMaxNameBytes || !util::IsValidUtf8(trimmed))
         return std::nullopt;
     for (std::size_t i = 0; i < trimmed.size();) {

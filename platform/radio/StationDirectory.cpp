@@ -5,22 +5,13 @@
 #include <cstring>
 #include <set>
 
+#include "common/util/Trim.h"
 #include "common/util/Utf8.h"
 #include "platform/radio/RadioStations.h"
 
 namespace harmona::radio {
 
 namespace {
-
-constexpr const char* kSpace = " \t\r\n";
-
-std::string_view Trimmed(std::string_view text) {
-    const std::size_t first = text.find_first_not_of(kSpace);
-    if (first == std::string_view::npos)
-        return {};
-    const std::size_t last = text.find_last_not_of(kSpace);
-    return text.substr(first, last - first + 1);
-}
 
 bool IsTuneInBase(std::string_view base) {
     if (base.empty() || base.size() > kMaxTuneInBaseBytes || base[0] != '/' ||
@@ -72,8 +63,8 @@ std::optional<std::string> CleanDirectoryText(std::string_view text) {
         if (cleaned.size() > 2 * kMaxDirectoryTextBytes)
             break;
     }
-    std::string_view kept = Trimmed(cleaned);
-    kept = Trimmed(util::CutUtf8(kept, kMaxDirectoryTextBytes));
+    std::string_view kept = util::Trim(cleaned, util::kAsciiWhiteSpace);
+    kept = util::Trim(util::CutUtf8(kept, kMaxDirectoryTextBytes), util::kAsciiWhiteSpace);
     return std::string(kept);
 }
 
@@ -145,15 +136,15 @@ std::optional<std::string> PlaylistStreamUrl(std::string_view pls) {
         std::size_t end = pls.find('\n', at);
         if (end == std::string_view::npos)
             end = pls.size();
-        const std::string_view line = Trimmed(pls.substr(at, end - at));
+        const std::string_view line = util::Trim(pls.substr(at, end - at), util::kAsciiWhiteSpace);
         at = end + 1;
         const std::size_t equals = line.find('=');
         if (equals == std::string_view::npos)
             continue;
-        const std::string_view key = Trimmed(line.substr(0, equals));
+        const std::string_view key = util::Trim(line.substr(0, equals), util::kAsciiWhiteSpace);
         if (key.size() != 5 || !StartsWithNoCase(key, "file1"))
             continue;
-        const std::string_view value = Trimmed(line.substr(equals + 1));
+        const std::string_view value = util::Trim(line.substr(equals + 1), util::kAsciiWhiteSpace);
         if (!IsStationUrl(value))
             return std::nullopt;
         return std::string(value);

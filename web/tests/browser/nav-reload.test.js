@@ -2,34 +2,12 @@
 // reload, a bookmarked view in a new browser, and a view in the URL that names no node.
 import { test, before, after } from "node:test";
 import assert from "node:assert/strict";
+import { listed, choose, expandNode, crumbs, label, openFirstAlbum } from "./nav-helpers.js";
 import { launch, close, openTree, item } from "./harness.js";
 
 let browser;
 before(async () => { browser = await launch(); });
 after(async () => { await close(browser); });
-
-const listed = (page, node) =>
-  page.waitForFunction((n) => document.getElementById("listing").dataset.node === n, node, { timeout: 20000 });
-const choose = async (page, id) => {
-  await item(page, id).locator(":scope > .row .label").click();
-  await listed(page, id);
-};
-const expandNode = async (page, id) => {
-  const li = item(page, id);
-  if ((await li.getAttribute("aria-expanded")) !== "true") await li.locator(":scope > .row > .twisty").click();
-  await page.waitForSelector(`li[data-id="${id}"][data-state=loaded]`, { timeout: 20000 });
-};
-const crumbs = (page) => page.locator("#breadcrumb li").allTextContents();
-const label = (page, id) => item(page, id).locator(":scope > .row .label").textContent();
-// Opens the first album tile of the pane; its node and title.
-async function openFirstAlbum(page) {
-  const tile = page.locator("#containers button.container").first();
-  const node = await tile.getAttribute("data-node");
-  const title = await tile.getAttribute("title");
-  await tile.click();
-  await listed(page, node);
-  return { node, title };
-}
 
 test("a reload opens the same view, with the tree expanded as it was", async () => {
   const page = await openTree(browser, "demo");
