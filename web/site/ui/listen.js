@@ -514,7 +514,8 @@ export function createListener({ onPlayerLoad = () => {}, labels, language = "en
   $("volume").setAttribute("aria-label", labels.volume);
 
   // The player as the play queue drives it.
-  const player = { load, stop, redraw: drawRows, list: () => state.list };
+  // Its list is the one shown, in the order shown.
+  const player = { load, stop, redraw: drawRows, list: () => ({ ...state.list, tracks: state.view }) };
   queue?.attach(player);
   // A list of rows found elsewhere (the search) played from one of them.
   const playTracks = (tracks, index) => play(tracks, "search", index);

@@ -29,7 +29,9 @@ export function queueItem(track, node = "", index = -1) {
     count += 1;
   }
   const stream = typeof item.stream === "string" && STREAM.test(item.stream);
-  const url = typeof item.url === "string" && /^https?:\/\/[^\s]+$/i.test(item.url);
+  // A station's own stream, or this site's own path for a track it fetches (another media server's
+  // track, a directory's station): library.cgi's, relative to the page.
+  const url = typeof item.url === "string" && (/^https?:\/\/[^\s]+$/i.test(item.url) || /^webapi\/library\.cgi\?[^\s]+$/.test(item.url));
   if (!url) delete item.url;
   if (!stream) delete item.stream;
   if (!stream && !url) return null;
@@ -577,8 +579,11 @@ export function createQueue({ labels, onStatus = () => {}, random = Math.random 
   });
   allNext.textContent = labels.playNext;
   allAdd.textContent = labels.addToQueue;
-  allNext.setAttribute("aria-label", labels.playAllNext);
-  allAdd.setAttribute("aria-label", labels.addAllToQueue);
+  // Their names are the words they show; the whole sentence is their description.
+  allNext.removeAttribute("aria-label");
+  allAdd.removeAttribute("aria-label");
+  allNext.title = labels.playAllNext;
+  allAdd.title = labels.addAllToQueue;
   allNext.disabled = allAdd.disabled = true;
   $("play-all").after(allNext, allAdd);
 

@@ -177,7 +177,14 @@ test("the Media Session names the playing track and plays, pauses, skips and see
     const m = navigator.mediaSession.metadata;
     return { title: m.title, artist: m.artist, album: m.album, artwork: m.artwork.length, state: navigator.mediaSession.playbackState };
   });
-  assert.deepEqual(await metadata(), { title: rows[1].title, artist: rows[1].artist, album: rows[1].album, artwork: 0, state: "playing" });
+  // The artwork is the track's cover when it has one (library.cgi's covers), as it comes.
+  const cover = await page.evaluate(async (stream) => {
+    const reply = await (await fetch(`webapi/library.cgi?action=covers&streams=${encodeURIComponent(stream)}`)).json();
+    return reply.covers[stream] ? new URL(reply.covers[stream], document.baseURI).href : null;
+  }, rows[1].stream);
+  await page.waitForFunction((n) => navigator.mediaSession.metadata?.artwork.length === n, cover ? 1 : 0, { timeout: 10000 });
+  assert.deepEqual(await metadata(), { title: rows[1].title, artist: rows[1].artist, album: rows[1].album, artwork: cover ? 1 : 0, state: "playing" });
+  if (cover) assert.equal(await page.evaluate(() => navigator.mediaSession.metadata.artwork[0].src), cover);
 
   await page.evaluate(() => window.mediaHandlers.pause({ action: "pause" }));
   await page.waitForSelector("#player[data-state=paused]");

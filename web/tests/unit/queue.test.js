@@ -181,11 +181,17 @@ test("stored values that are not a queue leave it empty; unplayable items are re
   assert.deepEqual([...m.order].sort(), m.items.map((i) => i.key).sort());
 });
 
-test("a queue item keeps a row's scalar fields only, and only rows with a stream or an http(s) address", () => {
+test("a queue item keeps a row's scalar fields only, and only rows with a stream, an http(s) address or this site's library.cgi path", () => {
   const item = queueItem({ stream: "12.mp3", title: "x".repeat(10), nested: { a: 1 }, list: [1], bad: NaN, fn: () => 1, "we ird": "y" }, "n", 3);
   assert.deepEqual(item, { stream: "12.mp3", title: "xxxxxxxxxx", from: "n", at: 3 });
   assert.equal(queueItem({ url: "https://radio.example/stream" }).url, "https://radio.example/stream");
   assert.equal(queueItem({ url: "ftp://radio.example/stream" }), null);
+  // This site's own path for another media server's track or a directory's station, nothing else relative.
+  const remote = "webapi/library.cgi?action=remote_stream&node=x&object=1";
+  assert.equal(queueItem({ url: remote }).url, remote);
+  assert.equal(queueItem({ url: "javascript:alert(1)" }), null);
+  assert.equal(queueItem({ url: "/etc/passwd" }), null);
+  assert.equal(queueItem({ url: "webapi/audiotree.cgi?action=x" }), null);
   assert.equal(queueItem({ stream: "12.flac", title: "y".repeat(5000) }).title, undefined);
   assert.equal(queueItem(null), null);
   assert.ok(QUEUE_LIMIT >= 10000, "a 10,000-track list fits");
