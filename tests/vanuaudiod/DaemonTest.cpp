@@ -1074,6 +1074,14 @@ unsigned InterfaceFlags(const char* interfaceName) {
     return asked ? static_cast<unsigned short>(request.ifr_flags) : 0u;
 }
 
+// The peer side of the link set down: the carrier of this side goes (the kernel says so a moment
+// later, within two seconds).
+void WaitUntilTheCarrierIsGone() {
+    for (int waited = 0; (InterfaceFlags(kHostInterface) & IFF_RUNNING) != 0 && waited < 2000;
+         waited += 50)
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+}
+
 }  // namespace
 
 // The cable (or the switch port, or the Wi-Fi association) goes and comes back while the
@@ -1089,9 +1097,7 @@ TEST_F(AudioDaemon, AfterItsLinkLosesItsCarrierAndGetsItBackALanServerIsListedAg
     ASSERT_NO_FATAL_FAILURE(ListBeforeTheFault(lan, "uuid:lan"));
     std::this_thread::sleep_for(std::chrono::milliseconds(1500));  // the link in use a while
     ASSERT_TRUE(peer_.RunOnPeer("ip link set vb down"));
-    for (int waited = 0; (InterfaceFlags(kHostInterface) & IFF_RUNNING) != 0 && waited < 2000;
-         waited += 50)
-        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    WaitUntilTheCarrierIsGone();
     // Up, with its address, and no carrier.
     ASSERT_EQ(InterfaceFlags(kHostInterface) & (IFF_UP | IFF_RUNNING), unsigned{IFF_UP});
     ASSERT_NO_FATAL_FAILURE(ExpireDuringTheFault(lan, "uuid:lan"));
@@ -1114,12 +1120,14 @@ TEST_F(AudioDaemon, StartedWithoutACarrierItFindsTheLanServersWhenTheLinkComesUp
     lan.Add("uuid:lan", FakeMediaServers::DescriptionXml("uuid:lan", "LAN Server", "/cd"));
     lan.AnswerSearches("uuid:lan", 1800);
     ASSERT_TRUE(peer_.RunOnPeer("ip link set vb down"));
+    // The kernel tells a carrier's loss a moment later: the daemon starts once it is gone.
+    WaitUntilTheCarrierIsGone();
+    ASSERT_EQ(InterfaceFlags(kHostInterface) & (IFF_UP | IFF_RUNNING), unsigned{IFF_UP});
     {
         const ScopedLeakSuppressions suppressions(SourceDir() +
                                                   "/tests/vanuaudiod/gupnp-link-change.supp");
         daemon_ = StartDaemon();
     }
-    ASSERT_EQ(InterfaceFlags(kHostInterface) & (IFF_UP | IFF_RUNNING), unsigned{IFF_UP});
     EXPECT_TRUE(WaitForLog("network: va has no carrier; searching again when it has one", 3000))
         << ReadFile("/tmp/vanuaudiod.log");
     EXPECT_EQ(Reply(Call(16, "0 10"))["total"], 0);
