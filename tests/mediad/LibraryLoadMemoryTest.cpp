@@ -170,6 +170,9 @@ long HeapOfAView(const std::string& dbPath) {
 // title, its places in the listings (all music, its folder, album, artist's album and genre) and
 // its share of the containers. 168 bytes a track when every number was kept 64 bits wide.
 TEST(LibraryLoadMemory, TheLoadedViewHoldsAtMostAHundredAndTwentyEightBytesATrack) {
+#ifdef HARMONA_SANITIZE
+    GTEST_SKIP() << "the heap in use is glibc's figure; AddressSanitizer's allocator gives none";
+#endif
     MakeDirs("/var/packages/Harmona/var");
     const std::string dbPath = "/var/packages/Harmona/var/view.db";
     ASSERT_NO_FATAL_FAILURE(WriteLibrary(dbPath, kShortName));
@@ -177,9 +180,7 @@ TEST(LibraryLoadMemory, TheLoadedViewHoldsAtMostAHundredAndTwentyEightBytesATrac
     std::printf("the view of %d tracks holds %ld bytes of heap (%ld a track)\n", kTracks, held,
                 held / kTracks);
     ASSERT_GT(held, 0);
-#ifndef HARMONA_SANITIZE
     EXPECT_LE(held, 128L * kTracks);
-#endif
 }
 
 }  // namespace
