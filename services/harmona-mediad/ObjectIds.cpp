@@ -42,23 +42,6 @@ bool ParseFolder(const std::string& escaped, std::string* folder) {
 
 }  // namespace
 
-std::string EscapeIdPart(const std::string& text) {
-    static const char kHex[] = "0123456789ABCDEF";
-    std::string out;
-    out.reserve(text.size());
-    for (const char c : text) {
-        const unsigned char byte = static_cast<unsigned char>(c);
-        if (std::isalnum(byte) || c == '.' || c == '_' || c == '~' || c == '-') {
-            out += c;
-        } else {
-            out += '%';
-            out += kHex[byte >> 4];
-            out += kHex[byte & 15];
-        }
-    }
-    return out;
-}
-
 bool UnescapeIdPart(const std::string& text, std::string* out) {
     out->clear();
     for (std::size_t i = 0; i < text.size(); ++i) {

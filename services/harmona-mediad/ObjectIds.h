@@ -15,6 +15,8 @@
 #include <cstdint>
 #include <string>
 
+#include "platform/medialib/ObjectIdPart.h"
+
 namespace harmona::mediad {
 
 inline constexpr const char* kRootId = "0";
@@ -42,8 +44,8 @@ struct ObjectRef {
     std::string container;                    // TrackIn: the id of the listing container
 };
 
-// Percent-encodes every byte outside [A-Za-z0-9._~-].
-std::string EscapeIdPart(const std::string& text);
+// Percent-encodes every byte outside [A-Za-z0-9._~-] (platform/medialib/ObjectIdPart.h).
+using medialib::EscapeIdPart;
 // The reverse; false on a malformed "%" sequence.
 bool UnescapeIdPart(const std::string& text, std::string* out);
 

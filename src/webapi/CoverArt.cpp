@@ -12,8 +12,10 @@
 #include <utility>
 #include <vector>
 
+#include "common/util/HexDigit.h"
 #include "platform/medialib/LibraryDatabase.h"
 #include "platform/medialib/MediaFiles.h"
+#include "platform/medialib/ObjectIdPart.h"
 #include "platform/medialib/StreamName.h"
 #include "platform/paths/PlatformPaths.h"
 #include "src/webapi/ApiError.h"
@@ -40,33 +42,6 @@ constexpr ApiError kTooManyStreams{kStatusTooLarge, kSystemSection, kSystemText,
 constexpr ApiError kLibraryUnreadable{kStatusUnavailable, kSystemSection, kSystemText, 705,
                                       "library_unavailable"};
 
-// A part of a media server object id: every byte outside [A-Za-z0-9._~-] percent-encoded (upper
-// case hex), as the local media server writes its ids.
-std::string EscapeIdPart(std::string_view text) {
-    static const char kHex[] = "0123456789ABCDEF";
-    std::string out;
-    out.reserve(text.size());
-    for (const char c : text) {
-        const unsigned char byte = static_cast<unsigned char>(c);
-        if (std::isalnum(byte) || c == '.' || c == '_' || c == '~' || c == '-') {
-            out += c;
-        } else {
-            out += '%';
-            out += kHex[byte >> 4];
-            out += kHex[byte & 15];
-        }
-    }
-    return out;
-}
-
-int HexValue(char c) {
-    if (c >= '0' && c <= '9')
-        return c - '0';
-    if (c >= 'A' && c <= 'F')
-        return c - 'A' + 10;
-    return -1;
-}
-
 // The reverse of EscapeIdPart, only for text that it writes (so that one name has one id).
 std::optional<std::string> UnescapeIdPart(std::string_view text) {
     std::string out;
@@ -77,14 +52,13 @@ std::optional<std::string> UnescapeIdPart(std::string_view text) {
         }
         if (i + 2 >= text.size())
             return std::nullopt;
-        const int high = HexValue(text[i + 1]);
-        const int low = HexValue(text[i + 2]);
-        if (high < 0 || low < 0)
+        const int byte = util::HexByteValue(text[i + 1], text[i + 2]);
+        if (byte < 0)
             return std::nullopt;
-        out += static_cast<char>(high * 16 + low);
+        out += static_cast<char>(byte);
         i += 2;
     }
-    if (EscapeIdPart(out) != text)
+    if (medialib::EscapeIdPart(out) != text)
         return std::nullopt;
     return out;
 }
@@ -186,9 +160,9 @@ int ServeAlbums(ActionHandler& handler, WebMan& webMan) {
     for (const auto& entry : albums) {
         const Album& album = entry.second;
         Json::Value row(Json::objectValue);
-        row["node"] =
-            artist ? viewPrefix + EscapeIdPart(album.name)
-                   : viewPrefix + EscapeIdPart(album.albumArtist) + "/" + EscapeIdPart(album.name);
+        row["node"] = artist ? viewPrefix + medialib::EscapeIdPart(album.name)
+                             : viewPrefix + medialib::EscapeIdPart(album.albumArtist) + "/" +
+                                   medialib::EscapeIdPart(album.name);
         row["title"] = album.name;
         row["artist"] = album.albumArtist;
         row["year"] = Json::Int64(album.year);

@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "common/util/Utf8.h"
+#include "platform/medialib/ObjectIdPart.h"
 #include "platform/medialib/StreamName.h"
 
 namespace harmona::webapi {
@@ -13,24 +14,6 @@ namespace harmona::webapi {
 namespace {
 
 using sqlite::Statement;
-
-// Every byte outside [A-Za-z0-9._~-] percent-encoded, as the media server writes its ids.
-std::string EscapeIdPart(const std::string& text) {
-    static const char kHex[] = "0123456789ABCDEF";
-    std::string out;
-    out.reserve(text.size());
-    for (const char c : text) {
-        const unsigned char byte = static_cast<unsigned char>(c);
-        if (std::isalnum(byte) || c == '.' || c == '_' || c == '~' || c == '-') {
-            out += c;
-        } else {
-            out += '%';
-            out += kHex[byte >> 4];
-            out += kHex[byte & 15];
-        }
-    }
-    return out;
-}
 
 bool IsWordByte(unsigned char byte) {
     return byte >= 0x80 || std::isalnum(byte);
@@ -213,11 +196,12 @@ SearchStatus SearchLibrary(sqlite::Database& db, const std::vector<std::string>&
 }
 
 std::string AlbumNode(const std::string& albumArtist, const std::string& album) {
-    return "musiclib_album:" + EscapeIdPart(albumArtist) + "/" + EscapeIdPart(album);
+    return "musiclib_album:" + medialib::EscapeIdPart(albumArtist) + "/" +
+           medialib::EscapeIdPart(album);
 }
 
 std::string ArtistNode(const std::string& albumArtist) {
-    return "musiclib_artist:" + EscapeIdPart(albumArtist);
+    return "musiclib_artist:" + medialib::EscapeIdPart(albumArtist);
 }
 
 }  // namespace harmona::webapi
