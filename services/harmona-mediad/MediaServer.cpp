@@ -340,15 +340,16 @@ MediaServer::~MediaServer() {
 
 void MediaServer::Start(std::function<void()> onLoopbackReady) {
     onLoopbackReady_ = std::move(onLoopbackReady);
-    // The context manager makes the loopback context too, within its first turns of the loop; a
-    // context of our own is made only when it has not, so that nothing binds the port twice (GLib
-    // would warn of a port in use at every start).
-    StartContextManager();
-    loopbackRetry_ =
-        gupnp::Source::Timeout(kLoopbackRetryMs, [this] { return !loopback_ && !TryLoopback(); });
     // The library as it is now, loaded before anything is served; later changes are loaded by a
     // thread (RefreshLibrary), so that SSDP and the other requests never wait for a load.
     directory_->SystemUpdateId();
+    // The context manager makes the loopback context too, within its first turns of the loop; a
+    // context of our own is made only when it has not, so that nothing binds the port twice (GLib
+    // warns of a port in use). Both start after the load: a timer started before a load of some
+    // seconds would fire in the loop's first turn, ahead of the manager's context.
+    StartContextManager();
+    loopbackRetry_ =
+        gupnp::Source::Timeout(kLoopbackRetryMs, [this] { return !loopback_ && !TryLoopback(); });
     libraryWatch_ = gupnp::Source::Timeout(kLibraryWatchMs, [this] {
         RefreshLibrary();
         return true;

@@ -20,6 +20,8 @@
 #include <thread>
 #include <vector>
 
+#include "platform/lib/sqlite/Database.h"
+#include "platform/paths/PlatformPaths.h"
 #include "tests/harness/Fixtures.h"
 #include "tests/harness/Network.h"
 #include "tests/harness/Sandbox.h"
@@ -33,6 +35,8 @@ using Clock = std::chrono::steady_clock;
 constexpr const char* kPeerSide = "192.0.2.2";
 constexpr const char* kPeerInterface = "hm1";
 constexpr int kRecoveryBoundMs = 5000;
+// How long the test waits for its own lock on library.db (nobody else holds it).
+constexpr int kLockWaitMs = 1000;
 
 long MsSince(Clock::time_point start) {
     return static_cast<long>(
@@ -360,6 +364,29 @@ TEST_F(MediaServerOnAChangingNetwork, AStartPrintsNoWarningAboutItsOwnPort) {
     EXPECT_EQ(log.find("Address already in use"), std::string::npos) << log;
     EXPECT_EQ(log.find("Unable to listen"), std::string::npos) << log;
     EXPECT_EQ(log.find("WARNING"), std::string::npos) << log;
+}
+
+// The indexer holding library.db locked as the server starts keeps its loop waiting for the load
+// for seconds; the server still binds its own loopback port once.
+TEST_F(MediaServerOnAChangingNetwork, AStartThatWaitsSecondsForTheLibraryPrintsNoWarningAboutItsOwnPort) {
+    SetUpNetwork();
+    sqlite::Database writer =
+        sqlite::Database::Open(paths::kLibraryDb, SQLITE_OPEN_READWRITE, kLockWaitMs);
+    ASSERT_TRUE(writer);
+    ASSERT_EQ(writer.Execute("BEGIN EXCLUSIVE"), SQLITE_OK);
+    std::thread release([&writer] {
+        std::this_thread::sleep_for(std::chrono::seconds(3));
+        writer.Execute("COMMIT");
+    });
+    SsdpRecorder recorder;
+    const bool started = StartOnTheNetwork(recorder);
+    release.join();
+    ASSERT_TRUE(started) << Describe(recorder.Notices());
+    EXPECT_EQ(SoapBrowse("0").entries.size(), 7u);
+    std::this_thread::sleep_for(std::chrono::seconds(1));
+    const std::string log = ReadFile("/tmp/harmona-mediad.log");
+    EXPECT_EQ(log.find("Address already in use"), std::string::npos) << log;
+    EXPECT_EQ(log.find("Unable to listen"), std::string::npos) << log;
 }
 
 // Requests whose body is too large, of unstated size or out of place are answered from their
