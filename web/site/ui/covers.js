@@ -5,6 +5,7 @@
 // login; the browser keeps them, so a reload does not fetch them again); a track or an album
 // without a cover shows a neutral placeholder, never a broken image. Only covers that exist are
 // requested.
+import { counted } from "./text.js";
 const API = "webapi/library.cgi";
 const BATCH = 200; // stream ids per covers request (library.cgi's bound)
 
@@ -22,10 +23,6 @@ export function isArtistNode(node) {
 const COVER_PATH = /^media\/art\/[0-9]{1,18}\.(jpg|png)$/;
 export function checkedCover(path) {
   return typeof path === "string" && COVER_PATH.test(path) ? path : null;
-}
-
-function format(template, values) {
-  return String(template).replace(/\{(\w+)\}/g, (_, name) => String(values[name] ?? ""));
 }
 
 async function getJson(params, signal) {
@@ -192,7 +189,7 @@ export function createCovers({ labels }) {
       const parts = [];
       if (album && typeof album.artist === "string" && album.artist !== "" && !isArtistNode(list.node)) parts.push(album.artist);
       if (album && Number.isInteger(album.year) && album.year > 0) parts.push(String(album.year));
-      if (album && Number.isInteger(album.tracks)) parts.push(format(labels.coverTrackCount, { count: album.tracks }));
+      if (album && Number.isInteger(album.tracks)) parts.push(counted(labels, "coverTrackCount", album.tracks));
       facts.textContent = parts.join(" · ");
       button.classList.add("album-tile");
       button.replaceChildren(coverElement(album?.cover ?? null, "cover-tile"), name, facts);

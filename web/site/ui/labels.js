@@ -17,7 +17,7 @@ export const LABELS = {
     noReply: "The server did not answer this request (HTTP {status}).", badReply: "The server sent a reply that cannot be read.",
     unknownError: "Error {sec} / {key}", offline: "The server cannot be reached.",
     playAll: "Play all", play: "Play", pause: "Pause", next: "Next", previous: "Previous",
-    seek: "Position", volume: "Volume", trackCount: "{count} tracks", cannotPlay: "This track cannot be played.",
+    seek: "Position", volume: "Volume", trackCount: "{count} tracks", trackCountOne: "{count} track", cannotPlay: "This track cannot be played.",
   },
   ger: {
     title: "Harmona Audio", tree: "Audioquellen", rerandom: "Neue Zufalls-100",
@@ -27,7 +27,7 @@ export const LABELS = {
     noReply: "Der Server hat diese Anfrage nicht beantwortet (HTTP {status}).", badReply: "Die Antwort des Servers ist nicht lesbar.",
     unknownError: "Fehler {sec} / {key}", offline: "Der Server ist nicht erreichbar.",
     playAll: "Alle abspielen", play: "Abspielen", pause: "Pause", next: "Weiter", previous: "Zurück",
-    seek: "Position", volume: "Lautstärke", trackCount: "{count} Titel", cannotPlay: "Dieser Titel kann nicht abgespielt werden.",
+    seek: "Position", volume: "Lautstärke", trackCount: "{count} Titel", trackCountOne: "{count} Titel", cannotPlay: "Dieser Titel kann nicht abgespielt werden.",
   },
   fre: {
     title: "Harmona Audio", tree: "Sources audio", rerandom: "Nouveau Aléatoire 100",
@@ -37,7 +37,7 @@ export const LABELS = {
     noReply: "Le serveur n'a pas répondu à cette requête (HTTP {status}).", badReply: "La réponse du serveur est illisible.",
     unknownError: "Erreur {sec} / {key}", offline: "Le serveur est injoignable.",
     playAll: "Tout lire", play: "Lire", pause: "Pause", next: "Suivant", previous: "Précédent",
-    seek: "Position", volume: "Volume", trackCount: "{count} pistes", cannotPlay: "Cette piste ne peut pas être lue.",
+    seek: "Position", volume: "Volume", trackCount: "{count} pistes", trackCountOne: "{count} piste", cannotPlay: "Cette piste ne peut pas être lue.",
   },
   spn: {
     title: "Harmona Audio", tree: "Fuentes de audio", rerandom: "Nuevo Aleatorio 100",
@@ -47,7 +47,7 @@ export const LABELS = {
     noReply: "El servidor no respondió a esta solicitud (HTTP {status}).", badReply: "La respuesta del servidor no se puede leer.",
     unknownError: "Error {sec} / {key}", offline: "No se puede contactar con el servidor.",
     playAll: "Reproducir todo", play: "Reproducir", pause: "Pausa", next: "Siguiente", previous: "Anterior",
-    seek: "Posición", volume: "Volumen", trackCount: "{count} pistas", cannotPlay: "Esta pista no se puede reproducir.",
+    seek: "Posición", volume: "Volumen", trackCount: "{count} pistas", trackCountOne: "{count} pista", cannotPlay: "Esta pista no se puede reproducir.",
   },
   ita: {
     title: "Harmona Audio", tree: "Sorgenti audio", rerandom: "Nuova Casuale 100",
@@ -57,7 +57,7 @@ export const LABELS = {
     noReply: "Il server non ha risposto a questa richiesta (HTTP {status}).", badReply: "La risposta del server non è leggibile.",
     unknownError: "Errore {sec} / {key}", offline: "Il server non è raggiungibile.",
     playAll: "Riproduci tutto", play: "Riproduci", pause: "Pausa", next: "Successivo", previous: "Precedente",
-    seek: "Posizione", volume: "Volume", trackCount: "{count} brani", cannotPlay: "Questo brano non può essere riprodotto.",
+    seek: "Posizione", volume: "Volume", trackCount: "{count} brani", trackCountOne: "{count} brano", cannotPlay: "Questo brano non può essere riprodotto.",
   },
   jpn: {
     title: "Harmona オーディオ", tree: "オーディオソース", rerandom: "ランダム 100 を再作成",
@@ -67,7 +67,7 @@ export const LABELS = {
     noReply: "サーバーがこの要求に応答しませんでした (HTTP {status})。", badReply: "サーバーの応答を読み取れません。",
     unknownError: "エラー {sec} / {key}", offline: "サーバーに接続できません。",
     playAll: "すべて再生", play: "再生", pause: "一時停止", next: "次へ", previous: "前へ",
-    seek: "再生位置", volume: "音量", trackCount: "{count} 曲", cannotPlay: "このトラックは再生できません。",
+    seek: "再生位置", volume: "音量", trackCount: "{count} 曲", trackCountOne: "{count} 曲", cannotPlay: "このトラックは再生できません。",
   },
   chs: {
     title: "Harmona 音频", tree: "音频来源", rerandom: "重新生成随机 100",
@@ -77,7 +77,7 @@ export const LABELS = {
     noReply: "服务器未响应此请求 (HTTP {status})。", badReply: "无法读取服务器的响应。",
     unknownError: "错误 {sec} / {key}", offline: "无法连接服务器。",
     playAll: "全部播放", play: "播放", pause: "暂停", next: "下一首", previous: "上一首",
-    seek: "播放位置", volume: "音量", trackCount: "{count} 首", cannotPlay: "无法播放此曲目。",
+    seek: "播放位置", volume: "音量", trackCount: "{count} 首", trackCountOne: "{count} 首", cannotPlay: "无法播放此曲目。",
   },
   cht: {
     title: "Harmona 音訊", tree: "音訊來源", rerandom: "重新產生隨機 100",
@@ -87,7 +87,7 @@ export const LABELS = {
     noReply: "伺服器未回應此要求 (HTTP {status})。", badReply: "無法讀取伺服器的回應。",
     unknownError: "錯誤 {sec} / {key}", offline: "無法連線至伺服器。",
     playAll: "全部播放", play: "播放", pause: "暫停", next: "下一首", previous: "上一首",
-    seek: "播放位置", volume: "音量", trackCount: "{count} 首", cannotPlay: "無法播放此曲目。",
+    seek: "播放位置", volume: "音量", trackCount: "{count} 首", trackCountOne: "{count} 首", cannotPlay: "無法播放此曲目。",
   },
 };
 

@@ -2,6 +2,7 @@
 // tools above a listed playlist (rename, delete, a smart playlist's rules), the buttons of its rows
 // (move up, move down, remove) and "Add to" on every list of tracks. Every change is a POST to
 // webapi/library.cgi; a refused one is worded from its "error" code in the user's language.
+import { counted, format } from "./text.js";
 const API = "webapi/library.cgi";
 const PERSONAL = "musiclib_music_personal";
 const SHARED = "musiclib_music_shared";
@@ -18,10 +19,6 @@ const ORDERS = [["", "orderPath"], ["artist", "orderArtist"], ["album", "orderAl
 
 const PLAYLIST_NODE = /^musiclib_music_(personal|shared)\/playlist\/(.+)$/;
 const SMART_NODE = /^musiclib_music_(personal|shared)\/smart\/(.+)$/;
-
-function format(template, values) {
-  return String(template).replace(/\{(\w+)\}/g, (_, name) => String(values[name] ?? ""));
-}
 
 // One change: resolves to {ok: true, body} or {ok: false, error, rule, status}.
 async function post(params) {
@@ -325,7 +322,7 @@ export function createPlaylists({ labels, onStatus, onFailure, refreshCategory, 
     const streams = tracks.map((t) => t.stream).filter((s) => typeof s === "string");
     if (!target || streams.length === 0) return;
     const name = targets().find((t) => t.id === target)?.text ?? "";
-    await change({ action: "pladd", node: target, streams: streams.join(",") }, format(labels.plAdded, { count: streams.length, name }));
+    await change({ action: "pladd", node: target, streams: streams.join(",") }, counted(labels, "plAdded", streams.length, { name }));
   }
 
   // Entry numbers name the rows as this page listed them; `expect` (the track seen there) makes the

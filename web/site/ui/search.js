@@ -4,6 +4,7 @@
 // them, Enter plays or opens the result, Escape clears the search.
 import { failureCode, readApiReply } from "./failures.js";
 import { formatDuration } from "./listen.js";
+import { counted } from "./text.js";
 
 const API = "webapi/library.cgi";
 // The pause after a keystroke before the query is sent: typing on sends one query, not one per
@@ -140,11 +141,11 @@ export function createSearch({ labels, playTracks, openNode, onFailure = () => {
           () => playTracks(tracks, index))), more.tracks === true));
     if (albums.length > 0)
       groups.push(group("albums", labels.searchAlbums, albums.map((album) =>
-        option("album", String(album.title ?? ""), [album.artist, labels.searchTrackCount.replace("{count}", String(album.tracks ?? 0))].filter(Boolean).join(" · "),
+        option("album", String(album.title ?? ""), [album.artist, counted(labels, "searchTrackCount", Number(album.tracks ?? 0))].filter(Boolean).join(" · "),
           () => openNode(String(album.node), String(album.title ?? "")))), more.albums === true));
     if (artists.length > 0)
       groups.push(group("artists", labels.searchArtists, artists.map((artist) =>
-        option("artist", String(artist.title ?? ""), labels.searchAlbumCount.replace("{count}", String(artist.albums ?? 0)),
+        option("artist", String(artist.title ?? ""), counted(labels, "searchAlbumCount", Number(artist.albums ?? 0)),
           () => openNode(String(artist.node), String(artist.title ?? "")))), more.artists === true));
     if (groups.length === 0) {
       const none = document.createElement("div");

@@ -66,7 +66,7 @@ test("New Playlist makes a personal playlist; tracks are added from an album, re
     /Evening Walk/.test(document.getElementById("status").textContent), null, { timeout: 10000 });
   // One more, by a row's own button: the first track again, at the end.
   await page.locator("#tracks .track").first().locator(".pl-add").click();
-  await page.waitForFunction(() => /1 tracks added/.test(document.getElementById("status").textContent), null, { timeout: 10000 });
+  await page.waitForFunction(() => /1 track added/.test(document.getElementById("status").textContent), null, { timeout: 10000 });
 
   await selectNode(page, item(page, node));
   assert.deepEqual(await streams(page), [...albumStreams, albumStreams[0]]);
@@ -155,7 +155,7 @@ test("a smart playlist lists the tracks its rules select, and its rules are edit
   await page.waitForFunction(() => document.getElementById("status").textContent === "Saved.", null, { timeout: 10000 });
   await waitListed(page, node);
   const expected = sql(`SELECT count(*) FROM track WHERE genre = 'Jazz' AND artist = '${artist.replace(/'/g, "''")}'`);
-  assert.equal(String(await page.locator("#list-count").textContent()), `${expected} tracks`);
+  assert.equal(String(await page.locator("#list-count").textContent()), `${expected} ${Number(expected) === 1 ? "track" : "tracks"}`);
   const after = readFileSync(file, "utf8");
   assert.equal(others(after), others(before), "the other sections keep their bytes");
   assert.match(after, /\[Jazz Only\]\nartist=.+\ngenre=Jazz\norder=title\n/);

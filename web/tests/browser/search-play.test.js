@@ -24,7 +24,7 @@ test("a track found plays, an album or an artist found opens in the pane", async
   await page.waitForFunction((node) => document.getElementById("listing").dataset.node === node, reply.albums[0].node, { timeout: 15000 });
   assert.equal(await page.locator("#list-title").textContent(), reply.albums[0].title);
   assert.equal(await page.locator("#tracks .track").count() > 0, true);
-  assert.equal(await page.locator("#list-count").textContent(), `${reply.albums[0].tracks} tracks`);
+  assert.equal(await page.locator("#list-count").textContent(), `${reply.albums[0].tracks} ${reply.albums[0].tracks === 1 ? "track" : "tracks"}`);
 
   await search(page, "copper");
   await page.locator("#search-results [data-group=artists] [role=option]").first().click();
