@@ -1,9 +1,10 @@
 // The play queue: the one list the player plays. "Play all" and a click on a row replace it with the
-// listed rows; "Play next" and "Add to queue" put rows after the playing one or at its end; its
+// listed rows (the rows put in by hand that have not played yet stay, next); "Play next" and "Add to queue" put rows after the playing one or at its end; its
 // panel (opened from the player bar) removes, reorders (drag, or the move buttons) and clears. Shuffle
 // plays the items in a random order kept beside the queue's own; repeat plays one item again, or
 // the whole queue again. The queue, the playing item, the time in it and the volume are kept in the
 // browser's storage and put back paused after a reload.
+import { counted, format } from "./text.js";
 export const QUEUE_KEY = "harmona.queue";
 export const PLAYER_KEY = "harmona.player";
 export const QUEUE_LIMIT = 20000; // items; more is refused with a word to the user
@@ -61,25 +62,41 @@ export function createQueueModel(random = Math.random) {
     repeat: "off",
   };
   const keyed = (item) => ({ ...item, key: next++ });
+  // A row put in the queue by hand ("Play next", "Add to queue"): a new list played keeps it.
+  const picked = (item) => ({ ...keyed(item), picked: true });
   const indexOf = (key) => m.items.findIndex((i) => i.key === key);
 
   m.position = () => (m.current === null ? -1 : indexOf(m.current));
   m.currentItem = () => m.items[m.position()] ?? null;
   m.room = () => QUEUE_LIMIT - m.items.length;
 
+  // The rows put in the queue by hand that have not played yet, in play order.
+  const waitingPicks = () => {
+    const keys = m.shuffle ? m.order : m.items.map((i) => i.key);
+    const after = m.current === null ? 0 : keys.indexOf(m.current) + 1;
+    return keys.slice(after).map((key) => m.items[indexOf(key)]).filter((item) => item?.picked);
+  };
   // The listed rows, playing the one at `start`; -1: the first in play order (in shuffle, any).
+  // The rows put in the queue by hand that have not played yet stay: they play right after the
+  // chosen row, before the rest of the list.
   m.replace = (items, start = 0) => {
-    m.items = items.slice(0, QUEUE_LIMIT).map(keyed);
-    const at = start < 0 ? (m.shuffle ? Math.floor(random() * m.items.length) : 0) : Math.min(start, m.items.length - 1);
-    const first = m.items[at];
+    const picks = waitingPicks();
+    const listed = items.slice(0, Math.max(0, QUEUE_LIMIT - picks.length)).map(keyed);
+    const at = start < 0 ? (m.shuffle ? Math.floor(random() * listed.length) : 0) : Math.min(start, listed.length - 1);
+    const first = listed[at];
+    m.items = first ? [...listed.slice(0, at + 1), ...picks, ...listed.slice(at + 1)] : picks;
     m.current = first ? first.key : null;
-    if (m.shuffle) m.reshuffle();
+    if (m.shuffle) {
+      m.reshuffle();
+      const pickKeys = new Set(picks.map((i) => i.key));
+      m.order = [...m.order.slice(0, 1), ...picks.map((i) => i.key), ...m.order.slice(1).filter((k) => !pickKeys.has(k))];
+    }
     return m.currentItem();
   };
   // Puts `items` right after the playing one (at the start when nothing plays); in shuffle they
   // play next too, in their own order.
   m.playNext = (items) => {
-    const added = items.slice(0, m.room()).map(keyed);
+    const added = items.slice(0, m.room()).map(picked);
     const at = m.position() + 1;
     m.items.splice(at, 0, ...added);
     if (m.shuffle) {
@@ -91,7 +108,7 @@ export function createQueueModel(random = Math.random) {
   };
   // Puts `items` at the end; in shuffle each goes to a random place after the playing one.
   m.add = (items) => {
-    const added = items.slice(0, m.room()).map(keyed);
+    const added = items.slice(0, m.room()).map(picked);
     m.items.push(...added);
     if (m.shuffle)
       for (const item of added) {
@@ -247,7 +264,6 @@ function writeStorage(key, value) {
 
 // --- the page ----------------------------------------------------------------------------------------
 const $ = (id) => document.getElementById(id);
-const format = (template, values) => template.replace(/\{(\w+)\}/g, (_, name) => String(values[name] ?? ""));
 
 function iconButton(className, label, onClick) {
   const b = document.createElement("button");
@@ -348,7 +364,7 @@ export function createQueue({ labels, onStatus = () => {}, random = Math.random 
     const wasEmpty = model.current === null;
     const count = how === "next" ? model.playNext(items) : model.add(items);
     if (count < items.length) onStatus(format(labels.queueFull, { max: QUEUE_LIMIT }), true);
-    if (count > 0) onStatus(format(how === "next" ? labels.queuedNext : labels.queuedAdded, { count }));
+    if (count > 0) onStatus(counted(labels, how === "next" ? "queuedNext" : "queuedAdded", count));
     // The first items of an empty queue are loaded, not played: the user asked for a queue.
     if (wasEmpty && model.currentItem()) load(model.currentItem(), false);
     else changed();
@@ -438,7 +454,7 @@ export function createQueue({ labels, onStatus = () => {}, random = Math.random 
 
   // Draws the rows in view only, as the track list does: a queue of 10,000 items stays light.
   function draw() {
-    $("queue-count").textContent = format(labels.queueCount, { count: model.items.length });
+    $("queue-count").textContent = counted(labels, "queueCount", model.items.length);
     $("queue-clear").disabled = model.items.length === 0;
     $("queue-empty").hidden = model.items.length > 0;
     viewport.hidden = model.items.length === 0;

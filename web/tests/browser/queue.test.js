@@ -31,7 +31,7 @@ test("play all fills the queue; play next and add to queue put rows after the pl
 
   await page.locator('#tracks .track[data-index="5"] .queue-next').click();
   await page.locator('#tracks .track[data-index="6"] .queue-add').click();
-  assert.equal(await page.locator("#status").textContent(), "1 tracks were added to the queue.");
+  assert.equal(await page.locator("#status").textContent(), "1 track was added to the queue.");
   assert.equal(await page.locator("#queue-panel").getAttribute("data-count"), String(count + 2));
   const queue = await queueStreams(page);
   assert.equal(queue[at + 1], listed[5]);
@@ -49,6 +49,13 @@ test("play all fills the queue; play next and add to queue put rows after the pl
   const longer = await queueStreams(page);
   assert.deepEqual(longer.slice(at + 2, at + 2 + count), listed);
   await screenshot(page, "queue-open");
+
+  // A row of the list played: the rows put in by hand that have not played yet stay, right after it.
+  await page.locator('#tracks .track[data-index="1"] .title').click();
+  await page.waitForFunction((s) => document.getElementById("player").dataset.stream === s, listed[1]);
+  const replaced = await queueStreams(page);
+  assert.deepEqual(replaced, [listed[0], listed[1], ...listed, listed[6], ...listed.slice(2)]);
+  assert.equal(await position(page), 1);
   assert.deepEqual(page.problems, []);
 });
 

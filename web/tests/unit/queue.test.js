@@ -44,6 +44,41 @@ test("play next goes right after the playing item, add to queue at the end", () 
   assert.equal(m.step(1).stream, "9.flac");
 });
 
+test("a new list played keeps the rows put in by hand that have not played yet, right after the chosen row", () => {
+  const m = createQueueModel();
+  m.replace(items(1, 2, 3), 0);
+  m.playNext(items(8));
+  m.add(items(9));
+  m.step(1); // 8 plays: it is no longer waiting
+  assert.equal(m.currentItem().stream, "8.flac");
+  assert.equal(m.replace(items(4, 5, 6), 1).stream, "5.flac");
+  assert.deepEqual(streams(m), ["4.flac", "5.flac", "9.flac", "6.flac"]);
+  // Kept across a reload, and still kept by the next list.
+  const n = createQueueModel();
+  assert.equal(n.load(JSON.parse(JSON.stringify(m.save()))), true);
+  n.replace(items(7), 0);
+  assert.deepEqual(streams(n), ["7.flac", "9.flac"]);
+  // Once played, it is not kept.
+  assert.equal(m.step(1).stream, "9.flac");
+  assert.equal(m.step(1).stream, "6.flac");
+  m.replace(items(1), 0);
+  assert.deepEqual(streams(m), ["1.flac"]);
+  // Cleared, nothing is kept.
+  n.clear();
+  n.replace(items(1, 2), 0);
+  assert.deepEqual(streams(n), ["1.flac", "2.flac"]);
+});
+
+test("in shuffle, the rows put in by hand still play right after the chosen row", () => {
+  const m = createQueueModel(seeded(3));
+  m.setShuffle(true);
+  m.replace(items(1, 2, 3), 0);
+  m.add(items(8, 9));
+  const first = m.replace(items(4, 5, 6, 7), 2);
+  assert.equal(first.stream, "6.flac");
+  assert.deepEqual(playOrder(m).slice(0, 3).sort(), ["6.flac", "8.flac", "9.flac"].sort());
+});
+
 test("added to an empty queue, the first item becomes the current one", () => {
   const m = createQueueModel();
   m.add(items(4, 5));
