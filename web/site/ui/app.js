@@ -2,6 +2,7 @@
 // left-hand side does. Plain DOM code; every server text is inserted with textContent.
 import { parseReply, decodeEntities, languageFromTags, safeIcon, isLazyContainer, nodesOf, REFRESH_TARGETS, BUTTON_IDS } from "./reply.js";
 import { LABELS, HTML_LANG } from "./labels.js";
+import { format } from "./text.js";
 import { createListener, isListable } from "./listen.js";
 import { failureCode, readApiReply, splitTracks, isBrowsedLibraryNode } from "./failures.js";
 import { createPlaylists } from "./playlists.js";
@@ -80,10 +81,10 @@ async function call(params) {
   return parseReply(text);
 }
 
-// Whether a service behind the lists answers (library.cgi's probe): {kind: "ok"} or a failure.
-async function probe(service) {
+// A GET of library.cgi, read as its replies are read.
+async function askLibrary(params) {
   try {
-    const response = await fetch(`${API}?${new URLSearchParams({ action: "probe", service })}`, {
+    const response = await fetch(`${API}?${new URLSearchParams(params)}`, {
       credentials: "same-origin",
       cache: "no-store",
     });
@@ -98,11 +99,10 @@ async function probe(service) {
     return { kind: "offline" };
   }
 }
+// Whether a service behind the lists answers (library.cgi's probe): {kind: "ok"} or a failure.
+const probe = (service) => askLibrary({ action: "probe", service });
 
 // --- status line -----------------------------------------------------------------------------------
-function format(template, values) {
-  return template.replace(/\{(\w+)\}/g, (_, name) => String(values[name] ?? ""));
-}
 function serverText(section, key) {
   const pick = (table) => (table && table[section] && typeof table[section][key] === "string" ? table[section][key] : null);
   return pick(page.texts) ?? pick(page.fallback);
@@ -229,11 +229,16 @@ async function expand(li) {
     li.dataset.state = "loading";
     li.setAttribute("aria-busy", "true");
     let reply = await call({ action: "gettreenode", node: node.id });
-    // The tree CGI answers a failed browse of the library as an empty one: an empty container
-    // is shown empty only while the media server answers.
+    // The tree CGI answers a failed browse of the library, and a container that has left the
+    // library since the tree was drawn, as an empty one: an empty container is shown empty only
+    // while the media server answers and library.cgi still knows the node.
     if (reply.kind === "nodes" && reply.nodes.length === 0 && isBrowsedLibraryNode(node.id)) {
       const server = await probe("media_server");
       if (server.kind !== "ok") reply = server;
+      else {
+        const listed = await askLibrary({ action: "list", node: node.id });
+        if (failureCode(listed) === "node_gone") reply = listed;
+      }
     }
     li.removeAttribute("aria-busy");
     if (reply.kind === "nodes") {
@@ -243,6 +248,7 @@ async function expand(li) {
     } else {
       li.dataset.state = "failed";
       li.setAttribute("aria-expanded", "false");
+      if (failureCode(reply) === "node_gone") li.dataset.gone = "true";
       showFailure(reply, action);
       return;
     }

@@ -45,6 +45,33 @@ test("a node that no longer exists: the pane says so, the tree marks it, and the
   noPageErrors(page);
 });
 
+test("a container that left the library since the tree was drawn says so when expanded, not \"(empty)\"", async () => {
+  const page = await openTree(browser, "demo");
+  // The Artists category as the tree CGI drew it before the library lost one of them: the real
+  // category's reply with one artist more, whose node the library no longer has.
+  const left = "musiclib_artist:Left%20The%20Library";
+  await page.route("**/webapi/audiotree.cgi*", async (route) => {
+    const params = new URLSearchParams(route.request().postData() ?? "");
+    if (params.get("action") !== "gettreenode" || params.get("node") !== "musiclib_music_aa") return route.continue();
+    const response = await route.fetch();
+    const nodes = JSON.parse(await response.text());
+    nodes.push({ ...nodes[0], id: left, text: "Left The Library" });
+    return route.fulfill({ response, body: JSON.stringify(nodes) + "\n" });
+  });
+  await open(page, "musiclib_music_aa");
+  assert.ok((await childIds(page, "musiclib_music_aa")).includes(left));
+  await item(page, left).locator(":scope > .row > .twisty").click();
+  await expectStatus(page, "node_gone");
+  assert.equal(await item(page, left).getAttribute("data-gone"), "true");
+  assert.equal(await item(page, left).getAttribute("aria-expanded"), "false");
+  assert.equal(await item(page, left).locator(".empty").count(), 0);
+  // An artist still in the library expands as before.
+  const kept = (await childIds(page, "musiclib_music_aa")).find((id) => id !== left);
+  await open(page, kept);
+  assert.equal(await item(page, kept).getAttribute("data-gone"), null);
+  noPageErrors(page);
+});
+
 test("a refused request says that the permission is missing", async () => {
   const page = await openTree(browser, "guest");
   // The guest has no media server permission: a listing of one is refused by library.cgi itself.
