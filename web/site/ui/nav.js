@@ -2,8 +2,8 @@
 // to the open view, each part clickable), one browser history entry per view (a node selected in
 // the tree, a container opened in the pane), so that Back and Forward move between views and never
 // leave the page while there is a view to go back to, and the view in the URL
-// (?view=<node>&title=<its title>[&object=<container of a media server>]), so that a reload or a
-// bookmark opens it again. The tree's expanded nodes are kept in the browser's storage
+// (?view=<node>&title=<its title>[&object=<container of a media server>][&from=<the tree node it was
+// opened from>]), so that a reload or a bookmark opens it again, with its path when the tree has it. The tree's expanded nodes are kept in the browser's storage
 // ("harmona.view") and expanded again after a reload.
 const STORAGE_KEY = "harmona.view";
 const MAX_KEPT = 200;        // expanded nodes kept
@@ -24,22 +24,27 @@ export function checkedView(view) {
   return trail.every(Boolean) ? { trail } : null;
 }
 
-// The view that the URL names (only its last part: the rest is found in the tree when it can be).
+// The view that the URL names: its last part, after the tree node it was opened from (untitled: the
+// rest of the path is found in the tree when it can be).
 export function viewOfSearch(search) {
   const params = new URLSearchParams(search);
   const node = params.get("view");
   if (!node) return null;
-  return checkedView({ trail: [{ node, title: params.get("title") ?? "", object: params.get("object") ?? undefined }] });
+  const last = { node, title: params.get("title") ?? "", object: params.get("object") ?? undefined };
+  const from = params.get("from");
+  return checkedView({ trail: from && from !== node ? [{ node: from, title: "" }, last] : [last] });
 }
 // The URL of `view`, keeping the page's other parameters.
 export function searchOfView(search, view) {
   const params = new URLSearchParams(search);
-  for (const name of ["view", "title", "object"]) params.delete(name);
+  for (const name of ["view", "title", "object", "from"]) params.delete(name);
   const last = view?.trail.at(-1);
   if (last) {
     params.set("view", last.node);
     if (last.title) params.set("title", last.title);
     if (last.object !== undefined) params.set("object", last.object);
+    const from = view.trail.at(-2);
+    if (from && from.object === undefined) params.set("from", from.node);
   }
   const text = params.toString();
   return text ? `?${text}` : "";
@@ -169,17 +174,27 @@ export function createNav({ labels, findItem, selectItem, expandItem, listener }
     if (li) {
       selectItem(li, { record: false });
       // The tree knows the path better than a bookmark does.
-      if (view.trail.length === 1) {
-        current = { trail: treeTrail(li) };
-        drawBreadcrumb(current);
-        history.replaceState({ view: current }, "", searchOfView(location.search, current) || location.pathname);
-      }
+      if (fromURL(view)) replaceCurrent({ trail: treeTrail(li) });
       return;
+    }
+    // A view opened from the pane: its path is the tree node's it came from, when the tree has it.
+    if (fromURL(view)) {
+      const from = view.trail.length === 2 ? findItem(view.trail[0].node) : null;
+      replaceCurrent({ trail: from ? [...treeTrail(from), last] : [last] });
     }
     $("hint").hidden = true;
     $("selected").hidden = false;
     $("selected-text").textContent = last.title;
     listener.show(last.node, last.title, last.object);
+  }
+  // A view read from the URL: its last part, maybe after the untitled node it was opened from.
+  function fromURL(view) {
+    return view.trail.length === 1 || (view.trail.length === 2 && view.trail[0].title === "");
+  }
+  function replaceCurrent(view) {
+    current = view;
+    drawBreadcrumb(current);
+    history.replaceState({ view: current }, "", searchOfView(location.search, current) || location.pathname);
   }
   function go(view) {
     record(view);

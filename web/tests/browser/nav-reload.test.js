@@ -45,6 +45,25 @@ test("a bookmarked view opens in a new browser, its path found in the tree", asy
   assert.deepEqual(page.problems, []);
 });
 
+test("a bookmarked album opened from the album grid opens in a new browser with its whole path", async () => {
+  const first = await openTree(browser, "demo");
+  await expandNode(first, "musiclib_root");
+  await choose(first, "musiclib_music_album");
+  const album = await openFirstAlbum(first);
+  const path = await crumbs(first);
+  assert.ok(path.length >= 3, JSON.stringify(path));
+  const bookmark = new URL(first.url());
+  assert.equal(bookmark.searchParams.get("from"), "musiclib_music_album");
+  const page = await openTree(browser, "demo", { query: bookmark.search });
+  await page.waitForSelector("body[data-nav-ready=true]", { timeout: 30000 });
+  await listed(page, album.node);
+  assert.deepEqual(await crumbs(page), path);
+  // Its parent's part of the path leads back to the grid.
+  await page.locator("#breadcrumb button.crumb").last().click();
+  await listed(page, "musiclib_music_album");
+  assert.deepEqual(page.problems, []);
+});
+
 test("a view in the URL that names no node shows the failure in the pane and changes nothing", async () => {
   const page = await openTree(browser, "demo", { query: "?view=musiclib_nothing%3Ahere&title=Nothing" });
   await page.waitForSelector("body[data-nav-ready=true]", { timeout: 30000 });

@@ -31,7 +31,12 @@ test("a view goes into the URL with the page's other parameters and comes back f
   assert.equal(params.get("keepalive"), "2");
   assert.equal(params.get("view"), "musiclib_artist:A%20B");
   assert.equal(params.get("title"), "A B");
-  assert.deepEqual(viewOfSearch(search), { trail: [{ node: "musiclib_artist:A%20B", title: "A B" }] });
+  assert.equal(params.get("from"), "musiclib_music_aa", "the tree node it was opened from");
+  assert.deepEqual(viewOfSearch(search), { trail: [{ node: "musiclib_music_aa", title: "" }, { node: "musiclib_artist:A%20B", title: "A B" }] });
+  const top = searchOfView("", { trail: [{ node: "musiclib_music_aa", title: "Artists" }] });
+  assert.equal(new URLSearchParams(top).get("from"), null);
+  assert.deepEqual(viewOfSearch(top), { trail: [{ node: "musiclib_music_aa", title: "Artists" }] });
+  assert.deepEqual(viewOfSearch("?view=a&from=a"), { trail: [{ node: "a", title: "" }] }, "a node is not its own origin");
   const remote = searchOfView("", { trail: [{ node: "mediaserver_http://192.0.2.1/ctl", title: "Jazz", object: "64$1" }] });
   assert.deepEqual(viewOfSearch(remote), { trail: [{ node: "mediaserver_http://192.0.2.1/ctl", title: "Jazz", object: "64$1" }] });
   assert.equal(searchOfView("?view=x&title=y&keepalive=2", null), "?keepalive=2");
