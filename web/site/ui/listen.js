@@ -2,6 +2,7 @@
 // A list of any length is drawn as a window of rows over a spacer of its full height: only the
 // rows in view (and a few around them) exist in the document, so 10,000 tracks scroll smoothly.
 import { failureCode, readApiReply } from "./failures.js";
+import { counted } from "./text.js";
 
 const API = "webapi/library.cgi";
 const ROW_HEIGHT = 28; // px; .track in app.css has the same height (--track-height where a layout sets it)
@@ -232,7 +233,9 @@ export function createListener({ onPlayerLoad = () => {}, labels, language = "en
     );
     containers.hidden = list.containers.length === 0;
     decorateContainers(list, list.albums);
-    $("list-count").textContent = labels.trackCount.replace("{count}", String(list.tracks.length));
+    // A list of containers only (the album grid, an artist's albums) has no track count to show.
+    const onlyContainers = list.tracks.length === 0 && list.containers.length > 0;
+    $("list-count").textContent = onlyContainers ? "" : counted(labels, "trackCount", list.tracks.length);
     // Another node starts in its own order; the same one again (a reload) keeps the column.
     if (list.node !== state.sortedNode) state.sort = { column: "", direction: "" };
     state.sortedNode = list.node;

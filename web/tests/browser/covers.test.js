@@ -38,6 +38,8 @@ test("the albums are a grid of covers with year and track count, a placeholder w
   const count = await tiles.count();
   assert.ok(count >= 24, `${count} albums`);
   assert.equal(count, await page.locator("#containers button.container").count());
+  // A grid of albums without tracks of its own shows no "0 tracks" above it.
+  assert.equal(await page.locator("#list-count").textContent(), "");
   // Aurora Lane (covers) and The Copper Kettles (none) in the sample share.
   const covered = tiles.filter({ hasText: "Aurora Lane" }).first();
   const plain = tiles.filter({ hasText: "The Copper Kettles" }).first();
