@@ -60,6 +60,12 @@ bool AddLaterColumns(Database& db) {
 // track table keep all three in step with every insert, change and removal of a track, whoever
 // writes it; a move (a new path) changes no word and touches none of them.
 constexpr const char* kAlbumArtistOfNew = "COALESCE(NULLIF(new.album_artist, ''), new.artist, '')";
+// The lengths of word beginnings that the full-text indexes keep lists for. The page searches
+// as the user types, every word a beginning; a beginning of another length is found by merging
+// the lists of every word that starts so, which for a word as common as "album" in a large
+// library cost 6 ms a query. Up to six characters covers nearly every word being typed, for
+// about 40% more index (8.5 MB at 100,000 tracks of the benchmark's words).
+constexpr const char* kSearchPrefixes = "1 2 3 4 5 6";
 constexpr const char* kSearchSchema = R"SQL(
 DROP TRIGGER IF EXISTS track_search_insert;
 DROP TRIGGER IF EXISTS track_search_change;
@@ -71,7 +77,7 @@ DROP TABLE IF EXISTS search_album_text;
 DROP TABLE IF EXISTS search_album;
 CREATE VIRTUAL TABLE track_search USING fts5(
   title, artist, album, genre, content='track', content_rowid='id',
-  tokenize='unicode61 remove_diacritics 2', prefix='1 2 3'
+  tokenize='unicode61 remove_diacritics 2', prefix='@PREFIXES@'
 );
 CREATE TABLE search_album (
   id INTEGER PRIMARY KEY, album TEXT NOT NULL, artist TEXT NOT NULL, tracks INTEGER NOT NULL,
@@ -80,7 +86,7 @@ CREATE TABLE search_album (
 CREATE INDEX search_album_artist ON search_album(artist);
 CREATE VIRTUAL TABLE search_album_text USING fts5(
   album, artist, content='search_album', content_rowid='id',
-  tokenize='unicode61 remove_diacritics 2', prefix='1 2 3'
+  tokenize='unicode61 remove_diacritics 2', prefix='@PREFIXES@'
 );
 INSERT INTO track_search (track_search) VALUES ('rebuild');
 INSERT INTO search_album (album, artist, tracks)
@@ -128,7 +134,8 @@ std::string SearchSchema() {
     for (std::size_t at = 0; (at = albumArtistOfOld.find("new.", at)) != std::string::npos;)
         albumArtistOfOld.replace(at, 4, "old.");
     for (const auto& [mark, text] : {std::pair<std::string, std::string>{"@NEW@", albumArtistOfNew},
-                                     {"@OLD@", albumArtistOfOld}}) {
+                                     {"@OLD@", albumArtistOfOld},
+                                     {"@PREFIXES@", kSearchPrefixes}}) {
         for (std::size_t at = 0; (at = sql.find(mark, at)) != std::string::npos; at += text.size())
             sql.replace(at, mark.size(), text);
     }
@@ -141,10 +148,22 @@ bool HasSchemaObject(Database& db, const char* type, const char* name) {
            stmt.Bind(2, std::string_view(name)) == SQLITE_OK && stmt.Step() == SQLITE_ROW;
 }
 
+// Whether full-text table `name` keeps the beginnings of words of kSearchPrefixes' lengths.
+bool HasSearchPrefixes(Database& db, const char* name) {
+    Statement stmt = db.Prepare("SELECT sql FROM sqlite_master WHERE type = 'table' AND name = ?1");
+    if (!stmt || stmt.Bind(1, std::string_view(name)) != SQLITE_OK || stmt.Step() != SQLITE_ROW)
+        return false;
+    const std::string wanted = std::string("prefix='") + kSearchPrefixes + "'";
+    return stmt.ColumnText(0).find(wanted) != std::string_view::npos;
+}
+
 // The search index is made (and filled from the track table) when one of its parts is missing:
 // a library of an indexer that had none gets it once, without reading a tag, and an index left
 // without its triggers (the track table made anew by hand) is made again rather than trusted.
+// An index of other word beginnings (an older indexer's) is made again the same way.
 bool EnsureSearchIndex(Database& db) {
+    if (!HasSearchPrefixes(db, "track_search") || !HasSearchPrefixes(db, "search_album_text"))
+        return db.Execute(SearchSchema().c_str()) == SQLITE_OK;
     for (const auto& [type, name] : {std::pair<const char*, const char*>{"table", "track_search"},
                                      {"table", "search_album"},
                                      {"table", "search_album_text"},

@@ -153,5 +153,52 @@ TEST(SearchIndex, ALibraryWithoutASearchIndexGetsOneWithoutATagRead) {
     EXPECT_TRUE(IndexIntact());
 }
 
+// The lengths of word beginnings that full-text table `name` keeps ("" when it has none).
+std::string Prefixes(const char* name) {
+    sqlite3* db = nullptr;
+    std::string sql;
+    sqlite3_open_v2(kLibraryDb, &db, SQLITE_OPEN_READONLY, nullptr);
+    sqlite3_stmt* stmt = nullptr;
+    if (sqlite3_prepare_v2(db, "SELECT sql FROM sqlite_master WHERE name = ?1", -1, &stmt,
+                           nullptr) == SQLITE_OK) {
+        sqlite3_bind_text(stmt, 1, name, -1, SQLITE_TRANSIENT);
+        if (sqlite3_step(stmt) == SQLITE_ROW)
+            sql = reinterpret_cast<const char*>(sqlite3_column_text(stmt, 0));
+    }
+    sqlite3_finalize(stmt);
+    sqlite3_close(db);
+    const std::size_t at = sql.find("prefix='");
+    return at == std::string::npos ? "" : sql.substr(at + 8, sql.find('\'', at + 8) - at - 8);
+}
+
+TEST(SearchIndex, AnIndexOfShorterWordBeginningsIsMadeAgainWithoutATagRead) {
+    MakeStandardShare();
+    ASSERT_EQ(RunIndexer().exitStatus, 0);
+    EXPECT_EQ(Prefixes("track_search"), "1 2 3 4 5 6");
+    EXPECT_EQ(Prefixes("search_album_text"), "1 2 3 4 5 6");
+    // The track index as an older indexer made it: beginnings of up to three characters.
+    sqlite3* db = nullptr;
+    ASSERT_EQ(sqlite3_open(kLibraryDb, &db), SQLITE_OK);
+    ASSERT_EQ(sqlite3_exec(db,
+                           "DROP TABLE track_search; CREATE VIRTUAL TABLE track_search USING "
+                           "fts5(title, artist, album, genre, content='track', "
+                           "content_rowid='id', tokenize='unicode61 remove_diacritics 2', "
+                           "prefix='1 2 3'); INSERT INTO track_search (track_search) "
+                           "VALUES ('rebuild')",
+                           nullptr, nullptr, nullptr),
+              SQLITE_OK)
+        << sqlite3_errmsg(db);
+    sqlite3_close(db);
+    ASSERT_EQ(Prefixes("track_search"), "1 2 3");
+
+    const IndexRun run = RunIndexer();
+    ASSERT_EQ(run.exitStatus, 0) << run.output;
+    EXPECT_EQ(run.counts.at("tagreads"), 0);
+    EXPECT_EQ(Prefixes("track_search"), "1 2 3 4 5 6");
+    EXPECT_EQ(Found("\"trio\"*"), "Jazz/Blue/04 Fourth.wav Jazz/Blue/Late/03 Third.mp3");
+    EXPECT_EQ(Albums(), "Alpha & Omega/Band A=2 Blue/Trio=2");
+    EXPECT_TRUE(IndexIntact());
+}
+
 }  // namespace
 }  // namespace harmona::test::mediad
