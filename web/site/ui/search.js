@@ -7,8 +7,9 @@ import { formatDuration } from "./listen.js";
 import { counted } from "./text.js";
 
 const API = "webapi/library.cgi";
-// The pause after a keystroke before the query is sent: typing on sends one query, not one per
-// letter, and results still show within a tenth of a second.
+// A keystroke after a pause sends its query at once; one that follows the one before within this
+// pause waits for it, so that letters arriving together (a paste, key repeat, an input method) send
+// one query for the whole text, not one per letter.
 export const SEARCH_DEBOUNCE_MS = 30;
 export const MAX_QUERY_BYTES = 200; // library.cgi refuses longer queries
 export const MAX_QUERY_WORDS = 8;
@@ -35,6 +36,7 @@ export function createSearch({ labels, playTracks, openNode, onFailure = () => {
     timer: 0,        // the pending send
     sent: 0,         // the number of the newest query sent; a reply of an older one never draws
     abort: null,     // aborts the query in flight
+    lastInput: -Infinity, // when the text last changed (performance.now())
     options: [],     // the results in order: {element, activate}
     active: -1,      // the result the arrows are on (-1: the box)
   };
@@ -221,7 +223,11 @@ export function createSearch({ labels, playTracks, openNode, onFailure = () => {
       panel.dataset.state = queryWords(query).length > 0 ? "refused" : "idle";
       return;
     }
-    state.timer = setTimeout(() => send(query), SEARCH_DEBOUNCE_MS);
+    const now = performance.now();
+    const together = now - state.lastInput < SEARCH_DEBOUNCE_MS;
+    state.lastInput = now;
+    if (together) state.timer = setTimeout(() => send(query), SEARCH_DEBOUNCE_MS);
+    else send(query);
   }
 
   box.addEventListener("input", typed);
