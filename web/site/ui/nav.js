@@ -3,8 +3,9 @@
 // the tree, a container opened in the pane), so that Back and Forward move between views and never
 // leave the page while there is a view to go back to, and the view in the URL
 // (?view=<node>&title=<its title>[&object=<container of a media server>][&from=<the tree node it was
-// opened from>]), so that a reload or a bookmark opens it again, with its path when the tree has it. The tree's expanded nodes are kept in the browser's storage
-// ("harmona.view") and expanded again after a reload.
+// opened from>]), so that a reload or a bookmark opens it again, with its path when the tree has it.
+// The tree's expanded nodes are kept in the browser's storage ("harmona.view") and expanded again
+// after a reload.
 const STORAGE_KEY = "harmona.view";
 const MAX_KEPT = 200;        // expanded nodes kept
 const MAX_ID = 2048;         // characters of a node id or title taken from the URL or the storage

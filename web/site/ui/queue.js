@@ -1,6 +1,7 @@
 // The play queue: the one list the player plays. "Play all" and a click on a row replace it with the
-// listed rows (the rows put in by hand that have not played yet stay, next); "Play next" and "Add to queue" put rows after the playing one or at its end; its
-// panel (opened from the player bar) removes, reorders (drag, or the move buttons) and clears. Shuffle
+// listed rows (the rows put in by hand that have not played yet stay, next); "Play next" and "Add to
+// queue" put rows after the playing one or at its end; its panel (opened from the player bar)
+// removes, reorders (drag, or the move buttons) and clears. Shuffle
 // plays the items in a random order kept beside the queue's own; repeat plays one item again, or
 // the whole queue again. The queue, the playing item, the time in it and the volume are kept in the
 // browser's storage and put back paused after a reload.
@@ -72,9 +73,10 @@ export function createQueueModel(random = Math.random) {
 
   // The rows put in the queue by hand that have not played yet, in play order.
   const waitingPicks = () => {
+    const byKey = new Map(m.items.map((item) => [item.key, item]));
     const keys = m.shuffle ? m.order : m.items.map((i) => i.key);
     const after = m.current === null ? 0 : keys.indexOf(m.current) + 1;
-    return keys.slice(after).map((key) => m.items[indexOf(key)]).filter((item) => item?.picked);
+    return keys.slice(after).map((key) => byKey.get(key)).filter((item) => item?.picked);
   };
   // The listed rows, playing the one at `start`; -1: the first in play order (in shuffle, any).
   // The rows put in the queue by hand that have not played yet stay: they play right after the
