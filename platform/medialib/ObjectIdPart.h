@@ -6,26 +6,17 @@
 #include <string>
 #include <string_view>
 
+#include "common/util/PercentEncoding.h"
+
 namespace harmona::medialib {
 
 inline std::string EscapeIdPart(std::string_view text) {
-    static constexpr char kHex[] = "0123456789ABCDEF";
-    std::string out;
-    out.reserve(text.size());
-    for (const char c : text) {
-        const auto byte = static_cast<unsigned char>(c);
-        const bool unreserved = (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
-                                (c >= '0' && c <= '9') || c == '.' || c == '_' || c == '~' ||
-                                c == '-';
-        if (unreserved) {
-            out += c;
-        } else {
-            out += '%';
-            out += kHex[byte >> 4];
-            out += kHex[byte & 15];
-        }
-    }
-    return out;
+    return util::PercentEncode(text);
+}
+
+// The reverse; false on a malformed "%" sequence.
+inline bool UnescapeIdPart(std::string_view text, std::string* out) {
+    return util::PercentDecode(text, out);
 }
 
 }  // namespace harmona::medialib

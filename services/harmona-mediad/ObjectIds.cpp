@@ -1,9 +1,7 @@
 #include "services/harmona-mediad/ObjectIds.h"
 
-#include <cctype>
 #include <cstdlib>
 
-#include "common/util/HexDigit.h"
 #include "common/util/Number.h"
 
 namespace harmona::mediad {
@@ -41,24 +39,6 @@ bool ParseFolder(const std::string& escaped, std::string* folder) {
 }
 
 }  // namespace
-
-bool UnescapeIdPart(const std::string& text, std::string* out) {
-    out->clear();
-    for (std::size_t i = 0; i < text.size(); ++i) {
-        if (text[i] != '%') {
-            out->push_back(text[i]);
-            continue;
-        }
-        if (i + 2 >= text.size())
-            return false;
-        const int byte = util::HexByteValue(text[i + 1], text[i + 2]);
-        if (byte < 0)
-            return false;
-        out->push_back(static_cast<char>(byte));
-        i += 2;
-    }
-    return true;
-}
 
 std::string FolderId(const std::string& relativePath) {
     std::string id = "folder:";

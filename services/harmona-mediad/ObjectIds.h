@@ -44,10 +44,10 @@ struct ObjectRef {
     std::string container;                    // TrackIn: the id of the listing container
 };
 
-// Percent-encodes every byte outside [A-Za-z0-9._~-] (platform/medialib/ObjectIdPart.h).
+// Percent-encodes every byte outside [A-Za-z0-9._~-], and the reverse (false on a malformed "%"
+// sequence): platform/medialib/ObjectIdPart.h.
 using medialib::EscapeIdPart;
-// The reverse; false on a malformed "%" sequence.
-bool UnescapeIdPart(const std::string& text, std::string* out);
+using medialib::UnescapeIdPart;
 
 std::string FolderId(const std::string& relativePath);  // "folder:" + path, each part escaped
 std::string AlbumId(const std::string& albumArtist, const std::string& album);

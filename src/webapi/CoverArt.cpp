@@ -3,7 +3,6 @@
 #include <json/value.h>
 
 #include <algorithm>
-#include <cctype>
 #include <cmath>
 #include <cstdint>
 #include <map>
@@ -12,7 +11,6 @@
 #include <utility>
 #include <vector>
 
-#include "common/util/HexDigit.h"
 #include "platform/medialib/LibraryDatabase.h"
 #include "platform/medialib/MediaFiles.h"
 #include "platform/medialib/ObjectIdPart.h"
@@ -45,20 +43,7 @@ constexpr ApiError kLibraryUnreadable{kStatusUnavailable, kSystemSection, kSyste
 // The reverse of EscapeIdPart, only for text that it writes (so that one name has one id).
 std::optional<std::string> UnescapeIdPart(std::string_view text) {
     std::string out;
-    for (std::size_t i = 0; i < text.size(); ++i) {
-        if (text[i] != '%') {
-            out += text[i];
-            continue;
-        }
-        if (i + 2 >= text.size())
-            return std::nullopt;
-        const int byte = util::HexByteValue(text[i + 1], text[i + 2]);
-        if (byte < 0)
-            return std::nullopt;
-        out += static_cast<char>(byte);
-        i += 2;
-    }
-    if (medialib::EscapeIdPart(out) != text)
+    if (!medialib::UnescapeIdPart(text, &out) || medialib::EscapeIdPart(out) != text)
         return std::nullopt;
     return out;
 }

@@ -10,6 +10,7 @@
 #include <cstring>
 #include <optional>
 
+#include "common/util/PercentEncoding.h"
 #include "platform/cgi/ApplicationRequest.h"
 #include "platform/dma/DMABrowse.h"
 #include "platform/dma/DMAParser.h"
@@ -65,24 +66,6 @@ bool SameAddress(const std::string& a, const std::string& b) {
 bool IsResourceOfServer(const std::string& res, const std::string& controlUrl) {
     return dma::IsNetworkHostUrl(res) &&
            SameAddress(dma::HttpUrlHost(res), dma::HttpUrlHost(controlUrl));
-}
-
-std::string UrlEncode(std::string_view text) {
-    static constexpr char kHex[] = "0123456789ABCDEF";
-    std::string out;
-    out.reserve(text.size() * 3);
-    for (const char c : text) {
-        const auto byte = static_cast<unsigned char>(c);
-        if ((byte >= 'A' && byte <= 'Z') || (byte >= 'a' && byte <= 'z') ||
-            (byte >= '0' && byte <= '9') || c == '-' || c == '_' || c == '.' || c == '~') {
-            out += c;
-        } else {
-            out += '%';
-            out += kHex[byte >> 4];
-            out += kHex[byte & 15];
-        }
-    }
-    return out;
 }
 
 bool HasControlBytes(std::string_view text) {
@@ -280,7 +263,7 @@ bool AppendRemoteTrack(const std::string& node, const std::string& controlUrl, c
     row["album"] = item.getValueByKey("album");
     row["duration"] = static_cast<Json::Int64>(DurationSeconds(item.getValueByKey("duration")));
     row["url"] = "webapi/library.cgi?action=" + std::string(kRemoteStreamAction) +
-                 "&node=" + UrlEncode(node) + "&object=" + UrlEncode(id);
+                 "&node=" + util::PercentEncode(node) + "&object=" + util::PercentEncode(id);
     tracks.append(std::move(row));
     return true;
 }
