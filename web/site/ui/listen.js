@@ -286,7 +286,9 @@ export function createListener({ onPlayerLoad = () => {}, labels, language = "en
     for (let i = first; i < last; i++) rows.push(trackRow(tracks[i], i));
     if (state.cursor >= last && state.cursor < tracks.length) rows.push(trackRow(tracks[state.cursor], state.cursor));
     spacer.replaceChildren(...rows);
-    headRow.classList.toggle("with-tools", spacer.querySelector(".track.with-tools") !== null);
+    // The header has the rows' columns.
+    for (const feature of ["with-cover", "with-tools", "with-queue"])
+      headRow.classList.toggle(feature, spacer.querySelector(`.track.${feature}`) !== null);
     if (hadFocus) focusCursor();
   }
 

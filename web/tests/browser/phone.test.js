@@ -129,6 +129,21 @@ test("at 1280 px the tree stays beside the pane and the queue opens above the pl
   // Rows keep their desktop height and every column.
   assert.equal((await page.locator("#tracks .track").first().boundingBox()).height, 28);
   assert.equal(await page.locator("#tracks .track .album").first().isVisible(), true);
+  // The rows carry a cover and the queue's buttons; the header's columns are still theirs, and every
+  // cell of a row is on its one line.
+  const first = page.locator("#tracks .track").first();
+  assert.equal(await first.locator(":scope > .cover").count(), 1);
+  assert.equal(await first.locator(":scope > .queue-tools").count(), 1);
+  for (const column of ["number", "title", "artist", "album", "duration"]) {
+    const head = await page.locator(`.track-head .${column}`).boundingBox();
+    const cell = await first.locator(`:scope > .${column}`).boundingBox();
+    assert.ok(Math.abs(head.x - cell.x) < 1 && Math.abs(head.width - cell.width) < 1, `${column}: header ${JSON.stringify(head)}, cell ${JSON.stringify(cell)}`);
+  }
+  const line = await first.boundingBox();
+  for (const cell of await first.locator(":scope > *").all()) {
+    const box = await cell.boundingBox();
+    assert.ok(box.y >= line.y - 1 && box.y + box.height <= line.y + line.height + 1, `${await cell.getAttribute("class")} ${JSON.stringify(box)} in ${JSON.stringify(line)}`);
+  }
   await page.locator("#queue-toggle").click();
   assert.equal(await page.locator("#detail").isVisible(), true);
   const queue = await page.locator("#queue-panel").boundingBox();
