@@ -930,19 +930,26 @@ TEST_F(AudioDaemon, AMulticastRouteLostAndBackKeepsTheScanFindingServers) {
 // The media servers users have beside ours, found through the real CGI and gone when they stop.
 namespace {
 
-// Runs a scan through the CGI until the server named `name` is a node (or 20 s pass); the items.
-Json::Value ScanUntilListed(const std::string& name) {
-    RefreshMediaServers();
-    WaitForList([&name](const Json::Value& l) { return HasServer(l, name); }, 20000);
-    return RefreshMediaServers().json["items"];
-}
-
 bool HasNode(const Json::Value& items, const std::string& text) {
     for (const Json::Value& item : items) {
         if (item["text"].asString() == text && item["pid"].asString() == "mediaserver_root")
             return true;
     }
     return false;
+}
+
+// Scans through the CGI until the server named `name` is one of its nodes (or 20 s pass); the
+// items of the last scan. A peer that has just started may announce its leaving once before its
+// first "alive" (GSSDP clears a stale entry that way, and an answer to a search can arrive before
+// it), so a listing is asked for again rather than taken from the first scan that saw it.
+Json::Value ScanUntilListed(const std::string& name) {
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(20);
+    Json::Value items = RefreshMediaServers().json["items"];
+    while (!HasNode(items, name) && std::chrono::steady_clock::now() < deadline) {
+        WaitForList([&name](const Json::Value& l) { return HasServer(l, name); }, 2000);
+        items = RefreshMediaServers().json["items"];
+    }
+    return items;
 }
 
 // A peer server started on the peer host under `name` with HTTP on `port`: listed through the
@@ -953,8 +960,11 @@ void ExpectListedUnderItsNameAndGoneAfterItsByebye(Process& server, const std::s
     const Json::Value items = ScanUntilListed(name);
     ASSERT_TRUE(HasNode(items, name))
         << items << ReadFile(serverLog) << ReadFile("/tmp/vanuaudiod.log");
-    const Json::Value list = Reply(Call(16, "0 10"))["list"];
-    ASSERT_EQ(list.size(), 1u);
+    Json::Value list;
+    ASSERT_TRUE(
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), list));
+    list = list["list"];
+    ASSERT_EQ(list.size(), 1u) << list << ReadFile(serverLog) << ReadFile("/tmp/vanuaudiod.log");
     EXPECT_EQ(list[0]["ip"], kPeerAddress);
     const std::string base = "http://10.77.0.2:" + std::to_string(port) + "/";
     EXPECT_EQ(list[0]["control_url"].asString().rfind(base, 0), 0u) << list;
