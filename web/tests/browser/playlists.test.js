@@ -62,8 +62,10 @@ test("New Playlist makes a personal playlist; tracks are added from an album, re
   assert.ok(albumStreams.length >= 3, "an album of several tracks");
   await page.selectOption("#pl-target", node);
   await page.click("#pl-add-all");
-  await page.waitForFunction(() => !document.getElementById("status").classList.contains("error") &&
-    /Evening Walk/.test(document.getElementById("status").textContent), null, { timeout: 10000 });
+  // The add's own words: the status line still says that the playlist was created until then.
+  await page.waitForFunction((text) => !document.getElementById("status").classList.contains("error") &&
+    document.getElementById("status").textContent === text,
+  `${albumStreams.length} tracks added to “Evening Walk”.`, { timeout: 10000 });
   // One more, by a row's own button: the first track again, at the end.
   await page.locator("#tracks .track").first().locator(".pl-add").click();
   await page.waitForFunction(() => /1 track added/.test(document.getElementById("status").textContent), null, { timeout: 10000 });
