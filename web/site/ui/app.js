@@ -4,7 +4,8 @@ import { parseReply, decodeEntities, languageFromTags, safeIcon, isLazyContainer
 import { LABELS, HTML_LANG } from "./labels.js";
 import { format } from "./text.js";
 import { createListener, isListable } from "./listen.js";
-import { failureCode, readApiReply, splitTracks, isBrowsedLibraryNode } from "./failures.js";
+import { failureCode, splitTracks, isBrowsedLibraryNode } from "./failures.js";
+import { askLibrary } from "./library.js";
 import { createPlaylists } from "./playlists.js";
 import { createRadio, listedRadioNode } from "./radio.js";
 import { createCovers } from "./covers.js";
@@ -17,7 +18,6 @@ import { installShortcuts } from "./keys.js";
 import { askLanguages, createLanguagePicker, treeTextTranslator } from "./language.js";
 
 const CGI = "webapi/audiotree.cgi";
-const API = "webapi/library.cgi";
 const UILANG = "webapi/uilang.cgi";
 const BLANK = "3rdparty/Harmona/images/s.gif";
 // The keep-alive period; ?keepalive=SECONDS overrides it (the browser tests use a short one).
@@ -81,24 +81,6 @@ async function call(params) {
   return parseReply(text);
 }
 
-// A GET of library.cgi, read as its replies are read.
-async function askLibrary(params) {
-  try {
-    const response = await fetch(`${API}?${new URLSearchParams(params)}`, {
-      credentials: "same-origin",
-      cache: "no-store",
-    });
-    let body = null;
-    try {
-      body = await response.json();
-    } catch {
-      // below
-    }
-    return readApiReply(response.status, body);
-  } catch {
-    return { kind: "offline" };
-  }
-}
 // Whether a service behind the lists answers (library.cgi's probe): {kind: "ok"} or a failure.
 const probe = (service) => askLibrary({ action: "probe", service });
 

@@ -6,7 +6,7 @@
 // without a cover shows a neutral placeholder, never a broken image. Only covers that exist are
 // requested.
 import { counted } from "./text.js";
-const API = "webapi/library.cgi";
+import { askLibrary } from "./library.js";
 const BATCH = 200; // stream ids per covers request (library.cgi's bound)
 
 // The nodes whose containers are albums, and what library.cgi's albums action answers for them.
@@ -25,15 +25,10 @@ export function checkedCover(path) {
   return typeof path === "string" && COVER_PATH.test(path) ? path : null;
 }
 
+// library.cgi's answer, or null when there is none to draw from (the covers stay placeholders).
 async function getJson(params, signal) {
-  try {
-    const response = await fetch(`${API}?${new URLSearchParams(params)}`, { credentials: "same-origin", cache: "no-store", signal });
-    if (!response.ok) return null;
-    const body = await response.json();
-    return body && body.success === true ? body : null;
-  } catch {
-    return null;
-  }
+  const reply = await askLibrary(params, { signal });
+  return reply.kind === "ok" ? reply.body : null;
 }
 
 // A cover image, or the placeholder when `path` is null. `size`: a class for the size.

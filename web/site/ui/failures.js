@@ -38,6 +38,7 @@ export function readApiReply(status, body) {
       status,
       code: typeof body.error === "string" ? body.error : undefined,
       message: typeof body.message === "string" ? body.message : undefined,
+      rule: typeof body.rule === "string" ? body.rule : undefined,
       errinfo: { sec: String(info.sec ?? ""), key: String(info.key ?? ""), line: info.line ?? null },
     };
   }

@@ -3,11 +3,10 @@
 // language" drops the choice: the page then speaks what the tree CGI speaks (the administrator's
 // choice in users.conf, else the browser's language). The tree CGI itself keeps its language, so
 // the texts of the tree's own nodes are shown in the page's language from the UI text tables.
-import { readApiReply } from "./failures.js";
+import { askLibrary, tellLibrary } from "./library.js";
 import { HTML_LANG } from "./labels.js";
 import { LANGUAGE_NAMES } from "./words/a11y.js";
 
-const API = "webapi/library.cgi";
 export const AUTOMATIC = "def";
 
 // What the picker shows as chosen: the saved language when it is one of the page's own, else
@@ -19,7 +18,7 @@ export function pickedLanguage(saved) {
 // The page's language, the tree CGI's and the user's saved choice, from library.cgi; null when it
 // cannot say (the page then asks uilang.cgi, or reads the browser's languages).
 export async function askLanguages() {
-  const reply = await ask();
+  const reply = await askLibrary({ action: "language" });
   if (reply.kind !== "ok") return null;
   const { language, tree, saved } = reply.body;
   const code = (value) => (typeof value === "string" && /^[a-z]{3}$/.test(value) ? value : null);
@@ -39,22 +38,6 @@ export function treeTextTranslator(texts, from, to) {
       if (typeof text === "string" && typeof own === "string" && own !== "" && !found.has(text)) found.set(text, own);
     }
   return (text, id) => (typeof id === "string" && /^[a-z0-9_]+$/.test(id) && found.has(text) ? found.get(text) : text);
-}
-
-async function ask(init) {
-  let response;
-  let body = null;
-  try {
-    response = await fetch(API + (init ? "" : "?action=language"), {
-      credentials: "same-origin",
-      cache: "no-store",
-      ...(init ?? {}),
-    });
-    body = await response.json();
-  } catch {
-    if (!response) return { kind: "offline" };
-  }
-  return readApiReply(response.status, body);
 }
 
 // `showFailure(reply)` and `showStatus(text, isError)`: the status line, for a save that failed;
@@ -77,7 +60,7 @@ export function createLanguagePicker({ labels, saved, showFailure, showStatus, r
   select.dataset.ready = "true";
   select.addEventListener("change", async () => {
     select.disabled = true;
-    const reply = await ask({ method: "POST", body: new URLSearchParams({ action: "language", language: select.value }) });
+    const reply = await tellLibrary({ action: "language", language: select.value });
     if (reply.kind === "ok") {
       reload();
       return;

@@ -1,10 +1,10 @@
 // The right-hand pane: what the selected node holds (from webapi/library.cgi) and the player.
 // A list of any length is drawn as a window of rows over a spacer of its full height: only the
 // rows in view (and a few around them) exist in the document, so 10,000 tracks scroll smoothly.
-import { failureCode, readApiReply } from "./failures.js";
+import { failureCode } from "./failures.js";
+import { askLibrary } from "./library.js";
 import { counted } from "./text.js";
 
-const API = "webapi/library.cgi";
 const ROW_HEIGHT = 28; // px; .track in app.css has the same height (--track-height where a layout sets it)
 const HEAD_HEIGHT = 28; // px; the column headers above the rows (.tracks-head in a11y.css)
 const OVERSCAN = 8;    // rows drawn above and below the visible ones
@@ -120,21 +120,8 @@ export function createListener({ onPlayerLoad = () => {}, labels, language = "en
   async function fetchList(node, object, signal) {
     const params = { action: "list", node };
     if (typeof object === "string") params.object = object;
-    let response;
-    let body = null;
-    try {
-      response = await fetch(`${API}?${new URLSearchParams(params)}`, {
-        credentials: "same-origin",
-        cache: "no-store",
-        signal,
-      });
-      body = await response.json();
-    } catch (error) {
-      if (signal.aborted) return { kind: "aborted" };
-      if (!response) return { kind: "offline" };
-    }
-    const reply = readApiReply(response.status, body);
-    return reply.kind === "ok" ? { kind: "list", body } : reply;
+    const reply = await askLibrary(params, { signal });
+    return reply.kind === "ok" ? { kind: "list", body: reply.body } : reply;
   }
 
   // The pane while a list loads, or after it failed: its title, the state in words, no rows.

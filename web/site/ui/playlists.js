@@ -3,7 +3,7 @@
 // (move up, move down, remove) and "Add to" on every list of tracks. Every change is a POST to
 // webapi/library.cgi; a refused one is worded from its "error" code in the user's language.
 import { counted, format } from "./text.js";
-const API = "webapi/library.cgi";
+import { askLibrary, tellLibrary } from "./library.js";
 const PERSONAL = "musiclib_music_personal";
 const SHARED = "musiclib_music_shared";
 const NEW_BUTTONS = { [`${PERSONAL}_new`]: "personal", [`${SHARED}_new`]: "shared" };
@@ -22,20 +22,14 @@ const SMART_NODE = /^musiclib_music_(personal|shared)\/smart\/(.+)$/;
 
 // One change: resolves to {ok: true, body} or {ok: false, error, rule, status}.
 async function post(params) {
-  let response;
-  try {
-    response = await fetch(API, { method: "POST", body: new URLSearchParams(params), credentials: "same-origin", cache: "no-store" });
-  } catch {
-    return { ok: false, error: "offline" };
-  }
-  let body = null;
-  try {
-    body = await response.json();
-  } catch {
-    // below
-  }
-  if (response.ok && body && body.success === true) return { ok: true, body };
-  return { ok: false, status: response.status, error: body && typeof body.error === "string" ? body.error : "", rule: body?.rule, body };
+  return resultOf(await tellLibrary(params));
+}
+
+// A library.cgi reply as the dialogs and the tools read it.
+function resultOf(reply) {
+  if (reply.kind === "ok") return { ok: true, body: reply.body };
+  if (reply.kind === "offline") return { ok: false, error: "offline" };
+  return { ok: false, status: reply.status, error: reply.code ?? "", rule: reply.rule };
 }
 
 export function createPlaylists({ labels, onStatus, onFailure, refreshCategory, selectNode, reshow, categoryNodes }) {
@@ -385,16 +379,12 @@ export function createPlaylists({ labels, onStatus, onFailure, refreshCategory, 
 
   async function editRules(node, title) {
     const match = SMART_NODE.exec(node);
-    let reply;
-    try {
-      reply = await (await fetch(`${API}?${new URLSearchParams({ action: "smartget", node })}`, { credentials: "same-origin", cache: "no-store" })).json();
-    } catch {
-      reply = null;
-    }
-    if (!reply || reply.success !== true) {
-      onFailure(errorText({ error: reply?.error ?? "offline", rule: reply?.rule }));
+    const asked = resultOf(await askLibrary({ action: "smartget", node }));
+    if (!asked.ok) {
+      onFailure(errorText(asked));
       return;
     }
+    const reply = asked.body;
     openDialog({
       title: format(labels.plRulesTitle, { name: title }),
       submitLabel: labels.plSave,

@@ -3,7 +3,8 @@
 // a form to add a station, and per station a favourite mark and a remove button. A station
 // directory's rows come from library.cgi too and play through its tune-in (each row's "url"); when a
 // directory has no list (not set up, out of reach, an unreadable reply) the pane's notice says why.
-const API = "webapi/library.cgi";
+import { askLibrary, tellLibrary } from "./library.js";
+
 const USER_DEFINED = "inetradio_userdefined";
 const FAVORITES = "inetradio_favorite";
 const DIRECTORIES = new Set(["inetradio_sc", "inetradio_rio"]);
@@ -50,27 +51,6 @@ export function createRadio({ labels, listener, showStatus, showFailure }) {
     notice.hidden = text === "";
   }
 
-  async function request(params, method = "GET") {
-    const body = new URLSearchParams(params);
-    let response;
-    try {
-      response = method === "POST"
-        ? await fetch(API, { method, body, credentials: "same-origin", cache: "no-store" })
-        : await fetch(`${API}?${body}`, { credentials: "same-origin", cache: "no-store" });
-    } catch {
-      return { kind: "offline" };
-    }
-    let reply = null;
-    try {
-      reply = await response.json();
-    } catch {
-      // below
-    }
-    if (response.ok && reply && reply.success === true) return { kind: "ok", body: reply };
-    if (reply && reply.errinfo)
-      return { kind: "error", errinfo: reply.errinfo, message: reply.message, code: reply.error, status: response.status };
-    return { kind: "http", status: response.status };
-  }
 
   // A failed change: the words for its code, else what the page says of any failure.
   function failed(reply) {
@@ -104,7 +84,7 @@ export function createRadio({ labels, listener, showStatus, showFailure }) {
   async function refreshStations() {
     const asked = ++generation;
     const node = current;
-    const reply = await request({ action: "list", node });
+    const reply = await askLibrary({ action: "list", node });
     if (asked !== generation || node !== current) return;
     const stations = reply.kind === "ok" && Array.isArray(reply.body.tracks) ? reply.body.tracks : [];
     stationList.replaceChildren(...stations.map(stationItem));
@@ -123,7 +103,7 @@ export function createRadio({ labels, listener, showStatus, showFailure }) {
 
   async function add(event) {
     event.preventDefault();
-    const reply = await request({ action: "radio_add", name: nameInput.value, url: urlInput.value.trim() }, "POST");
+    const reply = await tellLibrary({ action: "radio_add", name: nameInput.value, url: urlInput.value.trim() });
     if (reply.kind !== "ok") {
       failed(reply);
       return;
@@ -135,7 +115,7 @@ export function createRadio({ labels, listener, showStatus, showFailure }) {
   }
 
   async function mark(station, favorite) {
-    const reply = await request({ action: "radio_favorite", station: station.station, favorite: favorite ? "1" : "0" }, "POST");
+    const reply = await tellLibrary({ action: "radio_favorite", station: station.station, favorite: favorite ? "1" : "0" });
     if (reply.kind !== "ok") {
       failed(reply);
       return;
@@ -145,7 +125,7 @@ export function createRadio({ labels, listener, showStatus, showFailure }) {
   }
 
   async function removeStation(station) {
-    const reply = await request({ action: "radio_remove", station: station.station }, "POST");
+    const reply = await tellLibrary({ action: "radio_remove", station: station.station });
     if (reply.kind !== "ok") {
       failed(reply);
       return;

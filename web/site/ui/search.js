@@ -2,11 +2,11 @@
 // (library.cgi?action=search), grouped in a list under the box. A track plays, an album or an
 // artist opens in the pane. The keyboard: the arrows move from the box into the results and over
 // them, Enter plays or opens the result, Escape clears the search.
-import { failureCode, readApiReply } from "./failures.js";
+import { failureCode } from "./failures.js";
+import { askLibrary } from "./library.js";
 import { formatDuration } from "./listen.js";
 import { counted } from "./text.js";
 
-const API = "webapi/library.cgi";
 // A keystroke after a pause sends its query at once; one that follows the one before within this
 // pause waits for it, so that letters arriving together (a paste, key repeat, an input method) send
 // one query for the whole text, not one per letter.
@@ -184,21 +184,9 @@ export function createSearch({ labels, playTracks, openNode, onFailure = () => {
     const controller = new AbortController();
     state.abort = controller;
     panel.dataset.state = "searching";
-    let response;
-    let body = null;
-    try {
-      response = await fetch(`${API}?${new URLSearchParams({ action: "search", q: query })}`, {
-        credentials: "same-origin",
-        cache: "no-store",
-        signal: controller.signal,
-      });
-      body = await response.json();
-    } catch {
-      if (controller.signal.aborted || number !== state.sent) return;
-    }
-    if (number !== state.sent) return; // a newer query was typed meanwhile
+    const reply = await askLibrary({ action: "search", q: query }, { signal: controller.signal });
+    if (reply.kind === "aborted" || number !== state.sent) return; // a newer query was typed meanwhile
     state.abort = null;
-    const reply = response ? readApiReply(response.status, body) : { kind: "offline" };
     if (reply.kind === "ok") {
       draw(query, reply.body);
       return;
