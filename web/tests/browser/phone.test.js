@@ -88,6 +88,20 @@ test("at 390 px with touch the tree is a drawer and the pane, the player and the
   assert.equal(await overflow(page), 0);
   assert.deepEqual(await smallTargets(page), []);
   await screenshot(page, "phone-list");
+  // The list starts right under the breadcrumb, and its sort buttons take one line above the rows.
+  const layout = await page.evaluate(() => {
+    const box = (selector) => document.querySelector(selector).getBoundingClientRect();
+    const sorts = [...document.querySelectorAll(".track-head .sort")].map((b) => b.getBoundingClientRect());
+    return {
+      gap: box(".list-tools").top - box("#breadcrumb").bottom,
+      sortLines: new Set(sorts.map((b) => Math.round(b.top))).size,
+      headHeight: box(".tracks-head").height,
+    };
+  });
+  console.log(`phone list layout: ${JSON.stringify(layout)}`);
+  assert.ok(layout.gap <= 4, `${layout.gap} px between the breadcrumb and the list's tools`);
+  assert.equal(layout.sortLines, 1);
+  assert.ok(layout.headHeight < 50, `the sort line is ${layout.headHeight} px high`);
 
   // The queue takes the pane's place.
   await page.locator("#queue-toggle").tap();
