@@ -6,7 +6,6 @@ import { askLibrary } from "./library.js";
 import { counted } from "./text.js";
 
 const ROW_HEIGHT = 28; // px; .track in app.css has the same height (--track-height where a layout sets it)
-const HEAD_HEIGHT = 28; // px; the column headers above the rows (.tracks-head in a11y.css)
 const OVERSCAN = 8;    // rows drawn above and below the visible ones
 // The list's columns: the class of their cells, the word of their header, how they sort.
 export const COLUMNS = [
@@ -388,7 +387,8 @@ export function createListener({ onPlayerLoad = () => {}, labels, language = "en
     state.cursor = index;
     viewport.tabIndex = -1;
     const top = index * rowHeight;
-    const room = Math.max(rowHeight, viewport.clientHeight - HEAD_HEIGHT);
+    // The headers' height as drawn: a phone's line of sort buttons is taller than a desktop's row.
+    const room = Math.max(rowHeight, viewport.clientHeight - head.offsetHeight);
     if (top < viewport.scrollTop) viewport.scrollTop = top;
     else if (top + rowHeight > viewport.scrollTop + room) viewport.scrollTop = top + rowHeight - room;
     drawRows();
@@ -449,7 +449,7 @@ export function createListener({ onPlayerLoad = () => {}, labels, language = "en
       event.preventDefault();
       return;
     }
-    const page = Math.max(1, Math.floor((viewport.clientHeight - HEAD_HEIGHT) / rowHeight) - 1);
+    const page = Math.max(1, Math.floor((viewport.clientHeight - head.offsetHeight) / rowHeight) - 1);
     const moves = { ArrowDown: 1, ArrowUp: -1, PageDown: page, PageUp: -page, Home: -count, End: count };
     if (event.key in moves) {
       moveCursor(Math.min(count - 1, Math.max(0, (state.cursor < 0 ? -1 : state.cursor) + moves[event.key])));

@@ -102,6 +102,16 @@ test("at 390 px with touch the tree is a drawer and the pane, the player and the
   assert.ok(layout.gap <= 4, `${layout.gap} px between the breadcrumb and the list's tools`);
   assert.equal(layout.sortLines, 1);
   assert.ok(layout.headHeight < 50, `the sort line is ${layout.headHeight} px high`);
+  // A keyboard (a tablet's, a phone's) moving down past the rows in view scrolls the row it reaches
+  // wholly into view, between the sort line and the list's bottom.
+  await page.locator("#tracks").focus();
+  for (let i = 0; i < 9; i++) await page.keyboard.press("ArrowDown");
+  const reached = await page.evaluate(() => {
+    const box = (selector) => document.querySelector(selector).getBoundingClientRect();
+    return { row: box("#track-cursor"), list: box("#tracks"), head: box(".tracks-head"), index: document.getElementById("track-cursor").dataset.index };
+  });
+  assert.equal(reached.index, "9");
+  assert.ok(reached.row.top >= reached.head.bottom - 1 && reached.row.bottom <= reached.list.bottom + 1, JSON.stringify(reached));
 
   // The queue takes the pane's place.
   await page.locator("#queue-toggle").tap();
