@@ -41,7 +41,7 @@ constexpr ApiError kLibraryUnreadable{kStatusUnavailable, kSystemSection, kSyste
                                       "library_unavailable"};
 
 // The reverse of EscapeIdPart, only for text that it writes (so that one name has one id).
-std::optional<std::string> UnescapeIdPart(std::string_view text) {
+std::optional<std::string> StrictlyUnescapedIdPart(std::string_view text) {
     std::string out;
     if (!medialib::UnescapeIdPart(text, &out) || medialib::EscapeIdPart(out) != text)
         return std::nullopt;
@@ -94,7 +94,7 @@ int ServeAlbums(ActionHandler& handler, WebMan& webMan) {
         viewPrefix = "musiclib_latest:";
     } else if (node.compare(0, kArtistNodePrefix.size(), kArtistNodePrefix) == 0) {
         const std::string_view escaped = std::string_view(node).substr(kArtistNodePrefix.size());
-        artist = UnescapeIdPart(escaped);
+        artist = StrictlyUnescapedIdPart(escaped);
         if (!artist || artist->empty() || escaped.find('/') != std::string_view::npos)
             return AnswerError(handler, webMan, kUnknownNode);
         viewPrefix = node + "/";
