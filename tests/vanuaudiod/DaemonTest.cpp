@@ -960,10 +960,10 @@ void ExpectListedUnderItsNameAndGoneAfterItsByebye(Process& server, const std::s
     const Json::Value items = ScanUntilListed(name);
     ASSERT_TRUE(HasNode(items, name))
         << items << ReadFile(serverLog) << ReadFile("/tmp/vanuaudiod.log");
-    Json::Value list;
+    Json::Value reply;
     ASSERT_TRUE(
-        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), list));
-    list = list["list"];
+        ParseJson(WaitForList([](const Json::Value& l) { return l.size() == 1; }, 5000), reply));
+    const Json::Value list = reply["list"];
     ASSERT_EQ(list.size(), 1u) << list << ReadFile(serverLog) << ReadFile("/tmp/vanuaudiod.log");
     EXPECT_EQ(list[0]["ip"], kPeerAddress);
     const std::string base = "http://10.77.0.2:" + std::to_string(port) + "/";
