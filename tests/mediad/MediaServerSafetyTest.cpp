@@ -241,18 +241,21 @@ TEST_F(MediaServerSafety, AFolderSwappedForASymlinkServesNothingOutsideTheShare)
     ASSERT_FALSE(res.empty()) << all.raw;
     ASSERT_EQ(HttpGet(res).status, 200);
     // The indexed folder becomes a link to a folder outside the share holding a secret under the
-    // indexed file's name.
+    // indexed file's name. The folder itself goes out of the share too (onto the same file system):
+    // moved inside it, the server's watch would find the file at its new place and go on serving it
+    // by the same id, whichever came first, the request or the watch.
     mkdir("/tmp/outside", 0700);
     WriteFile("/tmp/outside/04 Fourth.wav", "SECRET-OUTSIDE-THE-SHARE");
     const std::string folder = std::string(kShare) + "/Jazz/Blue";
-    ASSERT_EQ(rename(folder.c_str(), (folder + ".moved").c_str()), 0);
+    const std::string aside = "/volume1/Blue.moved";
+    ASSERT_EQ(rename(folder.c_str(), aside.c_str()), 0) << std::strerror(errno);
     ASSERT_EQ(symlink("/tmp/outside", folder.c_str()), 0);
     const HttpReply reply = HttpGet(res);
     EXPECT_EQ(reply.status, 404);
     EXPECT_EQ(reply.body.find("SECRET"), std::string::npos);
     // A link as the file itself is refused too.
     ASSERT_EQ(unlink(folder.c_str()), 0);
-    ASSERT_EQ(rename((folder + ".moved").c_str(), folder.c_str()), 0);
+    ASSERT_EQ(rename(aside.c_str(), folder.c_str()), 0);
     const std::string file = folder + "/04 Fourth.wav";
     ASSERT_EQ(unlink(file.c_str()), 0);
     ASSERT_EQ(symlink("/tmp/outside/04 Fourth.wav", file.c_str()), 0);
